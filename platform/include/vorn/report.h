@@ -1,0 +1,122 @@
+// Report support: environment, profiles and their paths, run status, formats, publishing.
+//
+// A profile name is 1 to 64 of A-Z a-z 0-9 . _ - and doesn't begin with a dot. Every call that
+// takes one fails for anything else with one syslog line, and makes no path from it.
+#ifndef VORN_REPORT_H
+#define VORN_REPORT_H
+
+#include <stddef.h>
+#include <stdio.h>
+
+#include "vorn/text.h"
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+// Prepares the process once and then costs nothing: open descriptors 0 to 2, a clean environment
+// for children, the C.UTF-8 locale for them, umask 027, SQLite configured for one thread and
+// without memory statistics, and as many file handles as a folder tree can be deep.
+void VornQazSetEnv(void);
+
+// --- Profiles -----------------------------------------------------------------------------------
+
+// Appends every profile name of the configuration ("global" left out) in file order. The number,
+// or -1. `flags` must be 0.
+int VornQazEnumProfile(VLIBCSzList** list, int flags);
+
+// Takes profile `profile` for this process unless another live process holds it: one atomic
+// test-and-take with a lock that the kernel drops when the process dies and that no child inherits.
+// 0: it is held by this process now (and the profile held before was released). Non-zero: another
+// process holds it. When the lock itself can't be worked (bad name, read-only disk), one syslog
+// line, 0, and VornQazStatusUpdate fails for this profile.
+int VornQazProfileRunning(const char* profile);
+
+// Stores the status word of `profile`, atomically: "collect_data", "success" or "fail".
+// In a report run (VornQazInitRealPath with for_report 1) "success" is stored only when the
+// finished report is complete; otherwise "fail" is stored, one syslog line says why, what looked
+// like a report is removed, and the result is still 0. -1 when nothing could be stored.
+int VornQazStatusUpdate(const char* profile, const char* status);
+
+// Adds to `*hash` the paths that don't depend on a profile: `real_path_base`, `real_path_stat_db`.
+// `flags` must be 0. 0 or -1.
+int VornQazInitLocation(VLIBCSzHash** hash, int flags);
+
+// Adds every `real_path_*` key of `profile` to `*hash`, which holds the profile's section.
+// With `for_report` 1 the caller holds the profile: what a killed run of it left behind is removed,
+// the folders are made, and the run's temporary names in /tmp are taken (made anew, empty, mode
+// 0600, so that nobody else's file or link can stand there). With 0 nothing on disk changes.
+// 0, or -1 with one syslog line.
+int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report);
+
+// Removes what an unfinished run of `profile` left: its `.partial` folders, its statistics database
+// with journal, and this process's temporary names in /tmp. Never a finished report, and nothing
+// while another live process holds the profile. `hash` is the profile with its paths; null when
+// loading it failed, then only what needs no configuration is removed. When this process is in the
+// middle of a report run of `profile`, the status "fail" is stored. 0 or -1.
+int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash);
+
+// Removes the schedule whose identifier is the value of `key` in `*hash` (its file in
+// VORN_PATH_CRON), and the key. 1 when `*hash` changed, 0 when there was nothing to do, -1 on
+// failure with one syslog line.
+int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key);
+
+// Copies the profile's language code (key `language`, default "en") into `code`. Only letters,
+// digits and '-' pass, at most `size` - 1 bytes. 0, or -1 with one syslog line.
+int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size);
+
+// Non-zero when the profile selects `share`: its key `share_list` (names separated by commas) is
+// unset or names it.
+int VornQazMatchShare(const VLIBCSzHash* hash, const char* share);
+
+// --- What reports look things up in -------------------------------------------------------------
+
+// Makes `*hash` (freed by the caller): every account name that the name service can resolve, asked
+// for at look-up and cached. 0, or -1 with `*hash` null.
+int VornQazInitFilterUser(VLIBCSzHash** hash);
+// Fills `*hash` with share name to folder, for every usable share. The number, or -1.
+int VornQazGetSharePathHash(VLIBCSzHash** hash);
+// Fills `*hash` with file name extension (without dot) to type label ("reportUI_file_type_image");
+// look-ups in it ignore ASCII case from then on. The number of extensions, or -1.
+int VornQazInitFileTypeHash(VLIBCSzHash** hash);
+
+// --- Formats ------------------------------------------------------------------------------------
+// Each writes a NUL-terminated text into `out` (`size` bytes) and returns its length, or -1 when
+// it doesn't fit or an argument is null (`out` is then the empty text).
+
+// `text` for the inside of a JavaScript string quoted with `quote`. Besides `quote`, everything
+// that could leave the string or a script element is escaped: backslash, line ends, '<', U+2028/9,
+// control characters, bidirectional controls. A byte that is no UTF-8 becomes the lone surrogate
+// \udcXX (as in PEP 383), which a page can tell from every real character.
+int VornQazEscChar(const char* text, char* out, size_t size, char quote);
+// `text` for the inside of a double-quoted CSV field: quotes doubled, line ends and tabs as
+// spaces, and an apostrophe before a text that a spreadsheet would run as a formula.
+int VornQazFormatCsvString(const char* text, char* out, size_t size);
+// Decimal seconds since the epoch as local time, YYYY-MM-DD HH:MM:SS. Fails for anything else.
+int VornQazTimeConvert(const char* seconds, char* out, size_t size);
+
+// Finishes a CSV file: puts a UTF-8 byte order mark before it unless it has one. Atomic; harmless
+// when repeated. 0 or -1.
+int VornQazCsvFile(const char* path);
+
+// Writes the variable `vornSharePath` (share name to folder) to `data` as a script block of its
+// own, once in the life of the process, and flushes it; later calls do nothing. 0, or -1 when the
+// write failed.
+int VornQazImportSharePathHash(const VLIBCSzHash* share_path_hash, FILE* data);
+
+// --- Publishing ---------------------------------------------------------------------------------
+
+// Writes the link to `target_file` into `link`: the profile's `link_base` (default "file://" and
+// `report_dir`) and the rest of the path, percent-encoded. Only for a complete page. 0 or -1.
+int VornGetTargetLink(const VLIBCSzHash* hash, const char* target_file, char* link, size_t size);
+
+// Sends the profile's mail with `link` to the recipients in `mail_to` through `smtp_url`. Waits are
+// bounded. 0 when no mail is wanted or at least one recipient was served (each refused one is a
+// syslog line); -1, with one syslog line, when nobody was.
+int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* hash);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

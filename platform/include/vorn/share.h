@@ -1,0 +1,54 @@
+// Shares: the sections of share.conf (see VORN_PATH_SHARES), and the file systems they lie on.
+//
+// A share name is 1 to 64 bytes of UTF-8 without control characters, quotes, backslash, '<', '>',
+// '/', comma or tab; it is no number (the statistics columns would turn 007 into 7) and doesn't
+// begin with '=', '+', '-' or '@' (it is the first, unformatted field of a CSV line).
+#ifndef VORN_SHARE_H
+#define VORN_SHARE_H
+
+#include <stddef.h>
+
+#include "vorn/text.h"
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+// Kinds of shares to enumerate. This platform has one kind and ignores the flags.
+enum { VORN_SHARE_ENUM_ALL = 0x207 };
+
+// Appends the names of all usable shares to `*list` in file order; a bad name is skipped with one
+// syslog line. The number of shares, or -1 when share.conf can't be read.
+int VORNShareEnum(VLIBCSzList** list, int flags);
+
+// Writes the folder of `share` into `path` (`size` bytes): absolute, without a slash at the end.
+// 0; -1 when the share is unknown, has no path, or has one that the product can't work with (not
+// absolute, a single quote or control character in it, too long), with one syslog line.
+int VORNSharePathGet(const char* share, char* path, size_t size);
+
+// Non-zero when the share keeps a file index (the key `file_index` of its section).
+int VORNShareFileIndexIsEnabled(const char* share);
+// Writes the path of the share's file index database. 0, or -1 when it keeps none or the path is
+// not absolute (one syslog line).
+int VORNShareFileIndexDBPathGet(const char* share, char* path, size_t size);
+
+// Kinds of file systems. Those below are walked but for VORN_FS_REMOTE.
+enum VornFsKind {
+  VORN_FS_OTHER = 0,   // kernel file systems, FUSE of unknown make, removable media formats
+  VORN_FS_EXT = 1,     // ext2, ext3, ext4
+  VORN_FS_XFS = 2,     // XFS, F2FS
+  VORN_FS_COW = 3,     // Btrfs, ZFS, bcachefs
+  VORN_FS_MEMORY = 4,  // tmpfs, overlay
+  VORN_FS_REMOTE = 5,  // NFS, CIFS: counted on the server that owns them
+  VORN_FS_CLUSTER = 6  // CephFS, GlusterFS, Lustre, GPFS, OCFS2, GFS2
+};
+
+// The kind of the file system that holds `path` (a VornFsKind), or -1 when it can't be told.
+// `flags` must be 0.
+int VORNGetFSType(const char* path, int flags);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif
