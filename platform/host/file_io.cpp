@@ -1,0 +1,110 @@
+#include "file_io.hpp"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <filesystem>
+#include <system_error>
+
+namespace host {
+
+ErrnoKeeper::ErrnoKeeper() : saved_(errno) {}
+ErrnoKeeper::~ErrnoKeeper() {
+  errno = saved_;
+}
+
+std::optional<std::string> read_file(const std::string& path, std::size_t limit) {
+  const Fd fd(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  struct stat status {};
+  if (!fd || fstat(fd.get(), &status) != 0) {
+    return std::nullopt;
+  }
+  if (!S_ISREG(status.st_mode)) {
+    errno = S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
+    return std::nullopt;
+  }
+  std::string text;
+  char chunk[16384];
+  for (;;) {
+    const ssize_t got = read(fd.get(), chunk, sizeof chunk);
+    if (got == 0) {
+      return text;
+    }
+    if (got < 0) {
+      if (errno == EINTR) {
+        continue;
+      }
+      return std::nullopt;
+    }
+    text.append(chunk, static_cast<std::size_t>(got));
+    if (text.size() > limit) {
+      errno = EFBIG;
+      return std::nullopt;
+    }
+  }
+}
+
+bool write_all(int fd, std::string_view text) {
+  while (!text.empty()) {
+    const ssize_t put = write(fd, text.data(), text.size());
+    if (put >= 0) {
+      text.remove_prefix(static_cast<std::size_t>(put));
+    } else if (errno != EINTR) {
+      return false;
+    }
+  }
+  return true;
+}
+
+AtomicFile::AtomicFile(std::string path) : path_(std::move(path)) {
+  const std::size_t slash = path_.rfind('/') + 1;  // 0 without a slash: npos wraps around
+  temporary_ = path_.substr(0, slash) + "." + path_.substr(slash) + ".XXXXXX";
+  fd_ = Fd(mkostemp(temporary_.data(), O_CLOEXEC));
+  if (!fd_) {
+    temporary_.clear();
+  }
+}
+
+AtomicFile::~AtomicFile() {
+  if (!temporary_.empty()) {
+    const ErrnoKeeper keeper;
+    unlink(temporary_.c_str());
+  }
+}
+
+bool AtomicFile::commit() {
+  if (fsync(fd_.get()) != 0 || rename(temporary_.c_str(), path_.c_str()) != 0) {
+    return false;
+  }
+  temporary_.clear();
+  // The new content is in place whatever comes of this; it only decides what a power cut keeps.
+  const ErrnoKeeper keeper;
+  const std::string folder = path_.substr(0, path_.rfind('/') + 1);
+  const Fd opened(open(folder.empty() ? "." : folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (opened) {
+    fsync(opened.get());
+  }
+  return true;
+}
+
+bool make_folders(const std::string& path) {
+  const int saved_errno = errno;
+  std::error_code error;
+  std::filesystem::create_directories(path, error);
+  errno = error ? error.value() : saved_errno;
+  return !error;
+}
+
+bool remove_tree(const std::string& path) {
+  const int saved_errno = errno;
+  // libstdc++ walks with openat and O_NOFOLLOW, so a folder that is swapped for a link half-way
+  // leads nowhere.
+  std::error_code error;
+  std::filesystem::remove_all(path, error);
+  errno = error ? error.value() : saved_errno;
+  return !error;
+}
+
+}  // namespace host

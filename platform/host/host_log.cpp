@@ -1,0 +1,27 @@
+#include "host_log.hpp"
+
+#include <syslog.h>
+
+#include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+
+namespace host {
+
+void log_line(const char* format, ...) {
+  const int saved_errno = errno;
+  char line[4096];
+  va_list args;
+  va_start(args, format);
+  vsnprintf(line, sizeof line, format, args);
+  va_end(args);
+  for (char* c = line; *c != '\0'; ++c) {
+    if (static_cast<unsigned char>(*c) < ' ' || *c == '\x7f') {
+      *c = '?';
+    }
+  }
+  syslog(LOG_ERR, "%s", line);
+  errno = saved_errno;
+}
+
+}  // namespace host

@@ -1,0 +1,13 @@
+// The platform's log lines.
+#ifndef VORN_HOST_LOG_HPP
+#define VORN_HOST_LOG_HPP
+
+namespace host {
+
+// One line to syslog (LOG_ERR) that says what is wrong and what to do. Names from disk may go in as
+// they are: control characters come out as '?', so that a problem is always one line. errno stays.
+[[gnu::format(printf, 1, 2)]] void log_line(const char* format, ...);
+
+}  // namespace host
+
+#endif

@@ -1,0 +1,34 @@
+#include "page.hpp"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <string_view>
+
+#include "file_io.hpp"
+
+namespace host {
+
+bool page_is_complete(const char* path) {
+  constexpr std::string_view kLastLine = "\n</html>";
+  const ErrnoKeeper keeper;
+  const Fd fd(open(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  struct stat status {};
+  if (!fd || fstat(fd.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
+    return false;
+  }
+  char buffer[16];
+  const off_t start = std::max<off_t>(status.st_size - static_cast<off_t>(sizeof buffer), 0);
+  const ssize_t got = pread(fd.get(), buffer, sizeof buffer, start);
+  if (got <= 0) {
+    return false;
+  }
+  std::string_view tail(buffer, static_cast<std::size_t>(got));
+  if (tail.back() == '\n') {
+    tail.remove_suffix(1);
+  }
+  return tail.ends_with(kLastLine);
+}
+
+}  // namespace host

@@ -1,0 +1,160 @@
+#include "support.hpp"
+
+#include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <stdexcept>
+
+namespace support {
+namespace {
+
+int log_socket = -1;
+
+// The tests write to the product's fixed places; only the sandbox makes those private.
+void require_sandbox() {
+  std::ifstream mounts("/proc/self/mounts");
+  for (std::string line; std::getline(mounts, line);) {
+    if (line.find(" /usr/vorn ") != std::string::npos) {
+      return;
+    }
+  }
+  std::fprintf(stderr, "platform_tests: run it through tools/sandbox.sh\n");
+  std::exit(2);
+}
+
+void bind_log_socket() {
+  log_socket = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  std::snprintf(address.sun_path, sizeof address.sun_path, "/dev/log");
+  unlink(address.sun_path);
+  if (bind(log_socket, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0) {
+    std::perror("platform_tests: /dev/log");
+    std::exit(2);
+  }
+}
+
+class Environment : public testing::Environment {
+ public:
+  void SetUp() override {
+    require_sandbox();
+    bind_log_socket();
+  }
+};
+
+[[maybe_unused]] const testing::Environment* const environment =
+    testing::AddGlobalTestEnvironment(new Environment);
+
+// Each test begins with an empty log, and no test can fill the socket's queue for the next.
+class LogDrainer : public testing::EmptyTestEventListener {
+  void OnTestStart(const testing::TestInfo&) override { syslog_lines(); }
+};
+
+[[maybe_unused]] const bool drainer_added = [] {
+  testing::UnitTest::GetInstance()->listeners().Append(new LogDrainer);
+  return true;
+}();
+
+}  // namespace
+
+TempFolder::TempFolder() {
+  std::string name = "/tmp/vorn-test-XXXXXX";
+  if (mkdtemp(name.data()) == nullptr) {
+    throw std::runtime_error("mkdtemp");
+  }
+  path_ = name;
+}
+
+TempFolder::~TempFolder() {
+  std::error_code ignored;
+  std::filesystem::remove_all(path_, ignored);
+}
+
+std::string TempFolder::path(std::string_view name) const {
+  return name.empty() ? path_ : path_ + "/" + std::string(name);
+}
+
+void write_file(const std::string& path, std::string_view content) {
+  std::filesystem::create_directories(std::filesystem::path(path).parent_path());
+  std::ofstream file(path, std::ios::binary | std::ios::trunc);
+  file << content;
+  if (!file.flush()) {
+    throw std::runtime_error("can't write " + path);
+  }
+}
+
+std::string read_file(const std::string& path) {
+  std::ifstream file(path, std::ios::binary);
+  return file ? std::string(std::istreambuf_iterator<char>(file), {}) : "<absent>";
+}
+
+bool exists(const std::string& path) {
+  return std::filesystem::symlink_status(path).type() != std::filesystem::file_type::not_found;
+}
+
+std::vector<std::string> syslog_lines() {
+  std::vector<std::string> lines;
+  char message[8192];
+  ssize_t size = 0;
+  while ((size = recv(log_socket, message, sizeof message, 0)) >= 0) {
+    // "<11>Jan  2 03:04:05 tag: text"; the tag is the test program's name
+    const std::string line(message, static_cast<std::size_t>(size));
+    const std::size_t tag_end = line.find(": ");
+    lines.push_back(tag_end == std::string::npos ? line : line.substr(tag_end + 2));
+  }
+  return lines;
+}
+
+std::string syslog_text() {
+  std::string text;
+  for (const std::string& line : syslog_lines()) {
+    text += (text.empty() ? "" : "\n") + line;
+  }
+  return text;
+}
+
+pid_t fork_child(const std::function<int()>& work) {
+  std::fflush(nullptr);
+  const pid_t child = fork();
+  if (child == 0) {
+    _exit(work());
+  }
+  return child;
+}
+
+int wait_child(pid_t child) {
+  int status = 0;
+  while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
+  }
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+}
+
+Hash make_hash(const std::vector<std::pair<std::string, std::string>>& entries) {
+  VLIBCSzHash* hash = VLIBCSzHashAlloc(512);
+  for (const auto& [key, value] : entries) {
+    VLIBCSzHashSetValue(&hash, key.c_str(), value.c_str());
+  }
+  return Hash(hash);
+}
+
+List make_list() {
+  return List(VLIBCSzListAlloc(512));
+}
+
+std::vector<std::string> texts(const List& list) {
+  std::vector<std::string> result;
+  for (int i = 0; i < VLIBCSzListCount(list.get()); ++i) {
+    result.emplace_back(VLIBCSzListGet(list.get(), i));
+  }
+  return result;
+}
+
+}  // namespace support
