@@ -1,0 +1,135 @@
+#!/bin/bash
+# Builds the product and makes a first report of some folders, without installing anything but the
+# packages it is built with: quickstart.sh [FOLDER...]   (default: your home folder)
+#
+# The last line it prints is the path of the report page.
+set -euo pipefail
+export LC_ALL=C.UTF-8
+
+root=$(realpath -- "$(dirname -- "$0")")
+build=$root/build/quickstart
+stage=$root/build/quickstart-stage
+report_dir=$root/quickstart-report
+profile=quickstart
+
+fail() {
+  echo "quickstart.sh: $*" >&2
+  exit 1
+}
+
+# What the product would refuse or change in a path that a configuration file gives it.
+check_path() { # PATH WHAT
+  case $1 in
+    *\'* | *[[:cntrl:]]*) fail "$2 has a single quote or a control character in its path: $1" ;;
+    *' ') fail "$2 has a blank at the end of its path: $1" ;;
+  esac
+}
+
+folders=()
+find_folders() { # FOLDER...
+  local folder
+  if [[ $# -eq 0 ]]; then
+    set -- "$(getent passwd "${SUDO_USER:-$(id -un)}" | cut -d: -f6)"
+  fi
+  for folder; do
+    [[ -n $folder && -e $folder ]] || fail "no such folder: $folder"
+    [[ -d $folder ]] || fail "not a folder: $folder"
+    folder=$(realpath -- "$folder")
+    check_path "$folder" "the folder"
+    folders+=("$folder")
+  done
+}
+
+# A share name from a folder's name: what a name can't hold becomes "_", a number gets a word
+# before it, and a name that is taken a number after it.
+declare -A taken=()
+share_name() { # FOLDER; sets $name
+  name=${1##*/}
+  name=$(printf '%s' "${name:-root}" | iconv -c -f UTF-8 -t UTF-8 | tr -s ' ')
+  name=${name//[[:cntrl:]\"\'\`\\<>,\[\]#;=]/_}
+  while [[ $(printf '%s' "$name" | wc -c) -gt 56 ]]; do
+    name=${name%?}
+  done
+  name=${name# } name=${name% }
+  if [[ -z $name || $name =~ ^[-+.0-9eE]+$ || $name == [-+=@]* ]]; then
+    name=share$name
+  fi
+  local base=$name number=1
+  while [[ -n ${taken[$name]-} ]]; do
+    number=$((number + 1))
+    name="$base-$number"
+  done
+  taken[$name]=1
+}
+
+write_configuration() {
+  local folder
+  : >"$stage/usr/vorn/etc/share.conf"
+  for folder in "${folders[@]}"; do
+    share_name "$folder"
+    printf '[%s]\npath = %s\n' "$name" "$folder" >>"$stage/usr/vorn/etc/share.conf"
+  done
+  cat >>"$stage/usr/vorn/etc/vornreport.conf" <<CONF
+
+[$profile]
+report_list = share_list,large_file
+report_dir = $report_dir
+CONF
+}
+
+# The user who called sudo gets what was made for them.
+give_back() {
+  if [[ $EUID -eq 0 && -n ${SUDO_UID-} ]]; then
+    chown -Rh "$SUDO_UID:${SUDO_GID:-$SUDO_UID}" "$root/build" "$report_dir" 2>/dev/null || true
+  fi
+}
+
+show_rows() { # CSV-FILE COLUMN-OF-NAME COUNT
+  # Names may hold anything; a terminal gets no control characters from them.
+  tail -n +2 "$1" | head -n "$3" | tr -d '\000-\010\013-\037\177' | sed 's/^"//; s/"$//; s/""/"/g' |
+    awk -F '"\t"' -v column="$2" '{ print $NF "\t" $column }' |
+    numfmt --delimiter=$'\t' --to=iec-i --suffix=B | awk -F '\t' '{ printf "  %10s  %s\n", $1, $2 }'
+}
+
+check_path "$report_dir" "the report folder"
+find_folders "$@"
+# shellcheck source=tools/packages.sh
+. "$root/tools/packages.sh"
+trap give_back EXIT
+
+echo "== Packages"
+install_missing "${build_packages[@]}"
+
+echo "== Build"
+cmake -S "$root" -B "$build" -G Ninja -DCMAKE_BUILD_TYPE=Release -DBUILD_TESTING=OFF >/dev/null
+cmake --build "$build" --parallel "$(nproc)"
+
+echo "== Report"
+rm -rf "$stage"
+mkdir -p "$stage" "$report_dir"
+DESTDIR=$stage cmake --install "$build" >/dev/null
+write_configuration
+log=()
+if [[ -S /dev/log ]]; then
+  log=(--log /dev/log)
+fi
+# The machine's own /tmp, so that a folder in it can be reported on.
+"$root/tools/sandbox.sh" --stage "$stage" --tmp /tmp "${log[@]}" -- \
+  /usr/vorn/bin/vornreport --report "$profile" >"$stage/output" || true
+
+page=''
+if [[ $(head -n 1 "$stage/usr/vorn/var/status/$profile" 2>/dev/null) == success ]]; then
+  page=$(find "$report_dir/$profile" -mindepth 2 -maxdepth 2 -name report.html \
+    -newer "$stage/usr/vorn/etc/vornreport.conf" | sort | tail -n 1)
+fi
+if [[ -z $page ]]; then
+  tail -n 40 "$stage/output" >&2
+  fail "the report failed; its messages stand above and in the system log"
+fi
+
+echo "Shares:"
+show_rows "${page%/*}/csv/share_list.csv" 1 20
+echo "Largest files:"
+show_rows "${page%/*}/csv/large_file.csv" 2 5
+echo "The report page:"
+echo "$page"

@@ -1,0 +1,41 @@
+# shellcheck shell=bash disable=SC2034
+# The Debian packages that the project needs, and how they get onto a machine. Sourced.
+
+# To build and to try the product.
+build_packages=(
+  g++ cmake ninja-build pkg-config
+  libsqlite3-dev libcurl4-openssl-dev libmount-dev libssl-dev
+  bubblewrap
+)
+# Besides those, to run all tests. (CMake looks for GoogleTest only when tests are built.)
+test_packages=(
+  libgtest-dev python3 python3-aiosmtpd chromium shellcheck
+)
+
+as_root() {
+  if [[ $EUID -eq 0 ]]; then
+    "$@"
+  else
+    sudo "$@"
+  fi
+}
+
+install_missing() { # PACKAGE...
+  local package missing=()
+  for package; do
+    if ! dpkg-query -W -f '${db:Status-Status}\n' "$package" 2>/dev/null | grep -qx installed; then
+      missing+=("$package")
+    fi
+  done
+  if [[ ${#missing[@]} -eq 0 ]]; then
+    return 0
+  fi
+  echo "Installing: ${missing[*]}"
+  if [[ $EUID -ne 0 ]] && ! command -v sudo >/dev/null; then
+    echo "Run this as root, or install the packages above." >&2
+    return 1
+  fi
+  as_root env DEBIAN_FRONTEND=noninteractive apt-get update -q
+  as_root env DEBIAN_FRONTEND=noninteractive apt-get install -qy --no-install-recommends \
+    "${missing[@]}"
+}
