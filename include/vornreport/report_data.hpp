@@ -1,0 +1,34 @@
+// The report data file, "/tmp/vornreport_data.<pid>": the growing page that every report appends
+// one block to. And the one fact about a run that outlives the report that saw it: whether data was
+// lost on the way to the page.
+#pragma once
+
+#include <cstdio>
+
+#include "vornreport/fixed_text.hpp"
+#include "vornreport/handles.hpp"
+
+namespace vornreport {
+
+// The data file's path for this process.
+PathText report_data_path();
+
+// Opens a file for appending or writing and logs "open file=%s failed" (nested form, `module`,
+// `line`) when that fails; when the disk is the reason, the run's data counts as lost.
+FileHandle open_report_file(const char* path, const char* mode, const char* module, int line);
+
+// Closes a file that rows went to. When a write or the close failed (a full disk), logs it, marks
+// the run's data as lost and returns false. An empty handle is fine.
+bool close_report_file(FileHandle file, const char* path, const char* module, int line);
+
+// Reports run on after one of them lost data, but a page made from what is left must never look
+// complete: the report action asks here before it assembles one. Never reset; a process makes one
+// report.
+void mark_report_data_lost();
+bool report_data_lost();
+
+// Whether a failed SQLite call means that data was lost (full disk, I/O error), rather than that
+// one statement was wrong. `result` is the call's result code.
+bool is_storage_failure(int result);
+
+}  // namespace vornreport

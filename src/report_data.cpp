@@ -1,0 +1,67 @@
+#include "vornreport/report_data.hpp"
+
+#include <unistd.h>
+
+#include <cerrno>
+
+#include "vorn/paths.h"
+#include "vornreport/error_log.hpp"
+
+namespace vornreport {
+namespace {
+
+bool g_data_lost = false;
+
+}  // namespace
+
+PathText report_data_path() {
+  PathText path;
+  path.format(VORN_TMP_DATA_FORMAT, static_cast<unsigned>(getpid()));
+  return path;
+}
+
+FileHandle open_report_file(const char* path, const char* mode, const char* module, int line) {
+  FileHandle file(std::fopen(path, mode));
+  if (!file) {
+    const bool no_room = errno == ENOSPC || errno == EDQUOT || errno == EIO || errno == EROFS;
+    REPORT_LOG_ERR_NESTED(module, line, "open file=%s failed", path);
+    if (no_room) {
+      mark_report_data_lost();
+    }
+  }
+  return file;
+}
+
+bool close_report_file(FileHandle file, const char* path, const char* module, int line) {
+  if (!file) {
+    return true;
+  }
+  const bool wrote = std::ferror(file.get()) == 0 && std::fflush(file.get()) == 0;
+  const int error = errno;
+  const bool closed = std::fclose(file.release()) == 0;
+  if (wrote && closed) {
+    return true;
+  }
+  if (!wrote) {
+    errno = error;  // what the close says after a failed write is beside the point
+  }
+  REPORT_LOG_ERR_NESTED(module, line, "write file=%s failed, the report would be incomplete", path);
+  mark_report_data_lost();
+  return false;
+}
+
+void mark_report_data_lost() {
+  g_data_lost = true;
+}
+
+bool report_data_lost() {
+  return g_data_lost;
+}
+
+bool is_storage_failure(int result) {
+  const int primary = result & 0xFF;
+  return primary == SQLITE_FULL || primary == SQLITE_IOERR || primary == SQLITE_CORRUPT ||
+         primary == SQLITE_READONLY || primary == SQLITE_CANTOPEN;
+}
+
+}  // namespace vornreport
