@@ -1,0 +1,26 @@
+// The statistics database of a run: one row of `file_stat` for every regular file found.
+#pragma once
+
+#include <sys/stat.h>
+
+#include "vornreport/handles.hpp"
+
+namespace vornreport {
+
+// One file to be inserted. All of it belongs to the caller.
+struct FileInfo {
+  const char* szShare;     // required
+  const char* szPath;      // full path; required
+  const char* szName;      // last component
+  const char* szType;      // type label; null is stored as the empty text
+  const struct stat* pst;  // required; only st_uid, st_mtime and st_size are read
+};
+
+// Opens the database at `real_path_stat_db` and makes its table, both when missing. Null on
+// failure, which is logged.
+SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash);
+
+// Inserts one file. 0, or -1 (logged) with nothing inserted.
+int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo);
+
+}  // namespace vornreport

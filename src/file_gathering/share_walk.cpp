@@ -1,0 +1,211 @@
+// The walk runs as root over folders whose owners can rename and replace them meanwhile. A path is
+// looked up once, for the share's top folder; from there every folder is opened and every file
+// examined by name relative to the handle of its parent, never through a link. So a user who swaps
+// a folder for a link while the walk is inside can't lead it out of the share. Paths are only text
+// for rows and messages.
+#include "share_walk.hpp"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+#include <string_view>
+
+#include "module.hpp"
+#include "vorn/share.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/fixed_text.hpp"
+#include "vornreport/handles.hpp"
+#include "vornreport/statistics_db.hpp"
+
+namespace vornreport {
+namespace {
+
+constexpr std::string_view kIndexFolder = "@eaDir";
+// Link-free look-ups that don't set off an automount either: autofs is never walked.
+constexpr int kNoFollow = AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT;
+
+bool is_walked_kind(int kind) {
+  return kind == VORN_FS_EXT || kind == VORN_FS_XFS || kind == VORN_FS_COW ||
+         kind == VORN_FS_MEMORY || kind == VORN_FS_CLUSTER;
+}
+
+// What a whole walk shares: one path buffer that grows and shrinks with the depth (a tree can be
+// 2048 folders deep, and a buffer a level would be 8 MiB of stack).
+class Walk {
+ public:
+  Walk(sqlite3* db, const char* share, const VLIBCSzHash* types)
+      : db_(db), share_(share), types_(types) {}
+
+  int top(const char* folder) {
+    path_.format("%s", folder);
+    struct stat status {};
+    if (stat(folder, &status) != 0) {
+      return stat_failed();
+    }
+    if (!S_ISDIR(status.st_mode)) {
+      errno = ENOTDIR;
+      return stat_failed();
+    }
+    if (!is_walked_kind(VORNGetFSType(folder, 0))) {
+      return 0;
+    }
+    return read_folder(open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC), std::strlen(folder),
+                       status.st_dev);
+  }
+
+ private:
+  // A folder at path_ (`length` bytes), the entry `name` of its parent.
+  int subfolder(int parent, const char* name, size_t length, dev_t parent_device) {
+    struct stat status {};
+    if (cut_) {
+      errno = ENAMETOOLONG;
+      return stat_failed();
+    }
+    if (fstatat(parent, name, &status, kNoFollow) != 0) {
+      return stat_failed();
+    }
+    if (!S_ISDIR(status.st_mode)) {
+      errno = ENOTDIR;
+      return stat_failed();
+    }
+    // One device is one file system, so its kind is known from the parent.
+    if (status.st_dev != parent_device && !is_walked_kind(VORNGetFSType(path_.c_str(), 0))) {
+      return 0;
+    }
+    return read_folder(openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC),
+                       length, status.st_dev);
+  }
+
+  // Takes over `fd`, which is negative when the open failed.
+  int read_folder(int fd, size_t length, dev_t device) {
+    const DirHandle folder(fd < 0 ? nullptr : fdopendir(fd));
+    if (!folder) {
+      const int failed = open_failed();
+      if (fd >= 0) {
+        close(fd);
+      }
+      return failed;
+    }
+    struct stat opened {};
+    // Replaced between the look and the open: its kind was not the one that was judged.
+    if (fstat(fd, &opened) != 0 || opened.st_dev != device) {
+      return stat_failed();
+    }
+    int error = 0;
+    while (const dirent* entry = next_entry(folder.get(), error)) {
+      add_entry(fd, *entry, length, device);
+      path_.data()[length] = '\0';
+      cut_ = false;
+    }
+    return error == 0 ? 0 : open_failed();
+  }
+
+  // Null at the end of the folder with `error` 0, or when it can't be read on, with errno and
+  // `error` saying why.
+  static const dirent* next_entry(DIR* folder, int& error) {
+    const int before = errno;
+    errno = 0;
+    const dirent* entry = readdir(folder);
+    error = errno;
+    if (error == 0) {
+      errno = before;
+    }
+    return entry;
+  }
+
+  void add_entry(int parent, const dirent& entry, size_t length, dev_t device) {
+    const std::string_view name(entry.d_name);
+    if (name == "." || name == ".." || name == kIndexFolder) {
+      return;
+    }
+    if (entry.d_type != DT_DIR && entry.d_type != DT_REG) {
+      return;
+    }
+    const size_t child_length = append(length, name);
+    if (entry.d_type == DT_REG) {
+      add_file(parent, name);
+    } else if (subfolder(parent, entry.d_name, child_length, device) < 0) {
+      REPORT_LOG_ERR(kGatheringModule, __LINE__, "Failed to process [%s].\n", path_.c_str());
+    }
+  }
+
+  void add_file(int parent, std::string_view name) {
+    struct stat status {};
+    if (cut_) {
+      errno = ENAMETOOLONG;
+      stat_failed();
+      return;
+    }
+    if (fstatat(parent, name.data(), &status, kNoFollow) != 0 || !S_ISREG(status.st_mode)) {
+      stat_failed();
+      return;
+    }
+    const size_t dot = name.rfind('.');
+    const char* label =
+        dot == std::string_view::npos ? kOtherType : type_label(types_, name.data() + dot + 1);
+    const FileInfo info{share_, path_.c_str(), name.data(), label, &status};
+    if (ReportDBAddFile(db_, &info) < 0) {
+      REPORT_LOG_ERR(kGatheringModule, __LINE__, "Failed to add to db [%s].\n", path_.c_str());
+    }
+  }
+
+  // Puts "/name" behind the first `length` bytes of path_. Its new length; what doesn't fit is cut.
+  size_t append(size_t length, std::string_view name) {
+    constexpr size_t kLongest = PathText::size() - 1;
+    char* path = path_.data();
+    size_t end = length;
+    if (end < kLongest) {
+      path[end++] = '/';
+    }
+    const size_t room = kLongest - end;
+    cut_ = name.size() > room || end == length;
+    const size_t count = cut_ ? room : name.size();
+    std::memcpy(path + end, name.data(), count);
+    end += count;
+    path[end] = '\0';
+    return end;
+  }
+
+  int open_failed() {
+    REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Failed to opendir [%s].", path_.c_str());
+    return -1;
+  }
+
+  int stat_failed() {
+    REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Failed to stat [%s].", path_.c_str());
+    return -1;
+  }
+
+  sqlite3* db_;
+  const char* share_;
+  const VLIBCSzHash* types_;
+  PathText path_;     // of the folder or entry being looked at
+  bool cut_ = false;  // path_ is no real path: its end is missing
+};
+
+}  // namespace
+
+int ReportShareWalk(sqlite3* db, const char* szShareName, const char* szFolderPath,
+                    const VLIBCSzHash* pshFileType) {
+  const char* missing = nullptr;
+  if (db == nullptr) {
+    missing = "((void *)0) != db";
+  } else if (szShareName == nullptr) {
+    missing = "((void *)0) != szShareName";
+  } else if (szFolderPath == nullptr) {
+    missing = "((void *)0) != szFolderPath";
+  } else if (pshFileType == nullptr) {
+    missing = "NULL != pshFileType";
+  }
+  if (missing != nullptr) {
+    report_invalid_argument(kGatheringModule, __LINE__, missing);
+    return -1;
+  }
+  return Walk(db, szShareName, pshFileType).top(szFolderPath);
+}
+
+}  // namespace vornreport

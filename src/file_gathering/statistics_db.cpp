@@ -1,0 +1,144 @@
+#include "vornreport/statistics_db.hpp"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdint>
+#include <cstring>
+
+#include "module.hpp"
+#include "vorn/report.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/report_data.hpp"
+
+namespace vornreport {
+namespace {
+
+constexpr char kCreateTable[] =
+    "CREATE TABLE if not exists file_stat (id INTEGER PRIMARY KEY ASC, owner INTEGER, mtime "
+    "INTEGER, size INTEGER, share STRING, path STRING, filename STRING, ext STRING);";
+
+constexpr size_t kQuotedSize = 4096;
+constexpr size_t kStatementSize = 8192;
+using QuotedText = std::array<char, kQuotedSize>;
+
+// `text` quoted as SQLite's "%q" does it; null when it doesn't fit. A text cut between the two
+// halves of a doubled quote would end its literal early and let a file name speak SQL.
+const char* quote(const char* text, QuotedText& buffer) {
+  if (text == nullptr) {
+    return "";
+  }
+  const size_t length = std::strlen(text);
+  if (std::memchr(text, '\'', length) == nullptr) {
+    return length < buffer.size() ? text : nullptr;  // nothing to double
+  }
+  const auto quotes = static_cast<size_t>(std::count(text, text + length, '\''));
+  if (length + quotes >= buffer.size()) {
+    return nullptr;
+  }
+  return sqlite3_snprintf(static_cast<int>(buffer.size()), buffer.data(), "%q", text);
+}
+
+// The first argument that must not be null and is, as the text of its check; null when all are set.
+const char* missing_argument(const sqlite3* db, const FileInfo* info) {
+  if (db == nullptr) {
+    return "((void *)0) != db";
+  }
+  if (info == nullptr) {
+    return "((void *)0) != pFileInfo";
+  }
+  if (info->szShare == nullptr) {
+    return "((void *)0) != pFileInfo->szShare";
+  }
+  if (info->szPath == nullptr) {
+    return "((void *)0) != pFileInfo->szPath";
+  }
+  if (info->pst == nullptr) {
+    return "NULL != pFileInfo->pst";
+  }
+  return nullptr;
+}
+
+void log_exec_failure(const char* sql, const char* message) {
+  REPORT_LOG_ERR(kGatheringModule, __LINE__, "Exec sql:[%s] error: %s\n\n", sql,
+                 message != nullptr ? message : "");
+}
+
+}  // namespace
+
+SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash) {
+  if (profile_hash == nullptr) {
+    REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "bad parameter");
+    return nullptr;
+  }
+  const char* path = set_value(profile_hash, "real_path_stat_db");
+  if (path == nullptr) {
+    REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "get stat db path failed");
+    return nullptr;
+  }
+  if (access(path, F_OK) != 0) {
+    VLIBCFileTouch(path);
+  }
+  VornQazSetEnv();
+  sqlite3* raw = nullptr;
+  const int opened = sqlite3_open(path, &raw);
+  SqliteHandle db(raw);  // there is a handle to close even when the open failed
+  if (opened != SQLITE_OK) {
+    REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Can't open database: %s\n",
+                          sqlite3_errmsg(raw));
+    return nullptr;
+  }
+  VornQazSetEnv();
+  char* message = nullptr;
+  if (const int made = sqlite3_exec(raw, kCreateTable, nullptr, nullptr, &message);
+      made != SQLITE_OK) {
+    const SqliteText owned(message);
+    log_exec_failure(kCreateTable, message);
+    if (is_storage_failure(made)) {
+      mark_report_data_lost();
+    }
+    return nullptr;
+  }
+  return db;
+}
+
+int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo) {
+  if (const char* condition = missing_argument(db, pFileInfo); condition != nullptr) {
+    report_invalid_argument(kGatheringModule, __LINE__, condition);
+    return -1;
+  }
+  static QuotedText path_buffer;
+  static QuotedText name_buffer;
+  static QuotedText type_buffer;
+  static std::array<char, kStatementSize> statement;
+  const char* path = quote(pFileInfo->szPath, path_buffer);
+  const char* name = quote(pFileInfo->szName, name_buffer);
+  const char* type = quote(pFileInfo->szType, type_buffer);
+  if (path == nullptr || name == nullptr || type == nullptr) {
+    log_exec_failure("INSERT INTO file_stat", sqlite3_errstr(SQLITE_TOOBIG));
+    return -1;
+  }
+  // One longer than the buffer is cut inside a literal, and SQLite refuses it.
+  std::snprintf(statement.data(), statement.size(),
+                "INSERT INTO file_stat (owner, mtime, size, share, path, filename, ext) VALUES "
+                "(%u, %u, %llu, '%s', '%s', '%s', '%s');",
+                static_cast<unsigned>(pFileInfo->pst->st_uid),
+                static_cast<unsigned>(pFileInfo->pst->st_mtime),
+                static_cast<unsigned long long>(pFileInfo->pst->st_size), pFileInfo->szShare, path,
+                name, type);
+  VornQazSetEnv();
+  char* message = nullptr;
+  const int result = sqlite3_exec(db, statement.data(), nullptr, nullptr, &message);
+  if (result == SQLITE_OK) {
+    return 0;
+  }
+  const SqliteText owned(message);
+  log_exec_failure(statement.data(), message);
+  if (is_storage_failure(result)) {
+    mark_report_data_lost();
+  }
+  return -1;
+}
+
+}  // namespace vornreport
