@@ -1,0 +1,10 @@
+#pragma once
+
+#include "vornreport/report_args.hpp"
+
+namespace vornreport {
+
+// The largest files, biggest first: 200 on the page, 10000 in the CSV file.
+int32_t large_file_db(ReportArgs* args);
+
+}  // namespace vornreport

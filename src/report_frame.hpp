@@ -1,0 +1,102 @@
+// What every report over the statistics database shares: one query, streamed row by row into a
+// block of the report data file and into a CSV file.
+//
+// A report is a StatisticsReport record; the frame runs it. In the data file a report with rows is
+//
+//   <script type='text/javascript'>
+//   var <variable> = [
+//   [ 'column 0', 'column 1', ... ],
+//   [ ... ]
+//   ];
+//   </script>
+//
+// and one without rows is a lone "</script>". In the CSV file it is the header line and then, for
+// each row, every column in double quotes, separated by tabs.
+#pragma once
+
+#include <cstdint>
+#include <cstdio>
+#include <span>
+
+#include "vorn/text.h"
+#include "vornreport/report_args.hpp"
+
+namespace vornreport {
+
+// Where the value of an output column comes from.
+enum class ColumnSource : uint8_t {
+  kQuery,        // the query's column `index`
+  kShareVolume,  // identifier of the volume that holds the share named in query column `index`;
+                 // a share without a volume has no row
+};
+
+// How a value is written.
+enum class ColumnText : uint8_t {
+  kRaw,      // as it is
+  kEscaped,  // data file: escaped for a single-quoted string; empty, and logged, when that fails
+  kField,    // CSV: formatted for a quoted field; raw when that fails
+};
+
+struct ReportColumn {
+  ColumnSource source;
+  int index;
+  ColumnText data_text;
+  ColumnText csv_text;
+};
+
+// The usual columns: the first is written as it is, a path is escaped for the page, the rest is
+// formatted for the CSV only.
+constexpr ReportColumn raw_column(int index) {
+  return {ColumnSource::kQuery, index, ColumnText::kRaw, ColumnText::kRaw};
+}
+constexpr ReportColumn path_column(int index) {
+  return {ColumnSource::kQuery, index, ColumnText::kEscaped, ColumnText::kField};
+}
+constexpr ReportColumn field_column(int index) {
+  return {ColumnSource::kQuery, index, ColumnText::kRaw, ColumnText::kField};
+}
+constexpr ReportColumn share_volume_column(int index) {
+  return {ColumnSource::kShareVolume, index, ColumnText::kRaw, ColumnText::kRaw};
+}
+
+// Whether the folders of all shares are written to the page before the first row.
+enum class SharePaths : uint8_t { kLeftOut, kImported };
+
+// One report.
+struct StatisticsReport {
+  const char* name;    // registry name and name of the CSV file
+  const char* module;  // in log lines
+  const char* sql;
+  const char* variable;    // JavaScript variable of the page
+  const char* csv_header;  // without line feed
+  uint64_t js_limit;       // rows for the page; 0: all
+  uint64_t csv_limit;      // rows for the CSV file; 0: all
+  SharePaths share_paths;
+  std::span<const ReportColumn> columns;
+};
+
+// The context of a row writer, which SQLite hands through.
+struct report_row_ctx {
+  FILE* data_fp;
+  FILE* csv_fp;
+  uint64_t js_limit;   // rows whose ordinal, from 0, is at or above it stay out of the data file
+  uint64_t csv_limit;  // the same for the CSV file
+  uint64_t row_count;  // rows seen so far
+  const char* section_user;
+  const VLIBCSzHash* filter_user;
+  const VLIBCSzHash* volume_path_hash;
+  const VLIBCSzHash* share_path_hash;
+  const VLIBCSzHash* profile_hash;
+  QAZLLNode** dup_list;
+  QAZLLNode** dup_group_list;
+  const StatisticsReport* report;  // the record whose rows are written
+};
+
+// Runs one report. 0; -1 on failure, which is logged: what was written by then stays, and the CSV
+// file is not finished.
+int32_t run_statistics_report(const StatisticsReport& report, const ReportArgs* args);
+
+// The row writer: an sqlite3_exec callback over a report_row_ctx. 0 to go on, -1 to stop the query.
+int report_row_writer(void* context, int columns, char** values, char** names) noexcept;
+
+}  // namespace vornreport
