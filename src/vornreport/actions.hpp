@@ -1,0 +1,33 @@
+// The three actions of the command line. Each takes the arguments behind the option (element 0 is
+// the profile name, a null pointer ends them) or null; main ignores the results.
+#pragma once
+
+#include "vorn/text.h"
+#include "vornreport/fixed_text.hpp"
+
+namespace vornreport {
+
+// Gathers and produces one report. 0 when it was made or the profile is already running, else -1.
+int report_action(char** args);
+// Collects what accumulates over time; null stands for the profile "global". The number of
+// selected reports, 0, or -1.
+int collect_action(char** args);
+// Removes the schedule and temporary state of one profile, or of all. 0, or negative when it
+// stopped early.
+int clean_action(char** args);
+
+// Steps of the report action.
+
+// Starts the report data file, gathers and runs the selected reports; writes the data file's path
+// into `out_path`. The number of reports run minus one, or -1.
+int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, char* out_path,
+                       int out_size);
+// Completes the page and moves it into the dated working folder. The number of selected reports;
+// 0 when none is known; -1 on failure.
+int build_report_html(const char* profile, const VLIBCSzHash* profile_hash, const char* data_path);
+// Gives the working folder its final name. 0 when the command was run, else -1.
+int correct_report_dir(const char* profile, const VLIBCSzHash* profile_hash);
+// Makes the share link and mails it. -1 only for bad arguments.
+int publish_report(const char* profile, const VLIBCSzHash* profile_hash);
+
+}  // namespace vornreport

@@ -1,0 +1,8 @@
+// The driver's module name in log lines.
+#pragma once
+
+namespace vornreport {
+
+inline constexpr char kDriverModule[] = "src/vornreport";
+
+}  // namespace vornreport

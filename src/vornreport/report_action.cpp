@@ -1,0 +1,168 @@
+#include <unistd.h>
+
+#include <array>
+#include <cstring>
+#include <string>
+
+#include "actions.hpp"
+#include "file_gathering/file_gathering.hpp"
+#include "module.hpp"
+#include "profile.hpp"
+#include "shell.hpp"
+#include "sigterm.hpp"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+#include "vorn/volume.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/registry.hpp"
+#include "vornreport/report_data.hpp"
+
+namespace vornreport {
+namespace {
+
+// What every report of a run looks things up in.
+struct LookUps {
+  HashHandle users;
+  HashHandle volumes;
+  HashHandle shares;
+};
+
+void gather_when_needed(const char* profile, const VLIBCSzHash* profile_hash,
+                        const char* report_list) {
+  for (const ReportEntry& entry : report_registry()) {
+    if (entry.source == ReportSource::kStatistics && is_selected(entry, report_list)) {
+      file_gathering(profile, profile_hash);
+      return;
+    }
+  }
+}
+
+bool load_volumes_and_shares(LookUps& look_ups) {
+  if (with_address(look_ups.volumes, VornQazGetVolumePathHash) < 0 || !look_ups.volumes) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 259, "Failed to get volume path info");
+    return false;
+  }
+  look_ups.shares.reset(VLIBCSzHashAlloc(kPlatformSlots));
+  if (!look_ups.shares) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 262, "malloc hash failed");
+    return false;
+  }
+  if (with_address(look_ups.shares, VornQazGetSharePathHash) < 0 || !look_ups.shares) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 266, "Failed to get share path info");
+    return false;
+  }
+  return true;
+}
+
+// The number of reports run minus one.
+int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
+                         const char* report_list, const LookUps& look_ups) {
+  int result = -1;
+  for (const ReportEntry& entry : report_registry()) {
+    if (!is_selected(entry, report_list)) {
+      continue;
+    }
+    ++result;
+    ReportArgs args{profile,
+                    profile_hash,
+                    look_ups.users.get(),
+                    look_ups.volumes.get(),
+                    look_ups.shares.get(),
+                    nullptr,
+                    nullptr,
+                    0};
+    report_trace(kDriverModule, 280, "##### inject report=%s\n\n", entry.name);
+    // One failing report does not stop the others; it has logged why.
+    entry.report(&args);
+  }
+  return result;
+}
+
+// Steps of a loaded profile up to the published report. 0 or -1.
+int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
+  report_trace(kDriverModule, 357, "create report, profile name=%s\n\n", profile);
+  PathText data_path;
+  // Not checked: what the data file holds is assembled even when a part of it failed. Lost data is
+  // another matter: it never becomes a page.
+  create_report_data(profile, profile_hash, data_path.data(), PathText::size());
+  report_trace(kDriverModule, 363, "########## report.tmp=%s\n\n", data_path.c_str());
+  if (report_data_lost() || build_report_html(profile, profile_hash, data_path.c_str()) < 1) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 366, "create template failed");
+    VornQazReportCleanTmp(profile, profile_hash);
+    return -1;
+  }
+  if (correct_report_dir(profile, profile_hash) < 0) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 370, "correct dir failed");
+    VornQazReportCleanTmp(profile, profile_hash);
+    return -1;
+  }
+  publish_report(profile, profile_hash);
+  VornQazStatusUpdate(profile, "success");
+  return 0;
+}
+
+}  // namespace
+
+int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, char* out_path,
+                       int out_size) {
+  if (is_unset(profile) || profile_hash == nullptr || out_size <= 0) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 221, "Bad Parameter");
+    return -1;
+  }
+  const char* report_list = set_value(profile_hash, "report_list");
+  if (report_list == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 226, "No report selected");
+    return -1;
+  }
+  report_trace(kDriverModule, 229, "report list=%s\n\n", report_list);
+  LookUps look_ups;
+  if (with_address(look_ups.users, VornQazInitFilterUser) < 0 || !look_ups.users) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 232, "init user failed");
+    return -1;
+  }
+  std::snprintf(out_path, static_cast<size_t>(out_size), "%s", report_data_path().c_str());
+  run_command(238, VORN_PATH_TEMPLATE_SCRIPT " header %s", out_path);
+  std::array<char, 8> language{};
+  if (VornQazImportLang(profile_hash, language.data(), language.size()) < 0 ||
+      is_unset(language.data())) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 241, "Failed to setting language");
+    return -1;
+  }
+  run_command(244, VORN_PATH_TEMPLATE_SCRIPT " lang %s %s", out_path, language.data());
+  gather_when_needed(profile, profile_hash, report_list);
+  if (!load_volumes_and_shares(look_ups)) {
+    return -1;
+  }
+  return run_selected_reports(profile, profile_hash, report_list, look_ups);
+}
+
+int report_action(char** args) {
+  if (args == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 334, "Bad Parameter");
+    return -1;
+  }
+  const char* profile = args[0];
+  if (is_unset(profile)) {
+    REPORT_LOG_ERR(kDriverModule, 340, "bad parameter\n");
+    return -1;
+  }
+  if (VornQazProfileRunning(profile) != 0) {
+    report_trace(kDriverModule, 345, "profile=%s is running, skip running again\n", profile);
+    return 0;
+  }
+  const HashHandle hash = init_profile(profile, 1);
+  if (!hash) {
+    REPORT_LOG_ERR_NESTED(kDriverModule, 352, "init profile failed, profile=%s", profile);
+    VornQazReportCleanTmp(profile, nullptr);
+    return -1;
+  }
+  const char* stat_db = set_value(hash.get(), "real_path_stat_db");
+  remove_when_terminated(stat_db);
+  const int result = make_report(profile, hash.get());
+  if (stat_db != nullptr) {
+    unlink(stat_db);
+  }
+  return result;
+}
+
+}  // namespace vornreport
