@@ -1,0 +1,40 @@
+// The mount table, read with libmount.
+#ifndef VORN_HOST_MOUNTS_HPP
+#define VORN_HOST_MOUNTS_HPP
+
+#include <sys/types.h>
+
+#include <string>
+#include <vector>
+
+#include "vorn/share.h"
+
+namespace host {
+
+struct Mount {
+  int id = 0;
+  dev_t device = 0;
+  std::string root;    // the folder of the file system that is mounted: "/" is all of it
+  std::string target;  // where
+  std::string type;
+  VornFsKind kind = VORN_FS_OTHER;
+  bool visible = true;    // no later mount covers it
+  bool is_folder = true;  // containers mount single files too
+};
+
+inline constexpr const char* kOwnMountTable = "/proc/self/mountinfo";
+
+// The mounts of a table in mountinfo format, in mount order; empty when it can't be read. An entry
+// is invisible when a later one has the same target.
+std::vector<Mount> read_mounts(const char* table);
+
+// The mounts of this process. What is visible and what is a folder is asked of the kernel, for
+// file systems of walked kinds (asking a dead network server could take for ever).
+std::vector<Mount> read_own_mounts();
+
+// The mount that holds `path` (links followed), or null.
+const Mount* mount_holding(const std::vector<Mount>& mounts, const char* path);
+
+}  // namespace host
+
+#endif

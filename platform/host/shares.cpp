@@ -1,0 +1,277 @@
+#include "shares.hpp"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <memory>
+#include <unordered_set>
+
+#include "host_log.hpp"
+#include "text_containers.hpp"
+#include "utf8.hpp"
+#include "vorn/config.h"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+#include "vorn/share.h"
+
+namespace host {
+namespace {
+
+constexpr std::size_t kLongestName = 64;
+// The program's path buffers hold 4096 bytes; half of that is for what lies below the share.
+constexpr std::size_t kLongestPath = 2048;
+constexpr std::string_view kBlanks = " \t\n\v\f\r";
+
+std::string_view trimmed(std::string_view text) {
+  const std::size_t first = text.find_first_not_of(kBlanks);
+  if (first == std::string_view::npos) {
+    return {};
+  }
+  return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
+}
+
+// Whether a column of SQLite's NUMERIC affinity would store `text` as a number.
+bool is_number(std::string_view text) {
+  text = trimmed(text);
+  const auto skip_digits = [&text] {
+    const std::size_t count = std::min(text.find_first_not_of("0123456789"), text.size());
+    text.remove_prefix(count);
+    return count;
+  };
+  if (!text.empty() && (text.front() == '+' || text.front() == '-')) {
+    text.remove_prefix(1);
+  }
+  std::size_t digits = skip_digits();
+  if (!text.empty() && text.front() == '.') {
+    text.remove_prefix(1);
+    digits += skip_digits();
+  }
+  if (digits == 0) {
+    return false;
+  }
+  if (!text.empty() && (text.front() == 'e' || text.front() == 'E')) {
+    text.remove_prefix(1);
+    if (!text.empty() && (text.front() == '+' || text.front() == '-')) {
+      text.remove_prefix(1);
+    }
+    return skip_digits() > 0 && text.empty();
+  }
+  return text.empty();
+}
+
+const char* path_error(std::string_view path) {
+  if (path.empty()) {
+    return "it has no path; write path = /...";
+  }
+  if (path.front() != '/') {
+    return "its path is not absolute; write path = /...";
+  }
+  if (path.size() > kLongestPath) {
+    return "its path is longer than 2048 bytes; give a shorter one, a bind mount for example";
+  }
+  if (path.find('\'') != std::string_view::npos) {
+    return "its path holds a single quote; rename the folder or bind-mount it elsewhere";
+  }
+  if (std::any_of(path.begin(), path.end(),
+                  [](unsigned char c) { return c < 0x20 || c == 0x7F; })) {
+    return "its path holds a control character; rename the folder or bind-mount it elsewhere";
+  }
+  return nullptr;
+}
+
+Share make_share(const std::string& name, const VLIBCSzHash& section) {
+  Share share{name, {}, {}, {}};
+  const char* path = section.find("path");
+  std::string_view folder = path == nullptr ? "" : path;
+  if (const char* error = path_error(folder); error != nullptr) {
+    share.path_error = error;
+  } else {
+    while (folder.size() > 1 && folder.back() == '/') {
+      folder.remove_suffix(1);
+    }
+    share.path = folder;
+  }
+  if (const char* index = section.find("file_index"); index != nullptr) {
+    share.file_index = index;
+  }
+  return share;
+}
+
+const Share* find_share(const char* name) {
+  const auto* shares = name == nullptr ? nullptr : all_shares();
+  if (shares == nullptr) {
+    return nullptr;
+  }
+  const auto found = std::find_if(shares->begin(), shares->end(),
+                                  [name](const Share& share) { return share.name == name; });
+  return found == shares->end() ? nullptr : &*found;
+}
+
+int copy_out(const std::string& text, char* out, size_t size) {
+  if (text.size() >= size) {
+    errno = ENAMETOOLONG;
+    return -1;
+  }
+  std::memcpy(out, text.c_str(), text.size() + 1);
+  return 0;
+}
+
+}  // namespace
+
+const char* share_name_error(std::string_view name) {
+  if (name.empty() || name.size() > kLongestName) {
+    return "it is not 1 to 64 bytes long";
+  }
+  if (std::strchr("=+-@", name.front()) != nullptr) {
+    return "it begins with one of = + - @, which a spreadsheet takes for a formula";
+  }
+  if (is_number(name)) {
+    return "it is a number, which the report would write in another form";
+  }
+  for (std::string_view rest = name; !rest.empty();) {
+    const Utf8Char found = utf8_at(rest);
+    if (found.length == 0) {
+      return "it is not UTF-8";
+    }
+    if (is_control(found.code) || found.code == 0x2028 || found.code == 0x2029) {
+      return "it holds a control character";
+    }
+    if (found.code < 0x80 && std::strchr("'\"`\\<>/,", static_cast<char>(found.code)) != nullptr) {
+      return "it holds a quote, backslash, < > / or comma";
+    }
+    rest.remove_prefix(found.length);
+  }
+  return nullptr;
+}
+
+std::optional<std::vector<Share>> load_shares(const char* file) {
+  const std::unique_ptr<VLIBCSzList, decltype(&VLIBCSzListFree)> names(VLIBCSzListAlloc(0),
+                                                                       &VLIBCSzListFree);
+  VLIBCSzList* list = names.get();
+  if (list == nullptr || VLIBCFileEnumSection(file, &list) < 0) {
+    return std::nullopt;
+  }
+  std::vector<Share> shares;
+  std::unordered_set<std::string_view> seen;
+  for (const std::string& name : list->texts) {
+    if (!seen.insert(name).second) {
+      continue;  // the section reader has refused the first of them, with a line
+    }
+    if (const char* error = share_name_error(name); error != nullptr) {
+      log_line("share \"%s\" is left out: %s; rename its section in %s", name.c_str(), error, file);
+      continue;
+    }
+    VLIBCSzHash section(0);
+    VLIBCSzHash* filled = &section;
+    if (VLIBCFileGetSection(file, name.c_str(), &filled) >= 0) {
+      shares.push_back(make_share(name, section));
+    }
+  }
+  return shares;
+}
+
+const std::vector<Share>* all_shares() {
+  static const std::optional<std::vector<Share>> shares = load_shares(VORN_PATH_SHARES);
+  return shares ? &*shares : nullptr;
+}
+
+bool list_names(std::string_view list, std::string_view name) {
+  for (;;) {
+    const std::size_t comma = std::min(list.find(','), list.size());
+    if (trimmed(list.substr(0, comma)) == name) {
+      return true;
+    }
+    if (comma == list.size()) {
+      return false;
+    }
+    list.remove_prefix(comma + 1);
+  }
+}
+
+}  // namespace host
+
+int VORNShareEnum(VLIBCSzList** list, int /*flags*/) try {
+  const auto* shares = host::all_shares();
+  if (list == nullptr || *list == nullptr || shares == nullptr) {
+    return -1;
+  }
+  for (const host::Share& share : *shares) {
+    (*list)->texts.push_back(share.name);
+  }
+  return static_cast<int>(shares->size());
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
+
+int VORNSharePathGet(const char* share, char* path, size_t size) try {
+  const host::Share* found = host::find_share(share);
+  if (found == nullptr || path == nullptr) {
+    host::log_line("share \"%s\" is not in %s; add a section for it", share == nullptr ? "" : share,
+                   VORN_PATH_SHARES);
+    errno = ENOENT;
+    return -1;
+  }
+  if (!found->path_error.empty()) {
+    host::log_line("share \"%s\" can't be read: %s in %s", share, found->path_error.c_str(),
+                   VORN_PATH_SHARES);
+    errno = EINVAL;
+    return -1;
+  }
+  return host::copy_out(found->path, path, size);
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
+
+int VORNShareFileIndexIsEnabled(const char* share) try {
+  const host::Share* found = host::find_share(share);
+  return found != nullptr && !found->file_index.empty() ? 1 : 0;
+} catch (...) {
+  errno = ENOMEM;
+  return 0;
+}
+
+int VORNShareFileIndexDBPathGet(const char* share, char* path, size_t size) try {
+  const host::Share* found = host::find_share(share);
+  if (found == nullptr || found->file_index.empty() || path == nullptr) {
+    errno = ENOENT;
+    return -1;
+  }
+  if (found->file_index.front() != '/') {
+    host::log_line("share \"%s\": file_index \"%s\" is not absolute; write file_index = /... in %s",
+                   share, found->file_index.c_str(), VORN_PATH_SHARES);
+    errno = EINVAL;
+    return -1;
+  }
+  return host::copy_out(found->file_index, path, size);
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
+
+int VornQazMatchShare(const VLIBCSzHash* hash, const char* share) {
+  const char* list = VLIBCSzHashGetValue(hash, "share_list");
+  return share != nullptr &&
+                 (list == nullptr || host::trimmed(list).empty() || host::list_names(list, share))
+             ? 1
+             : 0;
+}
+
+int VornQazGetSharePathHash(VLIBCSzHash** hash) try {
+  const auto* shares = host::all_shares();
+  if (hash == nullptr || *hash == nullptr || shares == nullptr) {
+    return -1;
+  }
+  int count = 0;
+  for (const host::Share& share : *shares) {
+    if (!share.path.empty()) {
+      (*hash)->set(share.name, share.path);
+      ++count;
+    }
+  }
+  return count;
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}

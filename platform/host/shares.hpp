@@ -1,0 +1,34 @@
+// The shares of share.conf.
+#ifndef VORN_HOST_SHARES_HPP
+#define VORN_HOST_SHARES_HPP
+
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace host {
+
+struct Share {
+  std::string name;
+  std::string path;        // empty when it can't be worked with
+  std::string path_error;  // then, what is wrong with it and what to do
+  std::string file_index;  // empty when the share keeps none
+};
+
+// Why `name` can't be the name of a share ("it holds a comma"), or null.
+const char* share_name_error(std::string_view name);
+
+// The shares of `file` in its order. One log line for each that is left out (a bad name, a
+// malformed section). Nothing when the file can't be read (logged).
+std::optional<std::vector<Share>> load_shares(const char* file);
+
+// The server's shares, read once in the life of the process; null when that failed.
+const std::vector<Share>* all_shares();
+
+// Whether the comma-separated `list` names `name`; blanks around a name don't count.
+bool list_names(std::string_view list, std::string_view name);
+
+}  // namespace host
+
+#endif

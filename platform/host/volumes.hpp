@@ -1,0 +1,48 @@
+// Volumes: the devices of the mount table, each standing for its best mount.
+#ifndef VORN_HOST_VOLUMES_HPP
+#define VORN_HOST_VOLUMES_HPP
+
+#include <sys/types.h>
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "mounts.hpp"
+
+namespace host {
+
+struct Volume {
+  dev_t device;
+  std::string path;  // where it is mounted
+  VornFsKind kind;
+  // Whether it holds users' data for sure. Memory file systems (/run, /dev/shm, the layers of
+  // containers) do only when they are the root or when a share lies on them.
+  bool holds_data;
+};
+
+// Every device with a visible folder of a walked kind, in mount order, at the best of its mounts:
+// one of the whole file system before a part of it (bind mounts and Btrfs subvolumes are parts),
+// then the shortest path.
+std::vector<Volume> choose_volumes(const std::vector<Mount>& mounts);
+
+// The volume of the file system that holds `path`, or null.
+const Volume* volume_holding(const std::vector<Volume>& volumes, const std::vector<Mount>& mounts,
+                             const char* path);
+
+// Whether `path` has one of the lengths at which the program's records cut a mount path.
+constexpr bool may_be_cut(std::string_view path) {
+  return path.size() == 15 || path.size() == 31;
+}
+
+// `path` when it is a volume's; otherwise the first volume's path that it is the beginning of;
+// `path` when there is none.
+std::string uncut_path(const std::vector<Volume>& volumes, std::string_view path);
+
+// The identifier of a whole mount path: at most 48 bytes of A-Z a-z 0-9 . _ - and '/'.
+std::string volume_id(std::string_view path);
+
+}  // namespace host
+
+#endif
