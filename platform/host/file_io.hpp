@@ -31,13 +31,14 @@ class Fd {
   }
 
   int get() const { return fd_; }
+  int release() { return std::exchange(fd_, -1); }
   explicit operator bool() const { return fd_ >= 0; }
 
  private:
   int fd_ = -1;
 };
 
-// Puts errno back at the end of its scope: for calls that succeed after a probe that failed.
+// Puts errno back at the end of its scope, for what must not disturb its caller's errno.
 class ErrnoKeeper {
  public:
   ErrnoKeeper();

@@ -1,0 +1,272 @@
+// Sectioned configuration files: reading, listing and rewriting.
+#include "vorn/config.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <climits>
+#include <cstdlib>
+#include <cstring>
+#include <exception>
+#include <memory>
+#include <thread>
+
+#include "config_file.hpp"
+#include "config_lines.hpp"
+#include "file_io.hpp"
+#include "host_log.hpp"
+#include "text_containers.hpp"
+
+namespace host {
+namespace {
+
+using Entries = std::vector<VLIBCSzHash::Entry>;
+
+constexpr std::size_t kLargestFile = 16U << 20U;
+constexpr std::chrono::milliseconds kLockWait = std::chrono::seconds(10);
+
+int fail(int code, int line) {
+  VLIBCErrSetEx(code, "platform/host/config.cpp", line);
+  return -1;
+}
+
+std::optional<std::string> read_config(const char* file) {
+  std::optional<std::string> text = read_file(file, kLargestFile);
+  if (!text) {
+    log_line("%s can't be read (%s); make it a regular file that this program may read", file,
+             std::strerror(errno));
+  }
+  return text;
+}
+
+int find_failure(FindResult result, int line) {
+  errno = result == FindResult::malformed ? EINVAL : errno;
+  return fail(result == FindResult::missing ? VLIBC_ERR_NO_SECTION : VLIBC_ERR_MALFORMED_FILE,
+              line);
+}
+
+int get_section(const char* file, std::string_view section, VLIBCSzHash& hash) {
+  const std::optional<std::string> text = read_config(file);
+  if (!text) {
+    return fail(VLIBC_ERR_FILE_IO, __LINE__);
+  }
+  const std::vector<ConfigLine> lines = parse_lines(*text);
+  SectionRange range;
+  const FindResult result = find_section(lines, file, section, range);
+  if (result != FindResult::found) {
+    return find_failure(result, __LINE__);
+  }
+  int keys = 0;
+  for (std::size_t i = range.header + 1; i < range.end; ++i) {
+    if (lines[i].kind == LineKind::entry) {
+      hash.set(lines[i].name, lines[i].value);
+      ++keys;
+    }
+  }
+  return keys;
+}
+
+// --- Rewriting ----------------------------------------------------------------------------------
+
+// `format` with key and value in its two "%s". Not printf: the format comes from outside.
+std::string formatted(std::string_view format, const VLIBCSzHash::Entry& entry) {
+  std::string line;
+  const std::size_t first = format.find("%s");
+  const std::size_t second = format.find("%s", first + 2);
+  line.append(format.substr(0, first)).append(entry.first);
+  line.append(format.substr(first + 2, second - first - 2)).append(entry.second);
+  return line.append(format.substr(second + 2));
+}
+
+bool valid_format(std::string_view format) {
+  const std::size_t first = format.find("%s");
+  return first != std::string_view::npos &&
+         format.find("%s", first + 2) != std::string_view::npos &&
+         std::count(format.begin(), format.end(), '%') == 2 && format.ends_with('\n');
+}
+
+// Every line that would be written must read back as the entry that it stands for; this refuses
+// line ends, blanks at the ends and keys that look like headers or comments, all in one.
+bool entries_fit(const char* file, std::string_view format, const Entries& entries) {
+  for (const VLIBCSzHash::Entry& entry : entries) {
+    const std::string bytes = formatted(format, entry);
+    const ConfigLine line = parse_line(bytes);
+    if (line.kind != LineKind::entry || line.name != entry.first || line.value != entry.second ||
+        std::count(bytes.begin(), bytes.end(), '\n') != 1) {
+      log_line("%s: key \"%.*s\" not written: key or value doesn't fit a configuration line", file,
+               static_cast<int>(std::min<std::size_t>(entry.first.size(), 100)),
+               entry.first.data());
+      return false;
+    }
+  }
+  return true;
+}
+
+std::string rewritten(const std::vector<ConfigLine>& lines, const SectionRange& range,
+                      std::string_view format, Entries entries) {
+  std::size_t last_key = range.header;
+  for (std::size_t i = range.header + 1; i < range.end; ++i) {
+    last_key = lines[i].kind == LineKind::entry ? i : last_key;
+  }
+  std::string text;
+  for (std::size_t i = 0; i < lines.size(); ++i) {
+    const ConfigLine& line = lines[i];
+    if (i > range.header && i < range.end && line.kind == LineKind::entry) {
+      const auto entry = std::find_if(entries.begin(), entries.end(),
+                                      [&](const auto& e) { return e.first == line.name; });
+      if (entry != entries.end()) {
+        text += formatted(format, *entry);
+        entries.erase(entry);
+      }
+    } else {
+      text += line.bytes;
+    }
+    if (i == last_key) {
+      if (!entries.empty() && !text.ends_with('\n')) {
+        text += '\n';
+      }
+      // Keys below this line are none, so what is left of the entries is new.
+      for (const VLIBCSzHash::Entry& entry : entries) {
+        text += formatted(format, entry);
+      }
+    }
+  }
+  return text;
+}
+
+// Taken beside the file, because the file itself is replaced; never removed, because a writer that
+// waits on a removed lock file would not keep out one that made it anew.
+Fd lock_beside(const std::string& file, std::chrono::milliseconds wait) {
+  constexpr std::chrono::milliseconds kPause{20};
+  const std::size_t slash = file.rfind('/') + 1;
+  const std::string path = file.substr(0, slash) + "." + file.substr(slash) + ".lock";
+  Fd lock(open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
+  if (!lock) {
+    log_line("lock file %s can't be opened (%s); %s is unchanged", path.c_str(),
+             std::strerror(errno), file.c_str());
+    fail(VLIBC_ERR_FILE_IO, __LINE__);
+    return lock;
+  }
+  const auto deadline = std::chrono::steady_clock::now() + wait;
+  while (flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
+    if (errno != EWOULDBLOCK || std::chrono::steady_clock::now() >= deadline) {
+      log_line("%s is being changed by another process (lock file %s); it is unchanged, try again",
+               file.c_str(), path.c_str());
+      fail(VLIBC_ERR_LOCK_BUSY, __LINE__);
+      return {};
+    }
+    std::this_thread::sleep_for(kPause);
+  }
+  return lock;
+}
+
+bool replace(const std::string& file, std::string_view text) {
+  struct stat before {};
+  AtomicFile target(file);
+  if (lstat(file.c_str(), &before) != 0 || target.fd() < 0 ||
+      fchown(target.fd(), before.st_uid, before.st_gid) != 0 ||
+      fchmod(target.fd(), before.st_mode & 07777U) != 0 || !write_all(target.fd(), text) ||
+      !target.commit()) {
+    log_line("%s can't be replaced (%s); it is unchanged", file.c_str(), std::strerror(errno));
+    return false;
+  }
+  return true;
+}
+
+}  // namespace
+
+int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
+                std::string_view format, std::chrono::milliseconds lock_wait) {
+  const int saved_errno = errno;
+  const Entries entries = hash.sorted();
+  if (!valid_format(format)) {
+    log_line("%s: not rewritten: the line format needs %%s twice and a line end", file);
+    return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
+  }
+  if (!entries_fit(file, format, entries)) {
+    return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
+  }
+  // An administrator's link to the file stays; what it leads to is what gets replaced.
+  const std::unique_ptr<char, decltype(&std::free)> resolved(realpath(file, nullptr), &std::free);
+  const std::string target = resolved ? resolved.get() : file;
+  const Fd lock = lock_beside(target, lock_wait);
+  if (!lock) {
+    return -1;
+  }
+  const std::optional<std::string> text = read_config(target.c_str());
+  if (!text) {
+    return fail(VLIBC_ERR_FILE_IO, __LINE__);
+  }
+  const std::vector<ConfigLine> lines = parse_lines(*text);
+  SectionRange range;
+  const FindResult result = find_section(lines, file, section, range);
+  if (result == FindResult::missing) {
+    log_line("%s: section [%.*s] is missing, so it can't be rewritten", file,
+             static_cast<int>(std::min<std::size_t>(section.size(), 100)), section.data());
+  }
+  if (result != FindResult::found) {
+    return find_failure(result, __LINE__);
+  }
+  const std::string new_text = rewritten(lines, range, format, entries);
+  if (new_text != *text && !replace(target, new_text)) {
+    return fail(VLIBC_ERR_FILE_IO, __LINE__);
+  }
+  errno = saved_errno;  // waiting for the lock has left its own
+  return 0;
+}
+
+}  // namespace host
+
+int VLIBCFileGetSection(const char* file, const char* section, VLIBCSzHash** hash) {
+  if (file == nullptr || section == nullptr || hash == nullptr || *hash == nullptr) {
+    return host::fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
+  }
+  try {
+    return host::get_section(file, section, **hash);
+  } catch (const std::exception&) {
+    return host::fail(VLIBC_ERR_FILE_IO, __LINE__);
+  }
+}
+
+int VLIBCFileSetSection(const char* file, const char* section, const char* new_name,
+                        const VLIBCSzHash* hash, const char* line_format) {
+  if (file == nullptr || section == nullptr || new_name != nullptr || hash == nullptr ||
+      line_format == nullptr) {
+    host::log_line("configuration not rewritten: a parameter is missing or not supported");
+    return host::fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
+  }
+  try {
+    return host::set_section(file, section, *hash, line_format, host::kLockWait);
+  } catch (const std::exception&) {
+    return host::fail(VLIBC_ERR_FILE_IO, __LINE__);
+  }
+}
+
+int VLIBCFileEnumSection(const char* file, VLIBCSzList** list) {
+  if (file == nullptr || list == nullptr || *list == nullptr) {
+    return host::fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
+  }
+  try {
+    const std::optional<std::string> text = host::read_config(file);
+    if (!text) {
+      return host::fail(VLIBC_ERR_FILE_IO, __LINE__);
+    }
+    const std::vector<host::ConfigLine> lines = host::parse_lines(*text);
+    int sections = 0;
+    for (std::size_t i = 0; i < lines.size(); ++i) {
+      if (lines[i].kind == host::LineKind::header) {
+        (*list)->texts.emplace_back(lines[i].name);
+        ++sections;
+      } else if (lines[i].looks_like_a_header) {
+        host::log_malformed(file, i, lines[i].problem);
+      }
+    }
+    return sections;
+  } catch (const std::exception&) {
+    return host::fail(VLIBC_ERR_FILE_IO, __LINE__);
+  }
+}

@@ -1,0 +1,123 @@
+// Profile names, the list of profiles and their schedules.
+#include "profile.hpp"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <exception>
+#include <string>
+#include <string_view>
+
+#include "file_io.hpp"
+#include "host_log.hpp"
+#include "text_containers.hpp"
+#include "vorn/config.h"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+
+namespace host {
+namespace {
+
+constexpr std::size_t kLongestName = 64;
+
+bool only(std::string_view text, std::string_view extra) {
+  return !text.empty() && text.size() <= kLongestName &&
+         std::all_of(text.begin(), text.end(), [extra](char c) {
+           return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') ||
+                  extra.find(c) != std::string_view::npos;
+         });
+}
+
+int enum_profiles(VLIBCSzList& list) {
+  VLIBCSzList all;
+  VLIBCSzList* sections = &all;
+  if (VLIBCFileEnumSection(VORN_PATH_CONFIG, &sections) < 0) {
+    return -1;
+  }
+  int count = 0;
+  for (const std::string& name : all.texts) {
+    if (name != "global") {
+      list.texts.push_back(name);
+      ++count;
+    }
+  }
+  return count;
+}
+
+int clean_schedule(const char* profile, VLIBCSzHash& hash, const char* key) {
+  const char* value = hash.find(key);
+  const std::string id = value == nullptr ? "" : value;
+  if (id.empty()) {
+    return 0;
+  }
+  if (!only(id, "_-")) {
+    log_line(
+        "profile \"%s\": %s = %.80s is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -); "
+        "correct it in %s",
+        profile, key, id.c_str(), VORN_PATH_CONFIG);
+    errno = EINVAL;
+    return -1;
+  }
+  const int saved_errno = errno;
+  const std::string path = VORN_PATH_CRON "/vornreport-" + id;
+  struct stat status {};
+  if (lstat(path.c_str(), &status) == 0) {
+    if (!S_ISREG(status.st_mode) && !S_ISLNK(status.st_mode)) {
+      log_line("profile \"%s\": schedule %s is no file; remove it by hand", profile, path.c_str());
+      return -1;
+    }
+    if (unlink(path.c_str()) != 0) {
+      log_line("profile \"%s\": schedule %s can't be removed (%s)", profile, path.c_str(),
+               std::strerror(errno));
+      return -1;
+    }
+  } else if (errno != ENOENT && errno != ENOTDIR) {
+    log_line("profile \"%s\": schedule %s can't be examined (%s)", profile, path.c_str(),
+             std::strerror(errno));
+    return -1;
+  }
+  hash.remove(key);
+  errno = saved_errno;
+  return 1;
+}
+
+}  // namespace
+
+bool valid_profile(const char* profile) {
+  if (profile != nullptr && *profile != '.' && only(profile, "._-")) {
+    return true;
+  }
+  log_line(
+      "\"%.80s\" is no profile name; use 1 to 64 of A-Z a-z 0-9 . _ -, not beginning with a "
+      "dot",
+      profile == nullptr ? "" : profile);
+  errno = EINVAL;
+  return false;
+}
+
+}  // namespace host
+
+int VornQazEnumProfile(VLIBCSzList** list, int flags) {
+  if (list == nullptr || *list == nullptr || flags != 0) {
+    return -1;
+  }
+  try {
+    return host::enum_profiles(**list);
+  } catch (const std::exception&) {
+    return -1;
+  }
+}
+
+int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key) {
+  if (!host::valid_profile(profile) || hash == nullptr || *hash == nullptr || key == nullptr) {
+    return -1;
+  }
+  try {
+    return host::clean_schedule(profile, **hash, key);
+  } catch (const std::exception&) {
+    return -1;
+  }
+}

@@ -1,0 +1,301 @@
+// The paths of a profile, and the preparation of its report run.
+#include "run_paths.hpp"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <exception>
+#include <memory>
+#include <string_view>
+
+#include "file_io.hpp"
+#include "host_log.hpp"
+#include "profile.hpp"
+#include "run_lock.hpp"
+#include "run_temporary.hpp"
+#include "text_containers.hpp"
+#include "vorn/config.h"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+
+namespace host {
+namespace {
+
+constexpr std::size_t kLongestReportDir = 1024;
+constexpr std::string_view kUnfinished = ".partial";
+
+struct CloseDir {
+  void operator()(DIR* dir) const { closedir(dir); }
+};
+
+// Why `dir` can't be a report folder, or null. The program puts these paths between single quotes
+// in shell commands without escaping them.
+const char* report_dir_problem(std::string_view dir) {
+  if (!dir.starts_with('/')) {
+    return "is not absolute";
+  }
+  if (dir.size() > kLongestReportDir) {
+    return "is longer than 1024 bytes";
+  }
+  if (std::any_of(dir.begin(), dir.end(), [](char c) {
+        return c == '\'' || static_cast<unsigned char>(c) < ' ' || c == '\x7f';
+      })) {
+    return "holds a single quote or a control character";
+  }
+  if ((std::string(dir) + "/").find("/../") != std::string::npos) {
+    return "holds \"..\"";
+  }
+  return nullptr;
+}
+
+// --- The profile's own folder -------------------------------------------------------------------
+
+// Opens the folder of a profile's reports, if nobody but this user decides what stands in it;
+// a log line otherwise. An absent one is silent, with ENOENT.
+Fd open_report_folder(const std::string& folder) {
+  Fd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  struct stat status {};
+  if (!opened || fstat(opened.get(), &status) != 0) {
+    if (errno != ENOENT) {
+      const bool replaced = errno == ELOOP || errno == ENOTDIR;
+      log_line("report folder %s can't be used (%s); move it away", folder.c_str(),
+               replaced ? "it is a link or a file" : std::strerror(errno));
+    }
+    return {};
+  }
+  if (status.st_uid != geteuid() || (status.st_mode & S_IWOTH) != 0) {
+    log_line("report folder %s belongs to another user or is writable by everyone; move it away",
+             folder.c_str());
+    errno = EPERM;
+    return {};
+  }
+  return opened;
+}
+
+bool make_report_folder(const std::string& dir, const std::string& folder) {
+  const int saved_errno = errno;
+  if (!make_folders(dir.empty() ? "/" : dir) ||
+      (mkdir(folder.c_str(), 0777) != 0 && errno != EEXIST)) {
+    log_line("report folder %s can't be made (%s); make the folder above it writable",
+             folder.c_str(), std::strerror(errno));
+    return false;
+  }
+  if (!open_report_folder(folder)) {
+    return false;
+  }
+  errno = saved_errno;
+  return true;
+}
+
+// --- The run's own folder -----------------------------------------------------------------------
+
+std::string local_time_name() {
+  const std::time_t now = std::time(nullptr);
+  std::tm local{};
+  localtime_r(&now, &local);
+  char name[32];
+  return {name, std::strftime(name, sizeof name, "%Y-%m-%d_%H-%M-%S", &local)};
+}
+
+ReportRun run_named(const std::string& profile, const std::string& folder,
+                    const std::string& name) {
+  return {.profile = profile,
+          .unfinished = folder + "/." + name + std::string(kUnfinished),
+          .finished = folder + "/" + name,
+          .page = folder + "/" + name + "/report.html"};
+}
+
+bool name_exists(const std::string& path) {
+  struct stat status {};
+  return lstat(path.c_str(), &status) == 0;
+}
+
+// The first run name at this time that nothing stands for, neither finished nor unfinished.
+ReportRun unused_run(const std::string& profile, const std::string& folder) {
+  const ErrnoKeeper keeper;
+  const std::string base = local_time_name();
+  ReportRun run = run_named(profile, folder, base);
+  for (int n = 2; name_exists(run.finished) || name_exists(run.unfinished); ++n) {
+    run = run_named(profile, folder, base + "-" + std::to_string(n));
+  }
+  return run;
+}
+
+// --- Preparing a report run ---------------------------------------------------------------------
+
+// One line for each name that the profile selects and share.conf lacks: most likely a typing error.
+void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
+  const char* value = hash.find("share_list");
+  VLIBCSzList known;
+  VLIBCSzList* sections = &known;
+  if (value == nullptr || VLIBCFileEnumSection(VORN_PATH_SHARES, &sections) < 0) {
+    return;
+  }
+  std::string_view rest = value;
+  while (!rest.empty()) {
+    const std::string_view item = rest.substr(0, rest.find(','));
+    rest.remove_prefix(std::min(item.size() + 1, rest.size()));
+    const std::size_t first = item.find_first_not_of(" \t");
+    if (first == std::string_view::npos) {
+      continue;
+    }
+    const std::string name(item.substr(first, item.find_last_not_of(" \t") - first + 1));
+    if (std::find(known.texts.begin(), known.texts.end(), name) == known.texts.end()) {
+      log_line("profile \"%s\": share_list names \"%s\", which is no share of %s; correct the name",
+               profile, name.c_str(), VORN_PATH_SHARES);
+    }
+  }
+}
+
+// Removes what a killed run of the profile has left. Nothing here is fatal: the new run's names are
+// unused ones, and the database is checked when it is opened.
+void remove_leftovers(const std::string& profile, const std::string& folder) {
+  remove_statistics(profile);
+  for (const std::string& left : unfinished_reports(folder).value_or(std::vector<std::string>{})) {
+    if (!remove_tree(left)) {
+      log_line("unfinished report %s can't be removed (%s); remove it by hand", left.c_str(),
+               std::strerror(errno));
+    }
+  }
+}
+
+bool prepare(const ReportRun& run) {
+  if (!claim_temporary_names()) {
+    return false;
+  }
+  if (mkdir(run.unfinished.c_str(), 0777) == 0 &&
+      mkdir((run.unfinished + "/csv").c_str(), 0777) == 0 && make_folders(VORN_PATH_STAT)) {
+    return true;
+  }
+  log_line("profile \"%s\": the folders of a run, %s and %s, can't be made (%s); free some space",
+           run.profile.c_str(), run.unfinished.c_str(), VORN_PATH_STAT, std::strerror(errno));
+  const ErrnoKeeper keeper;
+  remove_tree(run.unfinished);
+  remove_temporary_names(getpid());
+  return false;
+}
+
+std::optional<ReportRun> begin_report_run(const char* profile, const VLIBCSzHash& hash,
+                                          const std::string& dir, const std::string& folder) {
+  if (!holds_profile(profile)) {
+    log_line("profile \"%s\" is not held by this process, so it can't run it", profile);
+    errno = ENOLCK;
+    return std::nullopt;
+  }
+  if (!make_report_folder(dir, folder)) {
+    return std::nullopt;
+  }
+  remove_leftovers(profile, folder);
+  ReportRun run = unused_run(profile, folder);
+  if (!prepare(run)) {
+    return std::nullopt;
+  }
+  warn_of_unknown_shares(profile, hash);
+  return run;
+}
+
+int init_paths(const char* profile, VLIBCSzHash& hash, bool for_report) {
+  const std::optional<std::string> dir = report_dir(profile, hash);
+  if (!dir) {
+    return -1;
+  }
+  const std::string folder = *dir + "/" + profile;
+  ReportRun run;
+  if (for_report) {
+    report_run() = begin_report_run(profile, hash, *dir, folder);
+    if (!report_run()) {
+      return -1;
+    }
+    run = *report_run();
+  } else {
+    run = unused_run(profile, folder);
+  }
+  hash.set("real_path_base", VORN_PATH_STAT);
+  hash.set("real_path_stat_db", statistics_path(profile));
+  hash.set("real_path_template", folder + "/template");
+  hash.set("real_path_date", run.unfinished);
+  hash.set("real_path_date_final", run.finished);
+  hash.set("real_path_report_final", run.page);
+  hash.set("real_path_csv", run.unfinished + "/csv");
+  return 0;
+}
+
+}  // namespace
+
+std::optional<std::string> report_dir(const char* profile, const VLIBCSzHash& hash) {
+  const char* value = hash.find("report_dir");
+  std::string dir = value == nullptr || *value == '\0' ? VORN_PATH_REPORTS : value;
+  if (const char* problem = report_dir_problem(dir); problem != nullptr) {
+    log_line("profile \"%s\": report_dir \"%.1100s\" %s; write report_dir = /... in %s", profile,
+             dir.c_str(), problem, VORN_PATH_CONFIG);
+    errno = EINVAL;
+    return std::nullopt;
+  }
+  dir.erase(dir.find_last_not_of('/') + 1);
+  return dir;
+}
+
+std::string statistics_path(const std::string& profile) {
+  return VORN_PATH_STAT "/stat.db." + profile;
+}
+
+void remove_statistics(const std::string& profile) {
+  const ErrnoKeeper keeper;
+  const std::string path = statistics_path(profile);
+  unlink(path.c_str());
+  unlink((path + "-journal").c_str());
+}
+
+std::optional<std::vector<std::string>> unfinished_reports(const std::string& folder) {
+  const int saved_errno = errno;
+  std::vector<std::string> found;
+  Fd opened = open_report_folder(folder);
+  if (!opened && errno != ENOENT) {
+    return std::nullopt;
+  }
+  const std::unique_ptr<DIR, CloseDir> dir(opened ? fdopendir(opened.get()) : nullptr);
+  if (dir) {
+    opened.release();  // it belongs to `dir` now
+  }
+  while (const dirent* entry = dir ? readdir(dir.get()) : nullptr) {
+    const std::string_view name = entry->d_name;
+    if (name.size() > kUnfinished.size() && name.starts_with('.') && name.ends_with(kUnfinished)) {
+      found.push_back(folder + "/" + entry->d_name);
+    }
+  }
+  errno = saved_errno;
+  return found;
+}
+
+std::optional<ReportRun>& report_run() {
+  static std::optional<ReportRun> run;
+  return run;
+}
+
+}  // namespace host
+
+int VornQazInitLocation(VLIBCSzHash** hash, int flags) {
+  if (hash == nullptr || *hash == nullptr || flags != 0) {
+    return -1;
+  }
+  const bool set = VLIBCSzHashSetValue(hash, "real_path_base", VORN_PATH_STAT) == 0 &&
+                   VLIBCSzHashSetValue(hash, "real_path_stat_db", VORN_PATH_STAT "/stat.db") == 0;
+  return set ? 0 : -1;
+}
+
+int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report) {
+  if (!host::valid_profile(profile) || hash == nullptr || *hash == nullptr) {
+    return -1;
+  }
+  try {
+    return host::init_paths(profile, **hash, for_report != 0);
+  } catch (const std::exception&) {
+    return -1;
+  }
+}

@@ -1,0 +1,147 @@
+// The course of a run: taking its profile, its status word, and clearing up after it.
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <exception>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "file_io.hpp"
+#include "host_log.hpp"
+#include "page.hpp"
+#include "profile.hpp"
+#include "run_lock.hpp"
+#include "run_paths.hpp"
+#include "run_temporary.hpp"
+#include "text_containers.hpp"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+
+namespace host {
+namespace {
+
+int store_status(const std::string& profile, std::string_view word) {
+  const int saved_errno = errno;
+  const std::string path = VORN_PATH_STATUS "/" + profile;
+  AtomicFile file(path);
+  // Monitoring that isn't root reads the word, whatever this process's umask.
+  if (file.fd() >= 0 && fchmod(file.fd(), 0644) == 0 &&
+      write_all(file.fd(), std::string(word) + "\n") && file.commit()) {
+    errno = saved_errno;
+    return 0;
+  }
+  log_line("status \"%.*s\" of profile \"%s\" can't be stored in %s (%s)",
+           static_cast<int>(word.size()), word.data(), profile.c_str(), path.c_str(),
+           std::strerror(errno));
+  return -1;
+}
+
+// The page is the product of a run. When it isn't whole, nothing may look like a report: what
+// stands at the finished name takes its unfinished name back first, so that a removal which is cut
+// short leaves something that the next run recognises.
+void take_back(const ReportRun& run) {
+  const ErrnoKeeper keeper;
+  log_line(
+      "profile \"%s\": report page %s is missing or cut short, so the run counts as failed; "
+      "check the messages above and the free space",
+      run.profile.c_str(), run.page.c_str());
+  rename(run.finished.c_str(), run.unfinished.c_str());
+  if (!remove_tree(run.unfinished)) {
+    log_line("unfinished report %s can't be removed (%s); remove it by hand",
+             run.unfinished.c_str(), std::strerror(errno));
+  }
+}
+
+int update_status(const std::string& profile, std::string_view word) {
+  if (word != "collect_data" && word != "success" && word != "fail") {
+    log_line("profile \"%s\": \"%.80s\" is no status word", profile.c_str(),
+             std::string(word).c_str());
+    errno = EINVAL;
+    return -1;
+  }
+  if (!holds_profile(profile)) {
+    errno = ENOLCK;  // taking it has failed, and said so
+    return -1;
+  }
+  const bool reporting = report_run() && report_run()->profile == profile;
+  if (reporting && word == "success" && !page_is_complete(report_run()->page.c_str())) {
+    take_back(*report_run());
+    word = "fail";
+  }
+  if (reporting && word != "collect_data") {
+    report_run().reset();
+  }
+  return store_status(profile, word);
+}
+
+// The order keeps this off a run that starts at the same time: what is there is noted first, then
+// the holder is looked for, and only what was noted is removed. A run that starts behind the look
+// makes folders of its own, which aren't on the note; its statistics database is safe but for the
+// microseconds between the look and the removal, since a run removes an old one before it makes it.
+int clean(const std::string& profile, const VLIBCSzHash* hash) {
+  remove_temporary_names(getpid());
+  int result = 0;
+  std::vector<std::string> unfinished;
+  if (hash != nullptr) {
+    const std::optional<std::string> dir = report_dir(profile.c_str(), *hash);
+    const auto found = dir ? unfinished_reports(*dir + "/" + profile) : std::nullopt;
+    result = found ? 0 : -1;
+    unfinished = found.value_or(std::vector<std::string>{});
+  }
+  if (held_by_other(profile)) {
+    return result;
+  }
+  for (const std::string& path : unfinished) {
+    if (!remove_tree(path)) {
+      log_line("unfinished report %s can't be removed (%s); remove it by hand", path.c_str(),
+               std::strerror(errno));
+      result = -1;
+    }
+  }
+  remove_statistics(profile);
+  if (holds_profile(profile)) {
+    report_run().reset();
+    result = store_status(profile, "fail") == 0 ? result : -1;
+  }
+  return result;
+}
+
+}  // namespace
+}  // namespace host
+
+int VornQazProfileRunning(const char* profile) {
+  if (!host::valid_profile(profile)) {
+    return 0;
+  }
+  try {
+    return host::take_profile(profile) == host::TakeResult::busy ? 1 : 0;
+  } catch (const std::exception&) {
+    return 1;  // without a lock nothing may run
+  }
+}
+
+int VornQazStatusUpdate(const char* profile, const char* status) {
+  if (!host::valid_profile(profile) || status == nullptr) {
+    return -1;
+  }
+  try {
+    return host::update_status(profile, status);
+  } catch (const std::exception&) {
+    return -1;
+  }
+}
+
+int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash) {
+  if (!host::valid_profile(profile)) {
+    return -1;
+  }
+  try {
+    return host::clean(profile, hash);
+  } catch (const std::exception&) {
+    return -1;
+  }
+}
