@@ -30,13 +30,16 @@ void require_sandbox() {
   std::exit(2);
 }
 
+// A stream, which syslog(3) falls back to: a datagram socket takes as few as ten messages before
+// the sender blocks, and the sender is this process.
 void bind_log_socket() {
-  log_socket = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+  log_socket = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
   sockaddr_un address{};
   address.sun_family = AF_UNIX;
   std::snprintf(address.sun_path, sizeof address.sun_path, "/dev/log");
   unlink(address.sun_path);
-  if (bind(log_socket, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0) {
+  if (bind(log_socket, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0 ||
+      listen(log_socket, 128) != 0) {
     std::perror("platform_tests: /dev/log");
     std::exit(2);
   }
@@ -101,14 +104,24 @@ bool exists(const std::string& path) {
 }
 
 std::vector<std::string> syslog_lines() {
+  static std::vector<std::pair<int, std::string>> senders;  // connection, what came through it
+  for (int sender = 0; (sender = accept4(log_socket, nullptr, nullptr, SOCK_CLOEXEC)) >= 0;) {
+    senders.emplace_back(sender, "");
+  }
   std::vector<std::string> lines;
-  char message[8192];
-  ssize_t size = 0;
-  while ((size = recv(log_socket, message, sizeof message, 0)) >= 0) {
-    // "<11>Jan  2 03:04:05 tag: text"; the tag is the test program's name
-    const std::string line(message, static_cast<std::size_t>(size));
-    const std::size_t tag_end = line.find(": ");
-    lines.push_back(tag_end == std::string::npos ? line : line.substr(tag_end + 2));
+  for (auto& [sender, received] : senders) {
+    char chunk[8192];
+    ssize_t size = 0;
+    while ((size = recv(sender, chunk, sizeof chunk, MSG_DONTWAIT)) > 0) {
+      received.append(chunk, static_cast<std::size_t>(size));
+    }
+    for (std::size_t end = 0; (end = received.find('\0')) != std::string::npos;) {
+      // "<11>Jan  2 03:04:05 tag: text"; the tag is the test program's name
+      const std::string line = received.substr(0, end);
+      const std::size_t tag_end = line.find(": ");
+      lines.push_back(tag_end == std::string::npos ? line : line.substr(tag_end + 2));
+      received.erase(0, end + 1);
+    }
   }
   return lines;
 }
