@@ -48,7 +48,7 @@ start_page() {
 <title>Storage report</title>
 <style>
 HTML
-  cat "$here/page.css"
+  cat "$here/report.css"
   echo '</style>'
 }
 
@@ -106,7 +106,7 @@ HTML
 
 finish_page() {
   printf '</main>\n<script>\n'
-  cat "$here/page.js"
+  cat "$here/report.js"
   printf '</script>\n</body>\n</html>\n'
 }
 
