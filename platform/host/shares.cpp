@@ -13,6 +13,7 @@
 #include "vorn/paths.h"
 #include "vorn/report.h"
 #include "vorn/share.h"
+#include "words.hpp"
 
 namespace host {
 namespace {
@@ -20,15 +21,6 @@ namespace {
 constexpr std::size_t kLongestName = 64;
 // The program's path buffers hold 4096 bytes; half of that is for what lies below the share.
 constexpr std::size_t kLongestPath = 2048;
-constexpr std::string_view kBlanks = " \t\n\v\f\r";
-
-std::string_view trimmed(std::string_view text) {
-  const std::size_t first = text.find_first_not_of(kBlanks);
-  if (first == std::string_view::npos) {
-    return {};
-  }
-  return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
-}
 
 // Whether a column of SQLite's NUMERIC affinity would store `text` as a number.
 bool is_number(std::string_view text) {
@@ -175,19 +167,6 @@ const std::vector<Share>* all_shares() {
   return shares ? &*shares : nullptr;
 }
 
-bool list_names(std::string_view list, std::string_view name) {
-  for (;;) {
-    const std::size_t comma = std::min(list.find(','), list.size());
-    if (trimmed(list.substr(0, comma)) == name) {
-      return true;
-    }
-    if (comma == list.size()) {
-      return false;
-    }
-    list.remove_prefix(comma + 1);
-  }
-}
-
 }  // namespace host
 
 int VORNShareEnum(VLIBCSzList** list, int /*flags*/) try {
@@ -250,12 +229,16 @@ int VORNShareFileIndexDBPathGet(const char* share, char* path, size_t size) try 
   return -1;
 }
 
-int VornQazMatchShare(const VLIBCSzHash* hash, const char* share) {
+int VornQazMatchShare(const VLIBCSzHash* hash, const char* share) try {
   const char* list = VLIBCSzHashGetValue(hash, "share_list");
-  return share != nullptr &&
-                 (list == nullptr || host::trimmed(list).empty() || host::list_names(list, share))
-             ? 1
-             : 0;
+  if (share == nullptr) {
+    return 0;
+  }
+  const auto words = host::comma_words(list == nullptr ? "" : list);
+  return words.empty() || std::find(words.begin(), words.end(), share) != words.end() ? 1 : 0;
+} catch (...) {
+  errno = ENOMEM;
+  return 0;
 }
 
 int VornQazGetSharePathHash(VLIBCSzHash** hash) try {

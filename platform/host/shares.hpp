@@ -26,9 +26,6 @@ std::optional<std::vector<Share>> load_shares(const char* file);
 // The server's shares, read once in the life of the process; null when that failed.
 const std::vector<Share>* all_shares();
 
-// Whether the comma-separated `list` names `name`; blanks around a name don't count.
-bool list_names(std::string_view list, std::string_view name);
-
 }  // namespace host
 
 #endif

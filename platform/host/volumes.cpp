@@ -5,8 +5,10 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
-#include <iterator>
+#include <limits>
 #include <memory>
+#include <set>
+#include <tuple>
 
 #include "file_io.hpp"
 #include "file_system.hpp"
@@ -19,12 +21,10 @@ namespace {
 
 constexpr std::size_t kIdLimit = 48;
 
-bool is_better(const Mount& mount, const Mount& than) {
-  const bool whole = mount.root == "/";
-  if (whole != (than.root == "/")) {
-    return whole;
-  }
-  return mount.target.size() < than.target.size();
+// What makes one mount stand for its device; the greatest does.
+auto rank(const Mount& mount) {
+  return std::tuple(mount.root == "/", mount.target == "/", mount.holds_share,
+                    std::numeric_limits<std::size_t>::max() - mount.target.size());
 }
 
 constexpr bool is_safe(char c) {
@@ -46,29 +46,33 @@ std::uint32_t hash_of(std::string_view text) {
 
 std::vector<Volume> choose_volumes(const std::vector<Mount>& mounts) {
   std::vector<const Mount*> best;
+  std::set<dev_t> shared;
   for (const Mount& mount : mounts) {
     if (!mount.visible || !mount.is_folder || !is_walked(mount.kind)) {
       continue;
+    }
+    if (mount.holds_share) {
+      shared.insert(mount.device);
     }
     const auto same = std::find_if(best.begin(), best.end(), [&](const Mount* other) {
       return other->device == mount.device;
     });
     if (same == best.end()) {
       best.push_back(&mount);
-    } else if (is_better(mount, **same)) {
+    } else if (rank(mount) > rank(**same)) {
       *same = &mount;
     }
   }
   std::vector<Volume> volumes;
-  std::transform(best.begin(), best.end(), std::back_inserter(volumes), [](const Mount* mount) {
-    return Volume{mount->device, mount->target, mount->kind,
-                  mount->kind != VORN_FS_MEMORY || mount->target == "/"};
-  });
+  for (const Mount* mount : best) {
+    const bool holds_data =
+        mount->kind != VORN_FS_MEMORY || mount->target == "/" || shared.count(mount->device) > 0;
+    volumes.push_back({mount->device, mount->target, mount->kind, holds_data});
+  }
   return volumes;
 }
 
-const Volume* volume_holding(const std::vector<Volume>& volumes, const std::vector<Mount>& mounts,
-                             const char* path) {
+const Volume* ServerVolumes::holding(const char* path) const {
   const Mount* mount = mount_holding(mounts, path);
   if (mount == nullptr) {
     return nullptr;
@@ -77,6 +81,21 @@ const Volume* volume_holding(const std::vector<Volume>& volumes, const std::vect
     return volume.device == mount->device;
   });
   return found == volumes.end() ? nullptr : &*found;
+}
+
+ServerVolumes read_volumes() {
+  ServerVolumes server{read_own_mounts(), {}};
+  if (const auto* shares = all_shares(); shares != nullptr) {
+    for (const Share& share : *shares) {
+      // The mount is this vector's own element.
+      const Mount* mount = mount_holding(server.mounts, share.path.c_str());
+      if (mount != nullptr) {
+        server.mounts[static_cast<std::size_t>(mount - server.mounts.data())].holds_share = true;
+      }
+    }
+  }
+  server.volumes = choose_volumes(server.mounts);
+  return server;
 }
 
 std::string uncut_path(const std::vector<Volume>& volumes, std::string_view path) {
@@ -117,12 +136,10 @@ int VornQazGetVolumePathHash(VLIBCSzHash** hash) try {
     return -1;
   }
   const host::ErrnoKeeper keeper;  // a share whose folder is gone is left out: no failure
-  const auto mounts = host::read_own_mounts();
-  const auto volumes = host::choose_volumes(mounts);
+  const host::ServerVolumes server = host::read_volumes();
   auto result = std::make_unique<VLIBCSzHash>(shares->size());
   for (const host::Share& share : *shares) {
-    const host::Volume* volume =
-        share.path.empty() ? nullptr : host::volume_holding(volumes, mounts, share.path.c_str());
+    const host::Volume* volume = server.holding(share.path.c_str());
     if (volume != nullptr) {
       result->set(share.name, volume->path);
     }
@@ -143,7 +160,7 @@ int VornQazVolumeGetId(const char* mount_path, char* id, size_t size) try {
   const host::ErrnoKeeper keeper;
   std::string whole = mount_path;
   if (host::may_be_cut(whole)) {
-    whole = host::uncut_path(host::choose_volumes(host::read_own_mounts()), whole);
+    whole = host::uncut_path(host::read_volumes().volumes, whole);
   }
   const std::string text = host::volume_id(whole);
   std::memcpy(id, text.c_str(), text.size() + 1);

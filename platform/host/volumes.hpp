@@ -24,12 +24,19 @@ struct Volume {
 
 // Every device with a visible folder of a walked kind, in mount order, at the best of its mounts:
 // one of the whole file system before a part of it (bind mounts and Btrfs subvolumes are parts),
-// then the shortest path.
+// then the root folder, then one that holds a share, then the shortest path.
 std::vector<Volume> choose_volumes(const std::vector<Mount>& mounts);
 
-// The volume of the file system that holds `path`, or null.
-const Volume* volume_holding(const std::vector<Volume>& volumes, const std::vector<Mount>& mounts,
-                             const char* path);
+struct ServerVolumes {
+  std::vector<Mount> mounts;
+  std::vector<Volume> volumes;
+
+  // The volume of the file system that holds `path`, or null.
+  const Volume* holding(const char* path) const;
+};
+
+// The volumes of this server; its shares are taken into account.
+ServerVolumes read_volumes();
 
 // Whether `path` has one of the lengths at which the program's records cut a mount path.
 constexpr bool may_be_cut(std::string_view path) {

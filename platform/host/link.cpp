@@ -1,0 +1,130 @@
+// The link under which readers find a finished report.
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <filesystem>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "host_log.hpp"
+#include "page.hpp"
+#include "text_containers.hpp"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+
+namespace {
+
+// Everything but RFC 3986's unreserved characters, and the slashes that keep the path a path.
+std::string percent_encoded(std::string_view path) {
+  constexpr std::string_view kPlain =
+      "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-._~/";
+  constexpr std::string_view kHex = "0123456789ABCDEF";
+  std::string out;
+  for (const char c : path) {
+    if (kPlain.find(c) != std::string_view::npos) {
+      out += c;
+    } else {
+      const auto byte = static_cast<unsigned char>(c);
+      out += {'%', kHex[byte >> 4U], kHex[byte & 15U]};
+    }
+  }
+  return out;
+}
+
+// What is wrong with a link_base, or null. It stands in a mail and before a path, so it is a plain
+// URL: no query, no fragment, nothing that a mail program would end it at.
+const char* base_problem(std::string_view base) {
+  const bool is_file = base.starts_with("file:///");
+  if (!is_file && !base.starts_with("http://") && !base.starts_with("https://")) {
+    return "doesn't begin with http://, https:// or file:///";
+  }
+  const auto is_bad = [](unsigned char c) {
+    return c <= ' ' || c >= 0x7F || std::strchr("\"'<>\\^`{|}?#", c) != nullptr;
+  };
+  if (std::any_of(base.begin(), base.end(), is_bad)) {
+    return "holds a blank, quote, query or other character that must be percent-encoded";
+  }
+  const std::string_view authority = base.substr(base.find("//") + 2);
+  return !is_file && (authority.empty() || authority.front() == '/') ? "names no host" : nullptr;
+}
+
+// The URL that stands for the report folder, without a slash at its end; empty when refused.
+std::string base_of(const VLIBCSzHash& hash, const std::string& report_dir) {
+  const char* configured = hash.find("link_base");
+  std::string base = configured == nullptr || *configured == '\0'
+                         ? "file://" + percent_encoded(report_dir)
+                         : configured;
+  if (const char* problem = base_problem(base); problem != nullptr) {
+    host::log_line("link_base \"%.1100s\" %s; write link_base = https://server/reports in %s",
+                   base.c_str(), problem, VORN_PATH_CONFIG);
+    return {};
+  }
+  while (base.back() == '/') {
+    base.pop_back();
+  }
+  return base;
+}
+
+// `file` as seen from `folder`; nothing when it lies elsewhere.
+std::optional<std::string> below(const std::string& folder, const char* file) {
+  const std::filesystem::path relative =
+      std::filesystem::path(file).lexically_normal().lexically_relative(
+          std::filesystem::path(folder + "/").lexically_normal());
+  if (relative.empty() || *relative.begin() == "..") {
+    return std::nullopt;
+  }
+  return relative.string();
+}
+
+int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size_t size) {
+  if (!host::page_is_complete(target_file)) {
+    host::log_line("no link to \"%s\": it is no complete report page; see the errors of this run",
+                   target_file);
+    errno = ENOENT;
+    return -1;
+  }
+  const char* configured = hash.find("report_dir");
+  const std::string report_dir =
+      configured == nullptr || *configured == '\0' ? VORN_PATH_REPORTS : configured;
+  const std::optional<std::string> rest = below(report_dir, target_file);
+  errno = EINVAL;
+  if (!rest) {
+    host::log_line("no link to \"%s\": it isn't below report_dir \"%s\"", target_file,
+                   report_dir.c_str());
+    return -1;
+  }
+  const std::string base = base_of(hash, report_dir);
+  if (base.empty()) {
+    return -1;
+  }
+  const std::string text = base + "/" + percent_encoded(*rest);
+  if (text.size() >= size) {
+    host::log_line("the link to \"%s\" is longer than %zu bytes; write a shorter link_base in %s",
+                   target_file, size - 1, VORN_PATH_CONFIG);
+    errno = ENAMETOOLONG;
+    return -1;
+  }
+  std::memcpy(link, text.c_str(), text.size() + 1);
+  return 0;
+}
+
+}  // namespace
+
+int VornGetTargetLink(const VLIBCSzHash* hash, const char* target_file, char* link,
+                      size_t size) try {
+  if (hash == nullptr || target_file == nullptr || link == nullptr || size == 0) {
+    errno = EINVAL;
+    return -1;
+  }
+  *link = '\0';
+  const int saved_errno = errno;
+  const int result = make_link(*hash, target_file, link, size);
+  if (result == 0) {
+    errno = saved_errno;
+  }
+  return result;
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}

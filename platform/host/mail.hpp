@@ -1,0 +1,52 @@
+// The report mail: its text, and its delivery.
+#ifndef VORN_HOST_MAIL_HPP
+#define VORN_HOST_MAIL_HPP
+
+#include <chrono>
+#include <ctime>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "text_containers.hpp"
+
+namespace host {
+
+// How long delivery may take. A run is a job of the night: it waits for a slow server, not for a
+// dead one.
+struct MailLimits {
+  std::chrono::milliseconds connect{10'000};   // until the server has greeted
+  std::chrono::milliseconds transfer{60'000};  // one recipient
+  std::chrono::milliseconds total{120'000};    // all of them
+};
+
+// What the mail of one report says.
+struct MailText {
+  std::string profile;
+  std::string host;
+  std::string reports;
+  std::string link;
+  std::string from;
+  std::vector<std::string> to;
+  std::time_t time = 0;
+  std::string message_id;  // without the angle brackets
+};
+
+// Whether `address` can stand in a header and in an SMTP command as it is: printable ASCII without
+// blanks, quotes, angle brackets, commas and the like, one '@' with something on both sides, at
+// most 254 bytes.
+bool valid_address(std::string_view address);
+
+// The message: header and a plain text body, lines ended by CR LF, nothing but ASCII.
+std::string mail_message(const MailText& text);
+
+// A text in quoted-printable, so that any bytes travel and no line is too long.
+std::string quoted_printable(std::string_view text);
+
+// As VornQazSendReport.
+int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
+                const MailLimits& limits);
+
+}  // namespace host
+
+#endif
