@@ -1,0 +1,188 @@
+// The report frame through its two reports, over a real statistics database.
+#include <unistd.h>
+
+#include <algorithm>
+
+#include "fixture.hpp"
+#include "rep_large_file.hpp"
+#include "rep_share_list.hpp"
+#include "vornreport/report_data.hpp"
+#include "vornreport/statistics_db.hpp"
+
+namespace vornreport {
+namespace {
+
+class FrameTest : public UnitTest {
+ protected:
+  FrameTest() : data_(report_data_path().c_str()) {
+    unlink(data_.c_str());
+    set_profile("real_path_stat_db", folder_.path("stat.db"));
+    set_profile("real_path_csv", folder_.path());
+    users_.reset(VLIBCSzHashAlloc(8));
+    shares_.reset(VLIBCSzHashAlloc(8));
+    volumes_.reset(VLIBCSzHashAlloc(8));
+  }
+  ~FrameTest() override { unlink(data_.c_str()); }
+
+  static void set(HashHandle& hash, const std::string& key, const std::string& value) {
+    VLIBCSzHash* raw = hash ? hash.release() : VLIBCSzHashAlloc(8);
+    VLIBCSzHashSetValue(&raw, key.c_str(), value.c_str());
+    hash.reset(raw);
+  }
+  void set_profile(const std::string& key, const std::string& value) { set(profile_, key, value); }
+
+  void add(const std::string& share, const std::string& name, off_t size) {
+    const SqliteHandle db = VORNReportDBInit(profile_.get());
+    add(db.get(), share, name, size);
+  }
+  static void add(sqlite3* db, const std::string& share, const std::string& name, off_t size) {
+    struct stat status {};
+    status.st_size = size;
+    const std::string path = std::string("/").append(share).append("/").append(name);
+    const FileInfo info{share.c_str(), path.c_str(), name.c_str(), "", &status};
+    ASSERT_EQ(ReportDBAddFile(db, &info), 0);
+  }
+
+  int run(ReportFunction report, int embedded = 0) {
+    ReportArgs args{"p1",          profile_.get(), users_.get(), volumes_.get(),
+                    shares_.get(), nullptr,        nullptr,      embedded};
+    int result = 0;
+    output_ = printed([&] { result = report(&args); });
+    return result;
+  }
+
+  std::string data() const { return support::read_file(data_); }
+  std::string csv(const std::string& name) const {
+    return support::read_file(folder_.path(name + ".csv"));
+  }
+
+  std::string data_;
+  std::string output_;
+  HashHandle profile_;
+  HashHandle users_;
+  HashHandle volumes_;
+  HashHandle shares_;
+};
+
+TEST_F(FrameTest, TwoReportsAppendTheirBlocksInOrder) {
+  add("photo", "b", 7);
+  add("video", "it's", 900);
+  set(volumes_, "photo", "/srv");
+  set(volumes_, "video", "/srv");
+  platform.volume_ids["/srv"] = "srv";
+  EXPECT_EQ(run(share_list_db), 0);
+  EXPECT_EQ(run(large_file_db), 0);
+  EXPECT_EQ(data(),
+            "<script type='text/javascript'>\nvar vornShareListData = [\n"
+            "[ 'video', 'srv', '900' ],\n[ 'photo', 'srv', '7' ]\n];\n</script>\n"
+            "<import><script type='text/javascript'>\nvar vornLargeFileData = [\n"
+            "[ 'video', 'esc(/video/it's)'', '900' ]<import>,\n"
+            "[ 'photo', 'esc(/photo/b)'', '7' ]\n];\n</script>\n");
+  EXPECT_EQ(csv("share_list"),
+            "Share\tSize\n\"video\"\t\"srv\"\t\"csv(900)\"\n\"photo\"\t\"srv\"\t\"csv(7)\"\n");
+  EXPECT_EQ(csv("large_file"),
+            "Share\tFile\tSize(Byte)\n\"video\"\t\"csv(/video/it's)\"\t\"csv(900)\"\n"
+            "\"photo\"\t\"csv(/photo/b)\"\t\"csv(7)\"\n");
+  const std::vector<std::string> finished = {"CsvFile " + folder_.path("share_list.csv"),
+                                             "CsvFile " + folder_.path("large_file.csv")};
+  EXPECT_EQ(platform.calls, finished);
+}
+
+TEST_F(FrameTest, NoRowsLeaveALoneClosingTagAndTheHeader) {
+  EXPECT_EQ(run(share_list_db), 0);
+  EXPECT_EQ(data(), "</script>\n");
+  EXPECT_EQ(csv("share_list"), "Share\tSize\n");
+}
+
+TEST_F(FrameTest, LimitsCutThePageAndTheCsv) {
+  {
+    const SqliteHandle db = VORNReportDBInit(profile_.get());
+    sqlite3_exec(db.get(), "BEGIN", nullptr, nullptr, nullptr);
+    for (int i = 0; i < 10050; ++i) {
+      add(db.get(), "s", "f" + std::to_string(i), 20000 - i);
+    }
+    sqlite3_exec(db.get(), "COMMIT", nullptr, nullptr, nullptr);
+  }
+  EXPECT_EQ(run(large_file_db), 0);
+  const std::string page = data();
+  EXPECT_NE(page.find("(/s/f199)"), std::string::npos);
+  EXPECT_EQ(page.find("(/s/f200)"), std::string::npos);
+  const std::string table = csv("large_file");
+  EXPECT_EQ(std::count(table.begin(), table.end(), '\n'), 10001);
+}
+
+TEST_F(FrameTest, ShareWithoutVolumeIsLeftOut) {
+  add("gone", "a", 9);
+  add("photo", "b", 7);
+  set(volumes_, "photo", "/srv");  // which has no identifier
+  EXPECT_EQ(run(share_list_db), 0);
+  EXPECT_EQ(data(),
+            "<script type='text/javascript'>\nvar vornShareListData = [\n"
+            "[ 'photo', '', '7' ]\n];\n</script>\n");
+  const std::string log = support::syslog_text();
+  EXPECT_NE(log.find(")get volume path failed, share=gone\n\n"), std::string::npos) << log;
+  EXPECT_NE(log.find(")get volume id failed, volume=/srv\n"), std::string::npos) << log;
+  EXPECT_EQ(log.find("src/rep_share_list:"), 0U);
+}
+
+TEST_F(FrameTest, FailedFormatsKeepTheRow) {
+  add("s", "a", 1);
+  platform.failing = {"EscChar", "FormatCsvString"};
+  EXPECT_EQ(run(large_file_db), 0);
+  EXPECT_NE(data().find("[ 's', '', '1' ]"), std::string::npos);
+  EXPECT_EQ(csv("large_file"), "Share\tFile\tSize(Byte)\n\"s\"\t\"/s/a\"\t\"1\"\n");
+  EXPECT_NE(support::syslog_text().find("escape file failed, file=half\n"), std::string::npos);
+}
+
+TEST_F(FrameTest, EmbeddedLeavesHeaderTagAndFinishToTheCaller) {
+  add("s", "a", 1);
+  EXPECT_EQ(run(large_file_db, 1), 0);
+  EXPECT_EQ(csv("large_file"), "\"s\"\t\"csv(/s/a)\"\t\"csv(1)\"\n");
+  EXPECT_EQ(data().find("</script>"), std::string::npos);
+  EXPECT_TRUE(platform.calls.empty());
+}
+
+TEST_F(FrameTest, MissingPiecesFailTheReport) {
+  add("s", "a", 1);
+  const auto expect_failure = [&](const char* message) {
+    EXPECT_EQ(run(large_file_db), -1);
+    const std::string log = support::syslog_text();
+    EXPECT_NE(log.find(message), std::string::npos) << log;
+  };
+  set_profile("real_path_csv", "");
+  expect_failure(")get csv dir failed\n\n");
+  EXPECT_EQ(data(), "");
+  set_profile("real_path_csv", folder_.path("nowhere"));
+  expect_failure((")open file=" + folder_.path("nowhere/large_file.csv") + " failed\n\n").c_str());
+  set_profile("real_path_stat_db", "");
+  expect_failure(")open db failed\n\n");
+  users_.reset();
+  expect_failure("src/rep_large_file:");
+  EXPECT_EQ(output_.find("(src/rep_large_file:"), 0U);
+  EXPECT_FALSE(report_data_lost());
+}
+
+// A full disk under the page or the CSV file fails the report, and the run never makes a page of
+// it. Lost data is remembered for the process, hence the children.
+TEST_F(FrameTest, FullDiskMarksTheRunAsLost) {
+  add("s", "a", 1);
+  for (const bool page : {true, false}) {
+    const pid_t child = support::fork_child([&] {
+      data_ = report_data_path().c_str();
+      const std::string full = page ? data_ : folder_.path("large_file.csv");
+      unlink(full.c_str());
+      const bool planted = symlink("/dev/full", full.c_str()) == 0;
+      const bool failed = run(large_file_db) == -1 && report_data_lost();
+      unlink(full.c_str());
+      unlink(data_.c_str());
+      return planted && failed &&
+                     output_.find("write file=" + full + " failed") != std::string::npos
+                 ? 0
+                 : 1;
+    });
+    EXPECT_EQ(support::wait_child(child), 0) << (page ? "page" : "CSV file");
+  }
+}
+
+}  // namespace
+}  // namespace vornreport

@@ -1,0 +1,357 @@
+// Walking, importing and gathering, over real folders and real SQLite files.
+#include <fcntl.h>
+#include <sqlite3.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstring>
+#include <filesystem>
+
+#include "file_gathering/file_gathering.hpp"
+#include "file_gathering/index_import.hpp"
+#include "file_gathering/share_walk.hpp"
+#include "fixture.hpp"
+#include "vornreport/report_data.hpp"
+#include "vornreport/statistics_db.hpp"
+
+namespace vornreport {
+namespace {
+
+using support::write_file;
+
+class GatheringTest : public UnitTest {
+ protected:
+  GatheringTest() {
+    VLIBCSzHash* hash = VLIBCSzHashAlloc(8);
+    VLIBCSzHashSetValue(&hash, "real_path_stat_db", folder_.path("stat.db").c_str());
+    profile_.reset(hash);
+    types_.reset(VLIBCSzHashAlloc(8));
+    db_ = VORNReportDBInit(profile_.get());
+  }
+
+  int walk(const std::string& folder) {
+    return ReportShareWalk(db_.get(), "share", folder.c_str(), types_.get());
+  }
+
+  // All rows of a query, columns joined with '|' and rows with a line feed.
+  static std::string rows(sqlite3* db, const std::string& sql) {
+    std::string text;
+    const auto add = [](void* out, int count, char** values, char**) {
+      auto& all = *static_cast<std::string*>(out);
+      for (int i = 0; i < count; ++i) {
+        all += std::string(i == 0 ? "" : "|") + (values[i] != nullptr ? values[i] : "NULL");
+      }
+      all += "\n";
+      return 0;
+    };
+    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), add, &text, nullptr), SQLITE_OK) << sql;
+    return text;
+  }
+
+  std::string paths_below(const std::string& top) {
+    return rows(db_.get(), "select substr(path," + std::to_string(top.size() + 2) +
+                               ") from file_stat order by path");
+  }
+
+  // An index database with one row per line of values.
+  void make_index(const std::string& path, const std::string& values) {
+    sqlite3* raw = nullptr;
+    ASSERT_EQ(sqlite3_open(path.c_str(), &raw), SQLITE_OK);
+    const SqliteHandle index(raw);
+    rows(raw,
+         "create table file_info (owner_name text, time_modify text, size text, path text, "
+         "name text, file_ext text, is_dir integer); insert into file_info values " +
+             values);
+  }
+
+  HashHandle profile_;
+  HashHandle types_;
+  SqliteHandle db_;
+};
+
+TEST_F(GatheringTest, OpeningTwiceKeepsRows) {
+  struct stat status {};
+  const FileInfo info{"s", "/s/a", "a", nullptr, &status};
+  ASSERT_EQ(ReportDBAddFile(db_.get(), &info), 0);
+  db_ = VORNReportDBInit(profile_.get());
+  EXPECT_EQ(rows(db_.get(), "select share, path, filename, ext, typeof(ext) from file_stat"),
+            "s|/s/a|a||text\n");
+}
+
+TEST_F(GatheringTest, StoresWholeNumbersAndHostileTexts) {
+  struct stat status {};
+  status.st_uid = 4294967294U;
+  status.st_mtime = 4294967296L + 5;  // kept to 32 bits
+  status.st_size = 5368709120L;
+  const FileInfo info{"s", "/s/it's", "'); drop table file_stat; --", "x'y", &status};
+  ASSERT_EQ(ReportDBAddFile(db_.get(), &info), 0);
+  EXPECT_EQ(rows(db_.get(), "select owner, mtime, size, path, filename, ext from file_stat"),
+            "4294967294|5|5368709120|/s/it's|'); drop table file_stat; --|x'y\n");
+}
+
+// A text whose quotes don't fit the buffer once doubled is refused whole, wherever the cut would
+// have fallen: cut inside a doubled quote it would have ended its literal.
+TEST_F(GatheringTest, RefusesTextsWhoseQuotesDoNotFit) {
+  struct stat status {};
+  for (const size_t padding : {0U, 1U, 2U, 3U}) {
+    const std::string path = "/" + std::string(padding, 'p') + std::string(3000, '\'') +
+                             ",'a','b');delete from file_stat;--";
+    const FileInfo info{"s", path.c_str(), "n", "t", &status};
+    EXPECT_EQ(ReportDBAddFile(db_.get(), &info), -1);
+    EXPECT_NE(support::syslog_text().find("Exec sql:["), std::string::npos);
+  }
+  EXPECT_EQ(rows(db_.get(), "select count(*) from file_stat"), "0\n");
+  EXPECT_FALSE(report_data_lost());
+}
+
+TEST_F(GatheringTest, AddFileNamesTheMissingArgument) {
+  struct stat status {};
+  const FileInfo no_share{nullptr, "p", "n", "t", &status};
+  const FileInfo no_path{"s", nullptr, "n", "t", &status};
+  const FileInfo no_status{"s", "p", "n", "t", nullptr};
+  const struct {
+    sqlite3* db;
+    const FileInfo* info;
+    const char* condition;
+  } cases[] = {{nullptr, nullptr, "((void *)0) != db"},
+               {db_.get(), nullptr, "((void *)0) != pFileInfo"},
+               {db_.get(), &no_share, "((void *)0) != pFileInfo->szShare"},
+               {db_.get(), &no_path, "((void *)0) != pFileInfo->szPath"},
+               {db_.get(), &no_status, "NULL != pFileInfo->pst"}};
+  for (const auto& c : cases) {
+    EXPECT_EQ(ReportDBAddFile(c.db, c.info), -1);
+    const std::string text = support::syslog_text();
+    EXPECT_NE(text.find("Invaild Argument (" + std::string(c.condition) + ")=[0]\n"),
+              std::string::npos)
+        << text;
+  }
+}
+
+TEST_F(GatheringTest, WalkTakesRegularFilesOnly) {
+  const std::string top = folder_.path("top");
+  types_.reset(VLIBCSzHashAlloc(8));
+  VLIBCSzHash* types = types_.release();
+  VLIBCSzHashSetValue(&types, "gz", "archive");
+  VLIBCSzHashSetValue(&types, "profile", "dot");
+  VLIBCSzHashSetValue(&types, "", "empty");
+  types_.reset(types);
+  for (const char* name : {"a.tar.gz", ".profile", "ends.", "plain", "@eaDir/x", "in/@eaDir/y",
+                           "in/.hidden/z.GZ", "other/fs", "new\nline"}) {
+    write_file(top + "/" + name, "12345");
+  }
+  ASSERT_EQ(symlink("plain", (top + "/link").c_str()), 0);
+  ASSERT_EQ(symlink("/etc", (top + "/in/etc").c_str()), 0);
+  ASSERT_EQ(link((top + "/plain").c_str(), (top + "/in/hard").c_str()), 0);
+  ASSERT_EQ(mkfifo((top + "/fifo").c_str(), 0600), 0);
+  write_file(top + "/in/@eaDir.txt", "");
+  EXPECT_EQ(walk(top), 0);
+  EXPECT_EQ(rows(db_.get(), "select substr(path," + std::to_string(top.size() + 2) +
+                                "), filename, ext, size from file_stat order by path"),
+            ".profile|.profile|dot|5\n"
+            "a.tar.gz|a.tar.gz|archive|5\n"
+            "ends.|ends.|empty|5\n"
+            "in/.hidden/z.GZ|z.GZ|reportUI_file_type_other|5\n"
+            "in/@eaDir.txt|@eaDir.txt|reportUI_file_type_other|0\n"
+            "in/hard|hard|reportUI_file_type_other|5\n"
+            "new\nline|new\nline|reportUI_file_type_other|5\n"
+            "other/fs|fs|reportUI_file_type_other|5\n"
+            "plain|plain|reportUI_file_type_other|5\n");
+  EXPECT_EQ(support::syslog_text(), "");
+}
+
+TEST_F(GatheringTest, WalkJudgesEveryFileSystemByItsKind) {
+  const std::string top = folder_.path("top");
+  write_file(top + "/here", "");
+  std::filesystem::create_directories(top + "/proc");
+  for (const int kind : {1, 2, 3, 4, 6}) {
+    platform.fs_kind = kind;
+    rows(db_.get(), "delete from file_stat");
+    EXPECT_EQ(walk(top), 0);
+    EXPECT_EQ(paths_below(top), "here\n") << kind;
+  }
+  for (const int kind : {-1, 0, 5, 7}) {
+    platform.fs_kind = kind;
+    rows(db_.get(), "delete from file_stat");
+    EXPECT_EQ(walk(top), 0);
+    EXPECT_EQ(paths_below(top), "") << kind;
+  }
+  // A folder on another device is asked for again: / is walked, /proc and /dev are not.
+  platform.fs_kind = 0;
+  platform.fs_kinds["/dev"] = 1;
+  rows(db_.get(), "delete from file_stat");
+  EXPECT_EQ(walk("/dev"), 0);
+  EXPECT_EQ(rows(db_.get(), "select count(*) from file_stat where path like '/dev/shm/%'"), "0\n");
+}
+
+TEST_F(GatheringTest, WalkFailsForABadTopFolder) {
+  const std::string file = folder_.path("file");
+  write_file(file, "");
+  for (const std::string& top : {folder_.path("missing"), file}) {
+    EXPECT_EQ(walk(top), -1);
+    const std::string text = support::syslog_text();
+    EXPECT_NE(text.find(")Failed to stat [" + top + "].\n\n"), std::string::npos) << text;
+  }
+}
+
+// As deep as a path can be: the files above the cut are found, the rest is logged and skipped, and
+// neither the stack nor the file handles run out.
+TEST_F(GatheringTest, WalkGoesAsDeepAsAPathCanBe) {
+  const std::string top = folder_.path("deep");
+  std::filesystem::create_directories(top);
+  ASSERT_EQ(chdir(top.c_str()), 0);
+  for (int level = 0; level < 2100; ++level) {
+    ASSERT_EQ(mkdir("d", 0700), 0);
+    ASSERT_EQ(chdir("d"), 0);
+    if (level % 1000 == 999) {
+      ASSERT_GE(creat("f", 0600), 0);
+    }
+  }
+  ASSERT_EQ(chdir("/"), 0);
+  rlimit handles{};
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &handles), 0);
+  handles.rlim_cur = handles.rlim_max;
+  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &handles), 0);
+
+  std::string output;
+  // Every level above the cut says that the one below failed: too much for a queue nobody reads.
+  output = printed([&] {
+    const pid_t reader = support::fork_child([] {
+      for (;;) {
+        support::syslog_lines();
+        usleep(1000);
+      }
+      return 0;
+    });
+    EXPECT_EQ(walk(top), 0);
+    kill(reader, SIGKILL);
+    waitpid(reader, nullptr, 0);
+  });
+  EXPECT_EQ(rows(db_.get(), "select count(*) from file_stat"), "2\n");
+  EXPECT_NE(output.find("Failed to stat [" + top + "/d/d/"), std::string::npos);
+  const std::string cut = output.substr(output.find("Failed to stat [") + 16);
+  EXPECT_EQ(cut.find("].\n\n"), 4095U);
+}
+
+// A user swaps a folder for a link to a place outside while the walk is inside. The walk must never
+// report a file from there.
+TEST_F(GatheringTest, WalkIsNotLedOutByASwappedFolder) {
+  const std::string outside = folder_.path("outside");
+  const std::string top = folder_.path("top");
+  write_file(outside + "/secret", "");
+  write_file(outside + "/sub/secret", "");
+  for (int i = 0; i < 8; ++i) {
+    write_file(top + "/swapped/file" + std::to_string(i), "");
+    write_file(top + "/swapped/sub/file" + std::to_string(i), "");
+  }
+  const std::string folder = top + "/swapped";
+  const std::string aside = folder_.path("aside");
+  const pid_t swapper = support::fork_child([&] {
+    for (;;) {
+      rename(folder.c_str(), aside.c_str());
+      static_cast<void>(!symlink(outside.c_str(), folder.c_str()));
+      unlink(folder.c_str());
+      rename(aside.c_str(), folder.c_str());
+    }
+    return 0;
+  });
+  printed([&] {
+    for (int round = 0; round < 30000; ++round) {
+      walk(top);
+      support::syslog_lines();
+    }
+  });
+  kill(swapper, SIGKILL);
+  waitpid(swapper, nullptr, 0);
+  EXPECT_EQ(rows(db_.get(), "select count(*) from file_stat where filename='secret'"), "0\n");
+  EXPECT_NE(rows(db_.get(), "select count(*) from file_stat where filename='file1'"), "0\n");
+}
+
+TEST_F(GatheringTest, ImportCopiesTheFilesOfTheIndex) {
+  const std::string index = folder_.path("index.db");
+  platform.indexes["share"] = index;
+  platform.users = {{"ann", 1001}, {"bob", 1002}};
+  VLIBCSzHash* types = types_.release();
+  VLIBCSzHashSetValue(&types, "jpg", "image");
+  types_.reset(types);
+  make_index(index,
+             "('ann','1300000000','5368709120','a/x.jpg','x.jpg','jpg',0),"
+             "('bob','4294967301','0','y','y','zzz',0),"
+             "('ann','1','1','a','a','',1)");
+  EXPECT_EQ(ReportFileIndexImport("share", "/srv/s", db_.get(), types_.get()), 0);
+  EXPECT_EQ(
+      rows(db_.get(), "select owner,mtime,size,share,path,filename,ext from file_stat order by id"),
+      "1001|1300000000|5368709120|share|/srv/s/a/x.jpg|x.jpg|image\n"
+      "1002|5|0|share|/srv/s/y|y|reportUI_file_type_other\n");
+  EXPECT_NE(sqlite3_get_autocommit(db_.get()), 0);
+}
+
+TEST_F(GatheringTest, ImportFailsWithItsOwnMessage) {
+  const std::string index = folder_.path("index.db");
+  const auto import = [&] {
+    return ReportFileIndexImport("share", "/srv/s", db_.get(), types_.get());
+  };
+  const auto expect_failure = [&](const char* message) {
+    printed([&] { EXPECT_EQ(import(), -1); });
+    EXPECT_NE(support::syslog_text().find(message), std::string::npos) << message;
+  };
+  platform.indexes["share"] = index;
+  platform.failing = {"FileIndexDBPathGet"};
+  expect_failure(")get file index path failed, share=share\n\n");
+  platform.failing.clear();
+  expect_failure(")access file index failed, share=share\n\n");
+  write_file(index, "this is no database, but it is long enough to be looked at as one");
+  expect_failure(
+      "Exec sql:[select owner_name, time_modify, size, '/srv/s/'||path, name, file_ext "
+      "from file_info where is_dir=0;] error: file is not a database\n\n");
+}
+
+// The rows read before an unknown owner stay in the open transaction, and the walk that follows
+// commits them with its own: they are there twice.
+TEST_F(GatheringTest, FailedImportIsWalkedAndItsRowsStandTwice) {
+  const std::string top = folder_.path("photo");
+  write_file(top + "/x", "1");
+  write_file(top + "/y", "1");
+  const std::string index = folder_.path("index.db");
+  make_index(index, "('ann','1','1','x','x','',0),('ghost','1','1','y','y','',0)");
+  platform.users = {{"ann", 1001}};
+  platform.shares = {{"photo", top}, {"nowhere", ""}, {"left", top}};
+  platform.unselected = {"left"};
+  platform.indexes["photo"] = index;
+  db_.reset();
+  int result = 0;
+  const std::string output = printed([&] { result = file_gathering("p1", profile_.get()); });
+  EXPECT_EQ(result, 1);
+  db_ = VORNReportDBInit(profile_.get());
+  EXPECT_EQ(paths_below(top), "x\nx\ny\n");
+  std::string texts;  // the order of what was told, without positions
+  for (const char* text : {"stat start\n\n", "use file index db, share=photo\n", "cannot get uid",
+                           "Exec sql:[", "stat share=photo\n", "begin TRANSACTION failed, msg=",
+                           "cannot get share path, share=nowhere", "stat complete\n\n"}) {
+    const size_t found = output.find(text, texts.size());
+    ASSERT_NE(found, std::string::npos) << text << output;
+    texts.assign(found, ' ');
+  }
+  EXPECT_EQ(output.find("share=left"), std::string::npos);
+}
+
+TEST_F(GatheringTest, GatheringDoesNotStartWithoutItsParts) {
+  platform.shares = {{"s", folder_.path()}};
+  const struct {
+    const char* failing;
+    const char* message;
+  } cases[] = {{"InitFileTypeHash", ")init file type hash failed\n\n"},
+               {"ShareEnum", ")enum share failed\n\n"}};
+  for (const auto& c : cases) {
+    platform.failing = {c.failing};
+    printed([&] { EXPECT_EQ(file_gathering("p1", profile_.get()), -1); });
+    EXPECT_NE(support::syslog_text().find(c.message), std::string::npos);
+  }
+  printed([&] { EXPECT_EQ(file_gathering("", profile_.get()), -1); });
+  EXPECT_NE(support::syslog_text().find(")Bad Parameter\n\n"), std::string::npos);
+}
+
+}  // namespace
+}  // namespace vornreport

@@ -1,0 +1,217 @@
+#include "scripted_platform.hpp"
+
+#include <cstdio>
+#include <cstring>
+
+#include "vorn/config.h"
+#include "vorn/report.h"
+#include "vorn/share.h"
+#include "vorn/user.h"
+#include "vorn/volume.h"
+
+ScriptedPlatform platform;
+
+namespace {
+
+std::string shown(const char* text) {
+  return text != nullptr ? text : "(null)";
+}
+
+template <typename... Words>
+void record(Words... words) {
+  std::string call;
+  ((call += (call.empty() ? "" : " ") + shown(words)), ...);
+  platform.calls.push_back(call);
+}
+
+void fill(VLIBCSzHash** hash, const TextMap& entries) {
+  for (const auto& [key, value] : entries) {
+    VLIBCSzHashSetValue(hash, key.c_str(), value.c_str());
+  }
+}
+
+int made(const char* name, VLIBCSzHash** hash, const TextMap& entries) {
+  if (platform.fails(name)) {
+    return -1;
+  }
+  if (*hash == nullptr) {
+    *hash = VLIBCSzHashAlloc(8);
+  }
+  fill(hash, entries);
+  return 0;
+}
+
+int copied(const std::string& text, char* out, size_t size) {
+  if (text.size() >= size) {
+    *out = '\0';
+    return -1;
+  }
+  std::memcpy(out, text.c_str(), text.size() + 1);
+  return static_cast<int>(text.size());
+}
+
+int answer(const char* name, int result = 0) {
+  return platform.fails(name) ? -1 : result;
+}
+
+TextMap share_paths() {
+  return {platform.shares.begin(), platform.shares.end()};
+}
+
+}  // namespace
+
+extern "C" {
+
+void VornQazSetEnv(void) {}
+
+int VLIBCFileGetSection(const char* file, const char* section, VLIBCSzHash** hash) {
+  record("GetSection", file, section);
+  const auto found = platform.config.find(section);
+  if (found == platform.config.end()) {
+    return -1;
+  }
+  fill(hash, found->second);
+  return static_cast<int>(found->second.size());
+}
+
+int VLIBCFileSetSection(const char* file, const char* section, const char* new_name,
+                        const VLIBCSzHash* hash, const char* line_format) {
+  record("SetSection", file, section, new_name, VLIBCSzHashGetValue(hash, "report_list"),
+         line_format);
+  return answer("SetSection");
+}
+
+int VornQazEnumProfile(VLIBCSzList** list, int /*flags*/) {
+  for (const auto& section : platform.config) {
+    VLIBCSzListPush(list, section.first.c_str());
+  }
+  return static_cast<int>(platform.config.size());
+}
+
+int VornQazProfileRunning(const char* profile) {
+  record("ProfileRunning", profile);
+  return platform.running.count(profile) != 0 ? 1 : 0;
+}
+
+int VornQazStatusUpdate(const char* profile, const char* status) {
+  record("StatusUpdate", profile, status);
+  return answer("StatusUpdate");
+}
+
+int VornQazInitLocation(VLIBCSzHash** hash, int /*flags*/) {
+  return made("InitLocation", hash, platform.locations);
+}
+
+int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report) {
+  record("InitRealPath", profile, for_report != 0 ? "1" : "0");
+  return made("InitRealPath", hash, platform.real_paths);
+}
+
+int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash) {
+  record("ReportCleanTmp", profile, hash != nullptr ? "loaded" : nullptr);
+  return 0;
+}
+
+int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key) {
+  record("ScheduleClean", profile, key);
+  VLIBCSzHashRemove(hash, key);
+  return answer("ScheduleClean", platform.schedule_clean);
+}
+
+int VornQazImportLang(const VLIBCSzHash* /*hash*/, char* code, size_t size) {
+  return platform.fails("ImportLang") ? -1 : copied(platform.language, code, size);
+}
+
+int VornQazMatchShare(const VLIBCSzHash* /*hash*/, const char* share) {
+  return platform.unselected.count(share) == 0 ? 1 : 0;
+}
+
+int VornQazInitFilterUser(VLIBCSzHash** hash) {
+  return made("InitFilterUser", hash, {});
+}
+
+int VornQazGetSharePathHash(VLIBCSzHash** hash) {
+  return made("GetSharePathHash", hash, share_paths());
+}
+
+int VornQazGetVolumePathHash(VLIBCSzHash** hash) {
+  return made("GetVolumePathHash", hash, platform.volumes);
+}
+
+int VornQazInitFileTypeHash(VLIBCSzHash** hash) {
+  return made("InitFileTypeHash", hash, platform.file_types);
+}
+
+int VornQazVolumeGetId(const char* mount_path, char* id, size_t size) {
+  const auto found = platform.volume_ids.find(mount_path);
+  return found == platform.volume_ids.end() ? -1 : copied(found->second, id, size);
+}
+
+int VORNShareEnum(VLIBCSzList** list, int /*flags*/) {
+  for (const auto& share : platform.shares) {
+    VLIBCSzListPush(list, share.first.c_str());
+  }
+  return answer("ShareEnum", static_cast<int>(platform.shares.size()));
+}
+
+int VORNSharePathGet(const char* share, char* path, size_t size) {
+  const TextMap paths = share_paths();
+  const auto found = paths.find(share);
+  return found == paths.end() || found->second.empty() ? -1 : copied(found->second, path, size);
+}
+
+int VORNShareFileIndexIsEnabled(const char* share) {
+  return platform.indexes.count(share) != 0 ? 1 : 0;
+}
+
+int VORNShareFileIndexDBPathGet(const char* share, char* path, size_t size) {
+  return platform.fails("FileIndexDBPathGet") ? -1 : copied(platform.indexes[share], path, size);
+}
+
+int VORNGetFSType(const char* path, int /*flags*/) {
+  const auto found = platform.fs_kinds.find(path);
+  return found == platform.fs_kinds.end() ? platform.fs_kind : found->second;
+}
+
+int VORNUserGetUGID(const char* name, uid_t* uid, gid_t* /*gid*/) {
+  const auto found = platform.users.find(name);
+  if (found == platform.users.end()) {
+    return -1;
+  }
+  *uid = found->second;
+  return 0;
+}
+
+// Marks what it did, so that a test sees which texts went through it.
+int VornQazEscChar(const char* text, char* out, size_t size, char quote) {
+  const bool fails = platform.fails("EscChar");
+  const int length = copied(fails ? "half" : "esc(" + std::string(text) + ")" + quote, out, size);
+  return fails ? -1 : length;
+}
+
+int VornQazFormatCsvString(const char* text, char* out, size_t size) {
+  return platform.fails("FormatCsvString") ? -1
+                                           : copied("csv(" + std::string(text) + ")", out, size);
+}
+
+int VornQazCsvFile(const char* path) {
+  record("CsvFile", path);
+  return 0;
+}
+
+int VornQazImportSharePathHash(const VLIBCSzHash* /*share_path_hash*/, FILE* data) {
+  std::fputs("<import>", data);
+  return 0;
+}
+
+int VornGetTargetLink(const VLIBCSzHash* /*hash*/, const char* target_file, char* link,
+                      size_t size) {
+  record("GetTargetLink", target_file);
+  return platform.fails("GetTargetLink") ? -1 : copied(platform.link, link, size);
+}
+
+int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* /*hash*/) {
+  record("SendReport", profile, link);
+  return answer("SendReport");
+}
+}

@@ -1,0 +1,41 @@
+// A platform that does what a test tells it, linked in place of the host: every call is recorded,
+// any call can be made to fail. The text containers are the real ones.
+#pragma once
+
+#include <map>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "vorn/text.h"
+
+using TextMap = std::map<std::string, std::string>;
+
+struct ScriptedPlatform {
+  // What the calls answer.
+  std::set<std::string> failing;                            // names of calls that fail
+  std::set<std::string> running;                            // profiles held by another process
+  std::map<std::string, TextMap> config;                    // sections of vornreport.conf
+  TextMap real_paths;                                       // what VornQazInitRealPath adds
+  TextMap locations;                                        // what VornQazInitLocation adds
+  std::vector<std::pair<std::string, std::string>> shares;  // name and folder
+  TextMap indexes;                                          // share to its index database
+  TextMap volumes;                                          // share to mount path
+  TextMap volume_ids;                                       // mount path to identifier
+  TextMap file_types;                                       // extension to label
+  std::map<std::string, unsigned> users;                    // name to uid
+  std::set<std::string> unselected;                         // shares that the profile leaves out
+  int fs_kind = 1;
+  std::map<std::string, int> fs_kinds;  // for single folders
+  std::string language = "en";
+  std::string link = "http://files.example/report.html";
+  int schedule_clean = 0;
+
+  // What was called, as "Name argument argument", those that only look up left out.
+  std::vector<std::string> calls;
+
+  bool fails(const std::string& name) const { return failing.count(name) != 0; }
+};
+
+// Begins each test empty.
+extern ScriptedPlatform platform;
