@@ -13,6 +13,7 @@ void log_line(const char* format, ...) {
   char line[4096];
   va_list args;
   va_start(args, format);
+  // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized): it is, one line above
   vsnprintf(line, sizeof line, format, args);
   va_end(args);
   for (char* c = line; *c != '\0'; ++c) {

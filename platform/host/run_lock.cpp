@@ -10,12 +10,12 @@
 #include "run_lock.hpp"
 
 #include <fcntl.h>
-#include <signal.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <charconv>
+#include <csignal>
 #include <cstring>
 #include <utility>
 

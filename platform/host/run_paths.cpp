@@ -49,7 +49,7 @@ const char* report_dir_problem(std::string_view dir) {
     return "holds a single quote or a control character";
   }
   if ((std::string(dir) + "/").find("/../") != std::string::npos) {
-    return "holds \"..\"";
+    return R"(holds "..")";
   }
   return nullptr;
 }
@@ -147,7 +147,7 @@ void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
     }
     const std::string name(item.substr(first, item.find_last_not_of(" \t") - first + 1));
     if (std::find(known.texts.begin(), known.texts.end(), name) == known.texts.end()) {
-      log_line("profile \"%s\": share_list names \"%s\", which is no share of %s; correct the name",
+      log_line(R"(profile "%s": share_list names "%s", which is no share of %s; correct the name)",
                profile, name.c_str(), VORN_PATH_SHARES);
     }
   }
@@ -184,7 +184,7 @@ bool prepare(const ReportRun& run) {
 std::optional<ReportRun> begin_report_run(const char* profile, const VLIBCSzHash& hash,
                                           const std::string& dir, const std::string& folder) {
   if (!holds_profile(profile)) {
-    log_line("profile \"%s\" is not held by this process, so it can't run it", profile);
+    log_line(R"(profile "%s" is not held by this process, so it can't run it)", profile);
     errno = ENOLCK;
     return std::nullopt;
   }
@@ -232,7 +232,7 @@ std::optional<std::string> report_dir(const char* profile, const VLIBCSzHash& ha
   const char* value = hash.find("report_dir");
   std::string dir = value == nullptr || *value == '\0' ? VORN_PATH_REPORTS : value;
   if (const char* problem = report_dir_problem(dir); problem != nullptr) {
-    log_line("profile \"%s\": report_dir \"%.1100s\" %s; write report_dir = /... in %s", profile,
+    log_line(R"(profile "%s": report_dir "%.1100s" %s; write report_dir = /... in %s)", profile,
              dir.c_str(), problem, VORN_PATH_CONFIG);
     errno = EINVAL;
     return std::nullopt;

@@ -34,7 +34,7 @@ int store_status(const std::string& profile, std::string_view word) {
     errno = saved_errno;
     return 0;
   }
-  log_line("status \"%.*s\" of profile \"%s\" can't be stored in %s (%s)",
+  log_line(R"(status "%.*s" of profile "%s" can't be stored in %s (%s))",
            static_cast<int>(word.size()), word.data(), profile.c_str(), path.c_str(),
            std::strerror(errno));
   return -1;
@@ -58,7 +58,7 @@ void take_back(const ReportRun& run) {
 
 int update_status(const std::string& profile, std::string_view word) {
   if (word != "collect_data" && word != "success" && word != "fail") {
-    log_line("profile \"%s\": \"%.80s\" is no status word", profile.c_str(),
+    log_line(R"(profile "%s": "%.80s" is no status word)", profile.c_str(),
              std::string(word).c_str());
     errno = EINVAL;
     return -1;

@@ -1,11 +1,9 @@
-// A profile's runs: who holds it, where its files are, how it ends, and what is cleared up.
-#include <fcntl.h>
+// A profile's runs: where their files are, how they end, and what is cleared up.
 #include <gtest/gtest.h>
-#include <signal.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <cerrno>
+#include <algorithm>
 #include <filesystem>
 #include <regex>
 
@@ -31,47 +29,6 @@ std::string temporary(const char* kind, pid_t pid) {
   return "/tmp/vornreport_" + std::string(kind) + "." + std::to_string(pid);
 }
 
-// A process that is in the middle of a run of `profile`, until it is killed.
-class OtherRun {
- public:
-  explicit OtherRun(
-      const std::string& profile, const std::function<void()>& work = [] {}) {
-    int ready[2];
-    if (pipe(ready) != 0) {
-      return;
-    }
-    pid_ = support::fork_child([&] {
-      const int result = VornQazProfileRunning(profile.c_str());
-      work();
-      if (write(ready[1], &result, sizeof result) < 0) {
-        return 1;
-      }
-      for (;;) {
-        pause();
-      }
-    });
-    int result = -1;
-    started = read(ready[0], &result, sizeof result) > 0 && result == 0;
-    close(ready[0]);
-    close(ready[1]);
-  }
-  OtherRun(const OtherRun&) = delete;
-  OtherRun& operator=(const OtherRun&) = delete;
-  ~OtherRun() { end(); }
-  pid_t pid() const { return pid_; }
-  void end() {
-    if (pid_ > 0) {
-      kill(pid_, SIGKILL);
-      support::wait_child(pid_);
-      pid_ = -1;
-    }
-  }
-  bool started = false;
-
- private:
-  pid_t pid_ = -1;
-};
-
 class Run : public testing::Test {
  protected:
   // The value of a path key after VornQazInitRealPath.
@@ -95,91 +52,6 @@ class Run : public testing::Test {
 };
 
 }  // namespace
-
-// --- Holding a profile --------------------------------------------------------------------------
-
-TEST_F(Run, AHeldProfileIsRunningUntilItsHolderDies) {
-  OtherRun other("held");
-  ASSERT_TRUE(other.started);
-  EXPECT_NE(VornQazProfileRunning("held"), 0);
-  EXPECT_EQ(VornQazStatusUpdate("held", "collect_data"), -1);
-  other.end();
-  EXPECT_EQ(VornQazProfileRunning("held"), 0);
-  EXPECT_EQ(VornQazProfileRunning("held"), 0);  // its own
-  EXPECT_EQ(VornQazStatusUpdate("held", "collect_data"), 0);
-  EXPECT_EQ(support::syslog_text(), "");
-}
-
-TEST_F(Run, TakingTheNextProfileReleasesTheLast) {
-  ASSERT_EQ(VornQazProfileRunning("global"), 0);
-  ASSERT_EQ(VornQazProfileRunning("next"), 0);
-  EXPECT_TRUE(OtherRun("global").started);
-  EXPECT_FALSE(OtherRun("next").started);
-}
-
-TEST_F(Run, OnlyOneOfManyStartersWins) {
-  int gate[2];
-  ASSERT_EQ(pipe(gate), 0);
-  std::vector<pid_t> starters;
-  for (int i = 0; i < 6; ++i) {
-    starters.push_back(support::fork_child([&] {
-      close(gate[1]);
-      char byte = 0;
-      if (read(gate[0], &byte, 1) != 0) {  // until the gate opens: all at once
-        return 2;
-      }
-      const int busy = VornQazProfileRunning("race");
-      usleep(300'000);  // hold it until everyone has asked
-      return busy == 0 ? 0 : 1;
-    }));
-  }
-  close(gate[0]);
-  close(gate[1]);
-  int winners = 0;
-  for (const pid_t starter : starters) {
-    const int result = support::wait_child(starter);
-    EXPECT_TRUE(result == 0 || result == 1) << result;
-    winners += result == 0 ? 1 : 0;
-  }
-  EXPECT_EQ(winners, 1);
-}
-
-TEST_F(Run, NoChildOfTheHolderHoldsIt) {
-  // The holder starts a command that outlives it, as system() would, and dies.
-  int shell_ends[2];
-  ASSERT_EQ(pipe(shell_ends), 0);
-  const pid_t holder = support::fork_child([&] {
-    if (VornQazProfileRunning("parent") != 0) {
-      return 1;
-    }
-    if (fork() == 0) {
-      dup2(shell_ends[0], 0);
-      close(shell_ends[0]);
-      close(shell_ends[1]);
-      execl("/bin/cat", "cat", nullptr);
-      _exit(127);
-    }
-    // A forked child that is still this program doesn't hold it either.
-    return support::wait_child(support::fork_child([] { return VornQazProfileRunning("parent"); }));
-  });
-  close(shell_ends[0]);
-  EXPECT_EQ(support::wait_child(holder), 1);  // what the child that asked was told
-  EXPECT_EQ(VornQazProfileRunning("parent"), 0);
-  close(shell_ends[1]);
-}
-
-TEST_F(Run, AnUnworkableLockFailsTheStatusOnly) {
-  fs::create_directories(VORN_PATH_STATUS);
-  fs::create_symlink("/tmp/victim", VORN_PATH_STATUS "/.linked.lock");
-  fs::create_directory(VORN_PATH_STATUS "/.folder.lock");
-  for (const char* profile : {"linked", "folder"}) {
-    EXPECT_EQ(VornQazProfileRunning(profile), 0);
-    EXPECT_EQ(VornQazStatusUpdate(profile, "collect_data"), -1);
-    EXPECT_EQ(support::syslog_lines().size(), 1U);
-    EXPECT_EQ(status_of(profile), "<absent>");
-  }
-  EXPECT_FALSE(exists("/tmp/victim"));
-}
 
 TEST_F(Run, HostileProfileNamesFailEveryCall) {
   for (const std::string& name :
@@ -347,14 +219,14 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   const support::TempFolder outside;
   write_file(outside.path("precious"), "kept");
   const std::string folder = std::string(kReports) + "/killed";
-  OtherRun other("killed", [&] {
+  support::OtherRun other("killed", [&] {
     init("killed", 1);
     write_file(path("real_path_stat_db"), "");
     write_file(path("real_path_stat_db") + "-journal", "");
     write_file(path("real_path_csv") + "/deep/x.csv", "");
     fs::create_directory_symlink(outside.path(), path("real_path_csv") + "/link");
   });
-  ASSERT_TRUE(other.started);
+  ASSERT_TRUE(other.started());
   const pid_t pid = other.pid();
   write_file(folder + "/2020-01-01_00-00-00/report.html", "old report");
   fs::create_directory_symlink(outside.path(), folder + "/template");
@@ -371,7 +243,7 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   other.end();
 
   // A run that only collects data comes first, and must not hide the killed one's names.
-  EXPECT_TRUE(OtherRun("killed").started);
+  EXPECT_TRUE(support::OtherRun("killed").started());
   ASSERT_EQ(VornQazProfileRunning("killed"), 0);
   ASSERT_EQ(init("killed", 1), 0);
   EXPECT_FALSE(exists(temporary("data", pid)));

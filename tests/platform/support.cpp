@@ -6,12 +6,15 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <stdexcept>
+
+#include "vorn/report.h"
 
 namespace support {
 namespace {
@@ -49,6 +52,9 @@ class Environment : public testing::Environment {
  public:
   void SetUp() override {
     require_sandbox();
+    for (const auto& left : std::filesystem::directory_iterator("/usr/vorn")) {
+      std::filesystem::remove_all(left);  // an earlier run's
+    }
     bind_log_socket();
   }
 };
@@ -148,6 +154,35 @@ int wait_child(pid_t child) {
   while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
   }
   return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+}
+
+OtherRun::OtherRun(const std::string& profile, const std::function<void()>& work) {
+  int ready[2];
+  if (pipe(ready) != 0) {
+    return;
+  }
+  pid_ = fork_child([&] {
+    const int busy = VornQazProfileRunning(profile.c_str());
+    work();
+    if (write(ready[1], &busy, sizeof busy) < 0) {
+      return 1;
+    }
+    for (;;) {
+      pause();
+    }
+  });
+  close(ready[1]);
+  int busy = 1;
+  started_ = read(ready[0], &busy, sizeof busy) > 0 && busy == 0;
+  close(ready[0]);
+}
+
+void OtherRun::end() {
+  if (pid_ > 0) {
+    kill(pid_, SIGKILL);
+    wait_child(pid_);
+    pid_ = -1;
+  }
 }
 
 Hash make_hash(const std::vector<std::pair<std::string, std::string>>& entries) {

@@ -46,6 +46,23 @@ pid_t fork_child(const std::function<int()>& work);
 // The exit status of `child`, or -signal.
 int wait_child(pid_t child);
 
+// A process that is in the middle of a run of `profile`, having done `work`, until it is killed.
+class OtherRun {
+ public:
+  explicit OtherRun(
+      const std::string& profile, const std::function<void()>& work = [] {});
+  OtherRun(const OtherRun&) = delete;
+  OtherRun& operator=(const OtherRun&) = delete;
+  ~OtherRun() { end(); }
+  bool started() const { return started_; }
+  pid_t pid() const { return pid_; }
+  void end();
+
+ private:
+  pid_t pid_ = -1;
+  bool started_ = false;
+};
+
 struct FreeHash {
   void operator()(VLIBCSzHash* hash) const { VLIBCSzHashFree(hash); }
 };

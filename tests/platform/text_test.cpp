@@ -31,21 +31,6 @@ TEST(Hash, KeepsItsTextsAndOrdersThemByKey) {
   EXPECT_EQ(hash->sorted().size(), 5001U);
 }
 
-TEST(Hash, RefusesNull) {
-  VLIBCSzHash* none = nullptr;
-  const support::Hash owner = support::make_hash();
-  VLIBCSzHash* hash = owner.get();
-  EXPECT_EQ(VLIBCSzHashGetValue(nullptr, "a"), nullptr);
-  EXPECT_EQ(VLIBCSzHashGetValue(hash, nullptr), nullptr);
-  EXPECT_EQ(VLIBCSzHashSetValue(&none, "a", "b"), -1);
-  EXPECT_EQ(VLIBCSzHashSetValue(&hash, "a", nullptr), -1);
-  EXPECT_EQ(VLIBCSzHashRemove(nullptr, "a"), -1);
-  EXPECT_EQ(VLIBCSzListPush(nullptr, "a"), -1);
-  EXPECT_EQ(VLIBCSzListCount(nullptr), 0);
-  VLIBCSzHashFree(nullptr);
-  VLIBCSzListFree(nullptr);
-}
-
 TEST(Hash, AsksTheResolverOncePerKey) {
   const support::Hash hash = support::make_hash({{"known", "1"}});
   int asked = 0;

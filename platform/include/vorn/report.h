@@ -28,11 +28,12 @@ int VornQazEnumProfile(VLIBCSzList** list, int flags);
 // Takes profile `profile` for this process unless another live process holds it: one atomic
 // test-and-take with a lock that the kernel drops when the process dies and that no child inherits.
 // 0: it is held by this process now (and the profile held before was released). Non-zero: another
-// process holds it. When the lock itself can't be worked (bad name, read-only disk), one syslog
-// line, 0, and VornQazStatusUpdate fails for this profile.
+// process holds it, and this one keeps what it held. When the lock itself can't be worked (bad name,
+// read-only disk), one syslog line, 0, and VornQazStatusUpdate fails for this profile.
 int VornQazProfileRunning(const char* profile);
 
-// Stores the status word of `profile`, atomically: "collect_data", "success" or "fail".
+// Stores the status word of `profile`, atomically: "collect_data", "success" or "fail". Only the
+// holder of the profile can.
 // In a report run (VornQazInitRealPath with for_report 1) "success" is stored only when the
 // finished report is complete; otherwise "fail" is stored, one syslog line says why, what looked
 // like a report is removed, and the result is still 0. -1 when nothing could be stored.
@@ -53,7 +54,7 @@ int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report)
 // with journal, and this process's temporary names in /tmp. Never a finished report, and nothing
 // while another live process holds the profile. `hash` is the profile with its paths; null when
 // loading it failed, then only what needs no configuration is removed. When this process is in the
-// middle of a report run of `profile`, the status "fail" is stored. 0 or -1.
+// middle of a run of `profile` (it holds it), the status "fail" is stored. 0 or -1.
 int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash);
 
 // Removes the schedule whose identifier is the value of `key` in `*hash` (its file in
