@@ -80,8 +80,13 @@ count_empty_blocks() { # FILE
 end_head() { # FILE
   empty=$(count_empty_blocks "$1")
   # A report that failed half-way leaves its block open, and the rest of the page inside it.
-  if [ "$(tail -n 1 -- "$1")" != '</script>' ]; then
-    printf '\n</script>\n'
+  case $(tail -n 1 -- "$1") in
+    '</script>' | '</style>') ;;
+    *) printf '\n</script>\n' ;;
+  esac
+  # A run that found its language setting bad adds none; the page speaks English then.
+  if ! grep -q '^var vornLang = ' <"$1"; then
+    language en
   fi
   printf '<meta name="vorn-empty-reports" content="%s">\n</head>\n<body>\n' "$empty"
 }

@@ -24,10 +24,10 @@
 
   var UNITS = ['B', 'KiB', 'MiB', 'GiB', 'TiB', 'PiB', 'EiB'];
 
-  var dictionary = window.vornText || {lang: 'en', reports: {}, columns: {}};
+  var dictionary = window.vornText;
 
   function say(key, number) {
-    return (dictionary[key] || key).replace('{n}', number);
+    return dictionary[key].replace('{n}', number);
   }
 
   function append(parent, tag, text) {
