@@ -59,27 +59,38 @@ TEST(Holding, OnlyOneOfManyStartersWins) {
 }
 
 TEST(Holding, NoChildOfTheHolderHoldsIt) {
-  // The holder starts a command that outlives it, as system() would, and dies.
+  // The holder starts a command, as system() would, and dies; the command outlives it, and so does
+  // a child that was forked only.
   int shell_ends[2];
   ASSERT_EQ(pipe(shell_ends), 0);
   const pid_t holder = support::fork_child([&] {
     if (VornQazProfileRunning("parent") != 0) {
       return 1;
     }
-    if (fork() == 0) {
-      dup2(shell_ends[0], 0);
-      close(shell_ends[0]);
-      close(shell_ends[1]);
-      execl("/bin/cat", "cat", nullptr);
-      _exit(127);
+    for (const bool forked_only : {true, false}) {
+      if (fork() == 0) {
+        dup2(shell_ends[0], 0);
+        close(shell_ends[0]);
+        close(shell_ends[1]);
+        char byte = 0;
+        _exit(forked_only ? static_cast<int>(read(0, &byte, 1))
+                          : execl("/bin/cat", "cat", nullptr));
+      }
     }
-    // A forked child that is still this program doesn't hold it either.
     return support::wait_child(support::fork_child([] { return VornQazProfileRunning("parent"); }));
   });
   close(shell_ends[0]);
   EXPECT_EQ(support::wait_child(holder), 1);  // what the child that asked was told
   EXPECT_EQ(VornQazProfileRunning("parent"), 0);
   close(shell_ends[1]);
+}
+
+TEST(Holding, NamesOfALiveProcessStay) {
+  // The id that the last holder left belongs to another program by now.
+  support::write_file(VORN_PATH_STATUS "/.alive.lock", "1\n");
+  support::write_file("/tmp/vornreport_data.1", "");
+  EXPECT_EQ(VornQazProfileRunning("alive"), 0);
+  EXPECT_TRUE(support::exists("/tmp/vornreport_data.1"));
 }
 
 TEST(Holding, AnUnworkableLockFailsTheStatusOnly) {

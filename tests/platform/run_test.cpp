@@ -272,6 +272,7 @@ TEST_F(Run, CleaningEndsOwnRunAsFailed) {
     EXPECT_FALSE(exists(path("real_path_stat_db")));
     EXPECT_FALSE(exists(temporary("data", getpid())));
     EXPECT_EQ(exists(path("real_path_date")), !with_hash);
+    EXPECT_FALSE(support::OtherRun("clean").started());  // it still holds the profile
   }
   // From outside, with nobody running it, the status stays.
   ASSERT_EQ(VornQazProfileRunning("another"), 0);

@@ -28,8 +28,8 @@ int VornQazEnumProfile(VLIBCSzList** list, int flags);
 // Takes profile `profile` for this process unless another live process holds it: one atomic
 // test-and-take with a lock that the kernel drops when the process dies and that no child inherits.
 // 0: it is held by this process now (and the profile held before was released). Non-zero: another
-// process holds it, and this one keeps what it held. When the lock itself can't be worked (bad name,
-// read-only disk), one syslog line, 0, and VornQazStatusUpdate fails for this profile.
+// process holds it, and this one keeps what it held. When the lock itself can't be worked (bad
+// name, read-only disk), one syslog line, 0, and VornQazStatusUpdate fails for this profile.
 int VornQazProfileRunning(const char* profile);
 
 // Stores the status word of `profile`, atomically: "collect_data", "success" or "fail". Only the
