@@ -4,8 +4,10 @@
 
 #include <algorithm>
 #include <array>
+#include <charconv>
 #include <cstdint>
 #include <cstring>
+#include <string_view>
 
 #include "module.hpp"
 #include "vorn/report.h"
@@ -39,6 +41,48 @@ const char* quote(const char* text, QuotedText& buffer) {
   }
   return sqlite3_snprintf(static_cast<int>(buffer.size()), buffer.data(), "%q", text);
 }
+
+// The INSERT statement of one file, as snprintf would write it, cut at the same byte; put together
+// by hand because a million of them are made and formatting was 5 % of the gathering.
+class InsertStatement {
+ public:
+  const char* make(const FileInfo& info, const char* path, const char* name, const char* type) {
+    end_ = text_.data();
+    text("INSERT INTO file_stat (owner, mtime, size, share, path, filename, ext) VALUES (");
+    number(static_cast<uint32_t>(info.pst->st_uid));
+    text(", ");
+    number(static_cast<uint32_t>(info.pst->st_mtime));
+    text(", ");
+    number(static_cast<uint64_t>(info.pst->st_size));
+    text(", '");
+    text(info.szShare);
+    text("', '");
+    text(path);
+    text("', '");
+    text(name);
+    text("', '");
+    text(type);
+    text("');");
+    *end_ = '\0';
+    return text_.data();
+  }
+
+ private:
+  size_t room() const { return static_cast<size_t>(text_.data() + text_.size() - 1 - end_); }
+  void text(std::string_view piece) {
+    const size_t length = std::min(piece.size(), room());
+    std::memcpy(end_, piece.data(), length);
+    end_ += length;
+  }
+  void number(uint64_t value) {
+    std::array<char, 20> digits;
+    const char* end = std::to_chars(digits.data(), digits.data() + digits.size(), value).ptr;
+    text({digits.data(), static_cast<size_t>(end - digits.data())});
+  }
+
+  std::array<char, kStatementSize> text_;
+  char* end_ = text_.data();
+};
 
 // The first argument that must not be null and is, as the text of its check; null when all are set.
 const char* missing_argument(const sqlite3* db, const FileInfo* info) {
@@ -111,7 +155,7 @@ int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo) {
   static QuotedText path_buffer;
   static QuotedText name_buffer;
   static QuotedText type_buffer;
-  static std::array<char, kStatementSize> statement;
+  static InsertStatement statement;
   const char* path = quote(pFileInfo->szPath, path_buffer);
   const char* name = quote(pFileInfo->szName, name_buffer);
   const char* type = quote(pFileInfo->szType, type_buffer);
@@ -119,22 +163,16 @@ int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo) {
     log_exec_failure("INSERT INTO file_stat", sqlite3_errstr(SQLITE_TOOBIG));
     return -1;
   }
-  // One longer than the buffer is cut inside a literal, and SQLite refuses it.
-  std::snprintf(statement.data(), statement.size(),
-                "INSERT INTO file_stat (owner, mtime, size, share, path, filename, ext) VALUES "
-                "(%u, %u, %llu, '%s', '%s', '%s', '%s');",
-                static_cast<unsigned>(pFileInfo->pst->st_uid),
-                static_cast<unsigned>(pFileInfo->pst->st_mtime),
-                static_cast<unsigned long long>(pFileInfo->pst->st_size), pFileInfo->szShare, path,
-                name, type);
+  // One longer than its buffer is cut inside a literal, and SQLite refuses it.
+  const char* sql = statement.make(*pFileInfo, path, name, type);
   VornQazSetEnv();
   char* message = nullptr;
-  const int result = sqlite3_exec(db, statement.data(), nullptr, nullptr, &message);
+  const int result = sqlite3_exec(db, sql, nullptr, nullptr, &message);
   if (result == SQLITE_OK) {
     return 0;
   }
   const SqliteText owned(message);
-  log_exec_failure(statement.data(), message);
+  log_exec_failure(sql, message);
   if (is_storage_failure(result)) {
     mark_report_data_lost();
   }

@@ -107,6 +107,18 @@ TEST_F(GatheringTest, RefusesTextsWhoseQuotesDoNotFit) {
   EXPECT_FALSE(report_data_lost());
 }
 
+// 4095 bytes of path and of name fit their buffers, but not the statement together.
+TEST_F(GatheringTest, AStatementCutAtItsBufferIsRefused) {
+  struct stat status {};
+  const std::string longest(4095, 'x');
+  const FileInfo whole{"s", longest.c_str(), "n", "t", &status};
+  EXPECT_EQ(ReportDBAddFile(db_.get(), &whole), 0);
+  const FileInfo cut{"s", longest.c_str(), longest.c_str(), "t", &status};
+  printed([&] { EXPECT_EQ(ReportDBAddFile(db_.get(), &cut), -1); });
+  EXPECT_NE(support::syslog_text().find("] error: unrecognized token"), std::string::npos);
+  EXPECT_EQ(rows(db_.get(), "select length(path) from file_stat"), "4095\n");
+}
+
 TEST_F(GatheringTest, AddFileNamesTheMissingArgument) {
   struct stat status {};
   const FileInfo no_share{nullptr, "p", "n", "t", &status};

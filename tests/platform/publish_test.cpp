@@ -1,0 +1,312 @@
+// The link to a report and the mail that carries it, against a real mail server.
+#include <arpa/inet.h>
+#include <gtest/gtest.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstring>
+#include <filesystem>
+#include <regex>
+
+#include "file_io.hpp"
+#include "mail.hpp"
+#include "support.hpp"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+
+using support::make_hash;
+using support::syslog_lines;
+using support::syslog_text;
+using Entries = std::vector<std::pair<std::string, std::string>>;
+
+namespace {
+
+// --- Link ---------------------------------------------------------------------------------------
+
+std::string link_of(const Entries& profile, const std::string& file, size_t size = 1024) {
+  std::string link(size, 'x');
+  const int result =
+      VornGetTargetLink(make_hash(profile).get(), file.c_str(), link.data(), link.size());
+  link.resize(std::strlen(link.c_str()));
+  return result == 0 ? link : "refused" + link;
+}
+
+TEST(TargetLink, StandsForTheReportFolder) {
+  const support::TempFolder folder;
+  const std::string base = folder.path("r\xc3\xa4 #1");
+  const std::string page = base + "/weekly/2024-02-29_17-30-00/report.html";
+  support::write_file(page, "<!doctype html>\n</html>\n");
+  const std::string rest = "/weekly/2024-02-29_17-30-00/report.html";
+  const std::string own = "file://" + folder.path("r%C3%A4%20%231") + rest;
+
+  EXPECT_EQ(own, link_of({{"report_dir", base}}, page));
+  EXPECT_EQ(own, link_of({{"report_dir", base + "//"}, {"link_base", ""}}, page));
+  const std::pair<const char*, std::string> bases[] = {
+      {"https://files.example.com/reports", "https://files.example.com/reports" + rest},
+      {"http://user@h:8080/a%20b/", "http://user@h:8080/a%20b" + rest},
+      {"file:///mnt/reports", "file:///mnt/reports" + rest},
+      {"javascript:alert(1)", "refused"},
+      {"ftp://h/x", "refused"},
+      {"file://relative", "refused"},
+      {"https:///x", "refused"},
+      {"https://h/a b", "refused"},
+      {"https://h/\"x", "refused"},
+      {"https://h/'x", "refused"},
+      {"https://h/?q", "refused"},
+      {"https://h/\x01", "refused"},
+  };
+  for (const auto& [link_base, expected] : bases) {
+    syslog_lines();
+    EXPECT_EQ(expected, link_of({{"report_dir", base}, {"link_base", link_base}}, page));
+    EXPECT_EQ(expected == "refused" ? 1U : 0U, syslog_lines().size()) << link_base;
+  }
+}
+
+TEST(TargetLink, IsOnlyForACompletePageBelowTheFolderThatFits) {
+  const support::TempFolder folder;
+  const std::string page = folder.path("r/p/t/report.html");
+  support::write_file(page, "</html>");
+  EXPECT_EQ("refused", link_of({{"report_dir", folder.path("r")}}, page)) << "no last line";
+  support::write_file(page, "x\n</html>\n");
+  EXPECT_EQ("refused", link_of({{"report_dir", folder.path("other")}}, page));
+  EXPECT_EQ("refused", link_of({{"report_dir", folder.path("r")}}, page + "x"));
+  const std::string link = link_of({{"report_dir", folder.path("r")}}, page);
+  EXPECT_EQ("file://" + page, link);
+  EXPECT_EQ("refused", link_of({{"report_dir", folder.path("r")}}, page, link.size()));
+  EXPECT_EQ(link, link_of({{"report_dir", folder.path("r")}}, page, link.size() + 1));
+}
+
+// --- Mail ---------------------------------------------------------------------------------------
+
+// The server script as a child process; ended with the scope.
+class MailServer {
+ public:
+  explicit MailServer(const std::vector<std::string>& options = {}) {
+    int ends[2];
+    if (pipe(ends) != 0) {
+      throw std::runtime_error("pipe");
+    }
+    const std::string script = std::filesystem::path(__FILE__).parent_path() / "smtp_server.py";
+    std::vector<std::string> words = {"/usr/bin/python3", script, mails_.path()};
+    words.insert(words.end(), options.begin(), options.end());
+    pid_ = support::fork_child([&] {
+      dup2(ends[1], STDOUT_FILENO);
+      std::vector<char*> arguments;
+      for (std::string& word : words) {
+        arguments.push_back(word.data());
+      }
+      arguments.push_back(nullptr);
+      execv(arguments[0], arguments.data());
+      return 127;
+    });
+    close(ends[1]);
+    FILE* output = fdopen(ends[0], "r");
+    if (std::fscanf(output, "%d", &port_) != 1) {
+      ADD_FAILURE() << "the mail server doesn't start";
+    }
+    std::fclose(output);
+  }
+  MailServer(const MailServer&) = delete;
+  MailServer& operator=(const MailServer&) = delete;
+  ~MailServer() {
+    kill(pid_, SIGKILL);
+    support::wait_child(pid_);
+  }
+
+  std::string url(const char* scheme = "smtp") const {
+    return std::string(scheme) + "://127.0.0.1:" + std::to_string(port_);
+  }
+  // Message `n`, from 1, without what differs from run to run.
+  std::string mail(int n) const {
+    return support::read_file(mails_.path(std::to_string(n) + ".eml"));
+  }
+  std::size_t count() const {
+    return static_cast<std::size_t>(std::distance(
+        std::filesystem::directory_iterator(mails_.path()), std::filesystem::directory_iterator()));
+  }
+
+ private:
+  support::TempFolder mails_;
+  pid_t pid_ = -1;
+  int port_ = 0;
+};
+
+int send(Entries profile, const std::string& url, const char* to = "a@example.com") {
+  profile.emplace_back("smtp_url", url);
+  profile.emplace_back("mail_to", to);
+  return VornQazSendReport("weekly", "https://h/r.html", make_hash(profile).get());
+}
+
+TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
+  const MailServer server;
+  const std::string long_link = "https://h/" + std::string(1000, 'x') + "?=.\n.\nend";
+  const Entries profile = {{"mail_to", " a@example.com , b@example.com,,a@example.com"},
+                           {"mail_from", "reports@example.com"},
+                           {"report_list", "share_list,large_file"},
+                           {"smtp_url", server.url()}};
+  ASSERT_EQ(0, VornQazSendReport("weekly", long_link.c_str(), make_hash(profile).get()));
+  EXPECT_EQ("", syslog_text());
+  ASSERT_EQ(2U, server.count());
+
+  const std::regex form(
+      "X-Test-From: reports@example\\.com\r\nX-Test-To: ([ab])@example\\.com\r\n"
+      "X-Test-Port: (\\d+)\r\nX-Test-Secure: no\r\n"
+      "Date: \\w{3}, \\d\\d \\w{3} \\d{4} \\d\\d:\\d\\d:\\d\\d [-+]\\d{4}\r\n"
+      "From: reports@example\\.com\r\nTo: a@example\\.com,\r\n b@example\\.com\r\n"
+      "Message-ID: <[^<>@ ]+@[^<>@ ]+>\r\n"
+      "Subject: Storage report weekly of [-.\\w]+, \\d{4}-\\d\\d-\\d\\d \\d\\d:\\d\\d:\\d\\d\r\n"
+      "Auto-Submitted: auto-generated\r\nMIME-Version: 1\\.0\r\n"
+      "Content-Type: text/plain; charset=UTF-8\r\n"
+      "Content-Transfer-Encoding: quoted-printable\r\n\r\n([^]*)");
+  std::string ports[2];
+  for (int i = 0; i < 2; ++i) {
+    const std::string mail = server.mail(i + 1);
+    std::smatch parts;
+    ASSERT_TRUE(std::regex_match(mail, parts, form)) << mail;
+    EXPECT_EQ(i == 0 ? "a" : "b", parts[1]);
+    ports[i] = parts[2];
+    const std::string body = std::regex_replace(parts[3].str(), std::regex("=\r\n"), "");
+    EXPECT_NE(std::string::npos, body.find(std::string(1000, 'x') + "?=3D.\r\n..\r\nend\r\n"))
+        << "lines of one dot must not end the message: " << body;
+    EXPECT_NE(std::string::npos, body.find("\"weekly\""));
+    EXPECT_NE(std::string::npos, body.find("share_list,large_file"));
+  }
+  EXPECT_EQ(ports[0], ports[1]);
+}
+
+TEST(SendReport, NamesEachRefusedRecipient) {
+  {
+    const MailServer server({"--refuse", "b@example.com"});
+    EXPECT_EQ(0, send({}, server.url(), "a@example.com,b@example.com,c@example.com"));
+    EXPECT_EQ(2U, server.count());
+    const auto lines = syslog_lines();
+    ASSERT_EQ(1U, lines.size());
+    EXPECT_NE(std::string::npos, lines[0].find("b@example.com: 550 5.1.1 no mailbox")) << lines[0];
+  }
+  const MailServer server({"--refuse", "*"});
+  EXPECT_EQ(-1, send({}, server.url(), "a@example.com,b@example.com"));
+  EXPECT_EQ(0U, server.count());
+  EXPECT_EQ(2U, syslog_lines().size());
+}
+
+TEST(SendReport, GivesUpOnAServerThatIsAbsentOrSilent) {
+  const int listener = socket(AF_INET, SOCK_STREAM, 0);
+  sockaddr_in address{};
+  address.sin_family = AF_INET;
+  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  socklen_t length = sizeof address;
+  auto* generic = reinterpret_cast<sockaddr*>(&address);
+  ASSERT_EQ(0, bind(listener, generic, length));
+  ASSERT_EQ(0, getsockname(listener, generic, &length));
+  const std::string url = "smtp://127.0.0.1:" + std::to_string(ntohs(address.sin_port));
+
+  EXPECT_EQ(-1, send({}, url, "a@example.com,b@example.com")) << "nobody listens yet";
+  auto lines = syslog_lines();
+  ASSERT_EQ(1U, lines.size());
+  EXPECT_NE(std::string::npos, lines[0].find("2 recipients not served")) << lines[0];
+
+  ASSERT_EQ(0, listen(listener, 5));
+  using std::chrono::milliseconds;
+  const host::MailLimits limits{milliseconds(200), milliseconds(400), milliseconds(800)};
+  const support::Hash hash =
+      make_hash({{"smtp_url", url}, {"mail_to", "a@example.com,b@example.com"}});
+  errno = 0;
+  EXPECT_EQ(-1, host::send_report("weekly", "l", *hash, limits)) << "it never greets";
+  EXPECT_EQ(ETIMEDOUT, errno);
+  EXPECT_EQ(1U, syslog_lines().size());
+  close(listener);
+}
+
+TEST(SendReport, LogsInWithThePasswordOfASafeFile) {
+  const support::TempFolder folder;
+  const std::string file = folder.path("password");
+  support::write_file(file, "s3cret: \"x\r\nsecond line\n");
+  ASSERT_EQ(0, chmod(file.c_str(), 0640));
+  const MailServer server({"--login", "joe:s3cret: \"x"});
+  const Entries good = {{"smtp_user", "joe"}, {"smtp_password_file", file}};
+  EXPECT_EQ(0, send(good, server.url()));
+  EXPECT_EQ(1U, server.count());
+  EXPECT_EQ(-1, send({}, server.url())) << "the server wants a user";
+  EXPECT_EQ(-1, send({{"smtp_user", "eve"}, {"smtp_password_file", file}}, server.url()));
+  syslog_lines();
+
+  support::write_file(folder.path("empty"), "\nx");
+  chmod(folder.path("empty").c_str(), 0600);
+  support::write_file(folder.path("open"), "x");
+  chmod(folder.path("open").c_str(), 0604);
+  for (const std::string& name :
+       {std::string(), std::string("password"), folder.path(), folder.path("empty"),
+        folder.path("open"), folder.path("absent")}) {
+    EXPECT_EQ(-1, send({{"smtp_user", "joe"}, {"smtp_password_file", name}}, server.url()));
+    EXPECT_EQ(1U, syslog_lines().size()) << name;
+  }
+  EXPECT_EQ(1U, server.count());
+}
+
+TEST(SendReport, VerifiesTheServerOfAnEncryptedConnection) {
+  const support::TempFolder folder;
+  const std::string pem = folder.path("server.pem");
+  ASSERT_EQ(0,
+            std::system(("/usr/bin/openssl req -x509 -newkey ec -pkeyopt "
+                         "ec_paramgen_curve:prime256v1 -nodes -days 2 -subj /CN=127.0.0.1 "
+                         "-addext subjectAltName=IP:127.0.0.1 -keyout " +
+                         pem + " -out " + pem + ".crt 2>/dev/null && cat " + pem + ".crt >> " + pem)
+                            .c_str()));
+  const MailServer server({"--certificate", pem, "--smtps"});
+  EXPECT_EQ(-1, send({}, server.url("smtps"))) << "its certificate is signed by itself";
+  EXPECT_EQ(0U, server.count());
+  EXPECT_NE(std::string::npos, syslog_text().find("certificate"));
+}
+
+TEST(SendReport, RefusesWhatItCannotUse) {
+  const MailServer server;
+  for (const char* url :
+       {"localhost:25", "http://localhost", "smtp://", "smtp://u:p@localhost", "smtp://h/path",
+        "smtp://h:0x1", "smtp://h:99999", "smtp://h?x", "smtp://a b", "smtp://h;AUTH=PLAIN"}) {
+    EXPECT_EQ(-1, send({}, url)) << url;
+    EXPECT_EQ(1U, syslog_lines().size()) << url;
+  }
+  EXPECT_EQ(-1, send({{"mail_from", "not an address"}}, server.url()));
+  EXPECT_EQ(1U, syslog_lines().size());
+  EXPECT_EQ(-1, send({}, server.url(), "x, <y@z>")) << "two bad addresses";
+  EXPECT_EQ(2U, syslog_lines().size());
+  EXPECT_EQ(0, send({}, server.url(), "x, a@example.com"));
+  EXPECT_EQ(1U, syslog_lines().size());
+  EXPECT_EQ(1U, server.count());
+
+  EXPECT_EQ(0, VornQazSendReport("weekly", "l", make_hash({{"mail_to", " , "}}).get()));
+  EXPECT_EQ(0, VornQazSendReport("weekly", "l", make_hash().get()));
+  EXPECT_EQ("", syslog_text());
+  EXPECT_EQ(-1, VornQazSendReport("../x", "l", make_hash().get()));
+}
+
+TEST(MailAddress, IsPlainEnoughForAHeader) {
+  for (const char* address : {"a@b", "first.last+tag@mail.example.com", "o/x=1@[host]"}) {
+    EXPECT_EQ(std::string_view(address).find('[') == std::string_view::npos,
+              host::valid_address(address))
+        << address;
+  }
+  for (const char* address : {"", "a", "@b", "a@", "a@b@c", "a b@c", "a@b\r\nBcc: x@y", "\"a\"@b",
+                              "<a@b>", "a,b@c", "a@b\x7f", "\xc3\xa4@b", "-oX@b", "a@.b", "a@b."}) {
+    EXPECT_FALSE(host::valid_address(address)) << address;
+  }
+  EXPECT_FALSE(host::valid_address(std::string(250, 'x') + "@b.cd"));
+}
+
+TEST(QuotedPrintable, KeepsLinesShortAndBytesWhole) {
+  const std::pair<std::string, std::string> cases[] = {
+      {"a=b\n", "a=3Db\r\n"},
+      {"x \ny ", "x=20\r\ny=20"},
+      {"\xc3\xa4\t", "=C3=A4=09"},
+      {std::string(76, 'x'), std::string(75, 'x') + "=\r\nx"},
+      {std::string(74, 'x') + "=", std::string(74, 'x') + "=\r\n=3D"},
+  };
+  for (const auto& [text, expected] : cases) {
+    EXPECT_EQ(expected, host::quoted_printable(text));
+  }
+}
+
+}  // namespace
