@@ -11,6 +11,7 @@ build=$root/build/quickstart
 stage=$root/build/quickstart-stage
 report_dir=$root/quickstart-report
 profile=quickstart
+log_dir=''
 
 fail() {
   echo "quickstart.sh: $*" >&2
@@ -82,6 +83,27 @@ give_back() {
   if [[ $EUID -eq 0 && -n ${SUDO_UID-} ]]; then
     chown -Rh "$SUDO_UID:${SUDO_GID:-$SUDO_UID}" "$root/build" "$report_dir" 2>/dev/null || true
   fi
+  if [[ -n $log_dir ]]; then
+    rm -rf "$log_dir"
+  fi
+}
+
+# A system log of its own for the run: whatever comes in at the socket goes to a file.
+start_log() {
+  log_dir=$(mktemp -d)
+  perl -MSocket -e 'socket(LOG, AF_UNIX, SOCK_DGRAM, 0) && bind(LOG, sockaddr_un($ARGV[0])) or die;
+    while (defined(recv(LOG, $_, 65536, 0)) && $_ ne "stop") { s/^<\d+>.{16}//; s/\s*$/\n/; print }' \
+    "$log_dir/socket" | tr -d '\000-\010\013-\037\177' >"$log_dir/lines" &
+  log_pid=$!
+  until [[ -S $log_dir/socket ]]; do
+    sleep 0.02
+  done
+}
+
+stop_log() {
+  perl -MSocket -e 'socket(LOG, AF_UNIX, SOCK_DGRAM, 0); send(LOG, "stop", 0, sockaddr_un($ARGV[0]))' \
+    "$log_dir/socket"
+  wait "$log_pid"
 }
 
 show_rows() { # CSV-FILE COLUMN-OF-NAME COUNT
@@ -107,25 +129,25 @@ cmake --build "$build" --parallel "$(nproc)"
 echo "== Report"
 rm -rf "$stage"
 mkdir -p "$stage" "$report_dir"
+if [[ $EUID -eq 0 ]]; then
+  # The product writes reports only where nobody else does; an earlier run has given them away.
+  chown -Rh 0:0 "$report_dir"
+fi
 DESTDIR=$stage cmake --install "$build" >/dev/null
 write_configuration
-log=()
-if [[ -S /dev/log ]]; then
-  log=(--log /dev/log)
-fi
+start_log
 # The machine's own /tmp, so that a folder in it can be reported on.
-"$root/tools/sandbox.sh" --stage "$stage" --tmp /tmp "${log[@]}" -- \
+"$root/tools/sandbox.sh" --stage "$stage" --tmp /tmp --log "$log_dir/socket" -- \
   /usr/vorn/bin/vornreport --report "$profile" >"$stage/output" || true
+stop_log
+cat "$log_dir/lines" >&2
 
 page=''
 if [[ $(head -n 1 "$stage/usr/vorn/var/status/$profile" 2>/dev/null) == success ]]; then
   page=$(find "$report_dir/$profile" -mindepth 2 -maxdepth 2 -name report.html \
     -newer "$stage/usr/vorn/etc/vornreport.conf" | sort | tail -n 1)
 fi
-if [[ -z $page ]]; then
-  tail -n 40 "$stage/output" >&2
-  fail "the report failed; its messages stand above and in the system log"
-fi
+[[ -n $page ]] || fail "the report failed; its log stands above, all its output in $stage/output"
 
 echo "Shares:"
 show_rows "${page%/*}/csv/share_list.csv" 1 20
