@@ -9,7 +9,6 @@
 #include <cctype>
 #include <cerrno>
 #include <cstdio>
-#include <cstring>
 #include <memory>
 #include <optional>
 
@@ -123,7 +122,7 @@ const char* password_problem(const std::string& path, std::string& password) {
   if ((status.st_mode & S_IRWXO) != 0) {
     return "is open to every user; run chmod 600 on it";
   }
-  constexpr std::size_t kLargestFile = 64 * 1024;
+  constexpr std::size_t kLargestFile = 65536;
   const std::optional<std::string> content = read_file(path, kLargestFile);
   password = content.value_or("");
   password.resize(std::min(password.find_first_of("\r\n"), password.size()));
@@ -263,7 +262,7 @@ class Delivery {
   static size_t on_read(char* buffer, size_t size, size_t count, void* self) {
     auto& delivery = *static_cast<Delivery*>(self);
     const std::size_t wanted = std::min(size * count, delivery.message_.size() - delivery.read_);
-    std::memcpy(buffer, delivery.message_.data() + delivery.read_, wanted);
+    delivery.message_.copy(buffer, wanted, delivery.read_);
     delivery.read_ += wanted;
     return wanted;
   }

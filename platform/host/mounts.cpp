@@ -4,7 +4,7 @@
 #include <libmount/libmount.h>
 #include <sys/stat.h>
 
-#include <climits>
+#include <algorithm>
 #include <cstdlib>
 #include <memory>
 #include <optional>
@@ -74,9 +74,8 @@ std::vector<Mount> read_mounts(const char* table) {
     }
   }
   std::unordered_set<std::string_view> later;
-  for (auto mount = mounts.rbegin(); mount != mounts.rend(); ++mount) {
-    mount->visible = later.insert(mount->target).second;
-  }
+  std::for_each(mounts.rbegin(), mounts.rend(),
+                [&](Mount& mount) { mount.visible = later.insert(mount.target).second; });
   return mounts;
 }
 

@@ -66,7 +66,7 @@ std::vector<Volume> choose_volumes(const std::vector<Mount>& mounts) {
   std::vector<Volume> volumes;
   for (const Mount* mount : best) {
     const bool holds_data =
-        mount->kind != VORN_FS_MEMORY || mount->target == "/" || shared.count(mount->device) > 0;
+        mount->kind != VORN_FS_MEMORY || mount->target == "/" || shared.contains(mount->device);
     volumes.push_back({mount->device, mount->target, mount->kind, holds_data});
   }
   return volumes;
@@ -160,7 +160,9 @@ int VornQazVolumeGetId(const char* mount_path, char* id, size_t size) try {
   const host::ErrnoKeeper keeper;
   std::string whole = mount_path;
   if (host::may_be_cut(whole)) {
-    whole = host::uncut_path(host::read_volumes().volumes, whole);
+    // Once for the run: a report asks for every row.
+    static const host::ServerVolumes server = host::read_volumes();
+    whole = host::uncut_path(server.volumes, whole);
   }
   const std::string text = host::volume_id(whole);
   std::memcpy(id, text.c_str(), text.size() + 1);

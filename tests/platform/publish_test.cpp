@@ -169,7 +169,7 @@ TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
     EXPECT_EQ(i == 0 ? "a" : "b", parts[1]);
     ports[i] = parts[2];
     const std::string body = std::regex_replace(parts[3].str(), std::regex("=\r\n"), "");
-    EXPECT_NE(std::string::npos, body.find(std::string(1000, 'x') + "?=3D.\r\n..\r\nend\r\n"))
+    EXPECT_NE(std::string::npos, body.find(std::string(1000, 'x') + "?=3D.\r\n.\r\nend\r\n"))
         << "lines of one dot must not end the message: " << body;
     EXPECT_NE(std::string::npos, body.find("\"weekly\""));
     EXPECT_NE(std::string::npos, body.find("share_list,large_file"));

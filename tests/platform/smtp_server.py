@@ -6,9 +6,11 @@ knowing about its session stand before it in "X-Test-" lines.
 """
 import argparse
 import asyncio
+import logging
 import pathlib
 import ssl
 import sys
+import warnings
 
 from aiosmtpd.smtp import SMTP, AuthResult
 
@@ -42,7 +44,7 @@ async def serve(options):
 
     def check(server, session, envelope, mechanism, data):
         login = f"{data.login.decode()}:{data.password.decode()}"
-        return AuthResult(success=login == options.login)
+        return AuthResult(success=login == options.login, handled=False)
 
     context = None
     if options.certificate:
@@ -67,6 +69,9 @@ async def serve(options):
 
 
 def main():
+    # A log-in without TLS is meant here.
+    warnings.simplefilter("ignore")
+    logging.disable()
     parser = argparse.ArgumentParser()
     parser.add_argument("folder", type=pathlib.Path)
     parser.add_argument("--refuse", action="append", default=[], help="a recipient, or * for all")
