@@ -13,7 +13,7 @@
 namespace vornreport {
 namespace {
 
-std::string format_text(const char* format, va_list args) {
+[[gnu::format(printf, 1, 0)]] std::string format_text(const char* format, va_list args) {
   char* text = nullptr;
   const int length = vasprintf(&text, format, args);
   if (length < 0) {

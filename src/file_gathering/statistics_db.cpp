@@ -31,13 +31,13 @@ const char* quote(const char* text, QuotedText& buffer) {
   if (text == nullptr) {
     return "";
   }
-  const size_t length = std::strlen(text);
-  if (std::memchr(text, '\'', length) == nullptr) {
-    return length < buffer.size() ? text : nullptr;  // nothing to double
-  }
-  const auto quotes = static_cast<size_t>(std::count(text, text + length, '\''));
-  if (length + quotes >= buffer.size()) {
+  const std::string_view whole(text);
+  const auto quotes = static_cast<size_t>(std::count(whole.begin(), whole.end(), '\''));
+  if (whole.size() + quotes >= buffer.size()) {
     return nullptr;
+  }
+  if (quotes == 0) {
+    return text;
   }
   return sqlite3_snprintf(static_cast<int>(buffer.size()), buffer.data(), "%q", text);
 }
