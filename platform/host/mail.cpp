@@ -315,7 +315,9 @@ int deliver_to_all(const char* profile, const MailText& text, const Server& serv
 
 std::string new_message_id(std::time_t now, const std::string& host) {
   unsigned long long random = 0;
-  static_cast<void>(getrandom(&random, sizeof random, 0));
+  if (getrandom(&random, sizeof random, 0) != sizeof random) {
+    random = static_cast<unsigned long long>(Clock::now().time_since_epoch().count());
+  }
   char id[64];
   std::snprintf(id, sizeof id, "%lld.%d.%016llx", static_cast<long long>(now),
                 static_cast<int>(getpid()), random);
