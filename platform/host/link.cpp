@@ -90,7 +90,7 @@ int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size
   const std::optional<std::string> rest = below(report_dir, target_file);
   errno = EINVAL;
   if (!rest) {
-    host::log_line("no link to \"%s\": it isn't below report_dir \"%s\"", target_file,
+    host::log_line(R"(no link to "%s": it isn't below report_dir "%s")", target_file,
                    report_dir.c_str());
     return -1;
   }

@@ -64,7 +64,7 @@ std::vector<std::string> addresses(const char* profile, std::string_view list) {
     if (valid_address(address)) {
       found.push_back(address);
     } else {
-      log_line("profile \"%s\": \"%s\" is no mail address; write name@domain in %s", profile,
+      log_line(R"(profile "%s": "%s" is no mail address; write name@domain in %s)", profile,
                address.c_str(), VORN_PATH_CONFIG);
     }
   }
@@ -136,7 +136,7 @@ bool read_credentials(const char* profile, const VLIBCSzHash& hash, Server& serv
   }
   const std::string path = value_of(hash, "smtp_password_file");
   if (const char* problem = password_problem(path, server.password); problem != nullptr) {
-    log_line("profile \"%s\": smtp_password_file \"%s\" %s", profile, path.c_str(), problem);
+    log_line(R"(profile "%s": smtp_password_file "%s" %s)", profile, path.c_str(), problem);
     return false;
   }
   return true;

@@ -218,7 +218,7 @@ int VORNShareFileIndexDBPathGet(const char* share, char* path, size_t size) try 
     return -1;
   }
   if (found->file_index.front() != '/') {
-    host::log_line("share \"%s\": file_index \"%s\" is not absolute; write file_index = /... in %s",
+    host::log_line(R"(share "%s": file_index "%s" is not absolute; write file_index = /... in %s)",
                    share, found->file_index.c_str(), VORN_PATH_SHARES);
     errno = EINVAL;
     return -1;

@@ -123,8 +123,9 @@ TEST(SqliteMemory, UsesFreedBlocksAgain) {
   const pid_t child = support::fork_child([] {
     const sqlite3_mem_methods& memory = host::sqlite_memory;
     rusage first{};
+    std::vector<void*> blocks;
     for (int round = 0; round < 200; ++round) {
-      std::vector<void*> blocks;
+      blocks.clear();
       for (int size = 1; size <= 16000; size += 16) {
         blocks.push_back(memory.xRealloc(memory.xMalloc(size), size + round));
         std::memset(blocks.back(), 1, static_cast<std::size_t>(size));

@@ -116,10 +116,9 @@ class MailServer {
     support::wait_child(pid_);
   }
 
-  std::string url(const char* scheme = "smtp") const {
-    return std::string(scheme) + "://127.0.0.1:" + std::to_string(port_);
-  }
-  // Message `n`, from 1, without what differs from run to run.
+  std::string port() const { return std::to_string(port_); }
+  std::string url() const { return "smtp://127.0.0.1:" + port(); }
+  // Message `n`, from 1.
   std::string mail(int n) const {
     return support::read_file(mails_.path(std::to_string(n) + ".eml"));
   }
@@ -246,19 +245,51 @@ TEST(SendReport, LogsInWithThePasswordOfASafeFile) {
   EXPECT_EQ(1U, server.count());
 }
 
-TEST(SendReport, VerifiesTheServerOfAnEncryptedConnection) {
+std::string self_signed_certificate(const support::TempFolder& folder) {
+  std::string pem = folder.path("server.pem");
+  const std::string command =
+      "/usr/bin/openssl req -x509 -newkey ec -pkeyopt ec_paramgen_curve:prime256v1 -nodes -days 2 "
+      "-subj /CN=test -keyout " +
+      pem + " -out " + pem + ".crt 2>/dev/null && cat " + pem + ".crt >> " + pem;
+  EXPECT_EQ(0, std::system(command.c_str()));
+  return pem;
+}
+
+TEST(SendReport, EncryptsAsMuchAsThePasswordNeeds) {
   const support::TempFolder folder;
-  const std::string pem = folder.path("server.pem");
-  ASSERT_EQ(0,
-            std::system(("/usr/bin/openssl req -x509 -newkey ec -pkeyopt "
-                         "ec_paramgen_curve:prime256v1 -nodes -days 2 -subj /CN=127.0.0.1 "
-                         "-addext subjectAltName=IP:127.0.0.1 -keyout " +
-                         pem + " -out " + pem + ".crt 2>/dev/null && cat " + pem + ".crt >> " + pem)
-                            .c_str()));
-  const MailServer server({"--certificate", pem, "--smtps"});
-  EXPECT_EQ(-1, send({}, server.url("smtps"))) << "its certificate is signed by itself";
-  EXPECT_EQ(0U, server.count());
-  EXPECT_NE(std::string::npos, syslog_text().find("certificate"));
+  const std::string pem = self_signed_certificate(folder);
+  support::write_file(folder.path("password"), "x");
+  ASSERT_EQ(0, chmod(folder.path("password").c_str(), 0600));
+  const Entries nobody;
+  const Entries user = {{"smtp_user", "joe"}, {"smtp_password_file", folder.path("password")}};
+  const MailServer plain;
+  const MailServer starttls({"--certificate", pem});
+  const MailServer smtps({"--certificate", pem, "--smtps"});
+  struct Case {
+    const MailServer& server;
+    const char* url;  // 0.0.0.0 leads here too, but isn't a name of this machine
+    const Entries& profile;
+    const char* secure;  // null: refused
+  };
+  const Case cases[] = {
+      {plain, "smtp://0.0.0.0:", nobody, "no"},      {starttls, "smtp://0.0.0.0:", nobody, "yes"},
+      {starttls, "smtp://127.0.0.1:", nobody, "no"}, {plain, "smtp://0.0.0.0:", user, nullptr},
+      {starttls, "smtp://0.0.0.0:", user, nullptr},  {smtps, "smtps://127.0.0.1:", nobody, nullptr},
+      {smtps, "smtps://0.0.0.0:", nobody, nullptr}};
+  for (const auto& [server, url, profile, secure] : cases) {
+    syslog_lines();
+    const std::size_t before = server.count();
+    EXPECT_EQ(secure == nullptr ? -1 : 0, send(profile, url + server.port())) << url;
+    EXPECT_EQ(before + (secure == nullptr ? 0 : 1), server.count()) << url;
+    const std::string log = syslog_text();
+    if (secure == nullptr) {
+      EXPECT_TRUE(std::regex_search(log, std::regex("certificate|STARTTLS|SSL"))) << log;
+    } else {
+      EXPECT_NE(std::string::npos,
+                server.mail(static_cast<int>(before) + 1).find(std::string("Secure: ") + secure))
+          << url;
+    }
+  }
 }
 
 TEST(SendReport, RefusesWhatItCannotUse) {

@@ -21,7 +21,8 @@ enum { VORN_SHARE_ENUM_ALL = 0x207 };
 // syslog line. The number of shares, or -1 when share.conf can't be read.
 int VORNShareEnum(VLIBCSzList** list, int flags);
 
-// Writes the folder of `share` into `path` (`size` bytes): absolute, without a slash at the end.
+// Writes the folder of `share` into `path` (`size` bytes): absolute, without a slash at the end
+// ("/" stays as it is), at most 2048 bytes so that half of a path buffer is left for what is in it.
 // 0; -1 when the share is unknown, has no path, or has one that the product can't work with (not
 // absolute, a single quote or control character in it, too long), with one syslog line.
 int VORNSharePathGet(const char* share, char* path, size_t size);
