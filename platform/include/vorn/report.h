@@ -96,6 +96,15 @@ int VornQazFormatCsvString(const char* text, char* out, size_t size);
 // Decimal seconds since the epoch as local time, YYYY-MM-DD HH:MM:SS. Fails for anything else.
 int VornQazTimeConvert(const char* seconds, char* out, size_t size);
 
+// The current time as decimal seconds since the epoch.
+int VornQazGetTimeSecond(char* out, size_t size);
+
+// Writes the MD5 digest of the first `size` bytes of the file `path` into `digest`, as 32
+// hexadecimal digits without terminator (`digest_size` must be 32). Follows no link in the last
+// component. 0; 2 when the file vanished, is no regular file any more or has another size, an
+// expected outcome on a server in use; -1 for any other failure.
+int VornQazGetFileMd5(const char* path, unsigned long long size, char* digest, size_t digest_size);
+
 // Finishes a CSV file: puts a UTF-8 byte order mark before it unless it has one. Atomic; harmless
 // when repeated. 0 or -1.
 int VornQazCsvFile(const char* path);

@@ -42,6 +42,11 @@ int VLIBCSzListCount(const VLIBCSzList* list);
 // Entry `index`, counted from 0; null when there is none.
 const char* VLIBCSzListGet(const VLIBCSzList* list, int index);
 
+// Appends the pieces of `text` between any of the bytes in `separators` to `*list`, blanks around
+// them dropped; empty pieces are kept as empty entries, but a text without any piece adds nothing.
+// The number of pieces, or -1 for a null argument.
+int VLIBCStrTok(const char* text, const char* separators, VLIBCSzList** list);
+
 // Writes `text` quoted as one word of a POSIX shell command into `out` (`size` bytes, terminator
 // included): in single quotes, a single quote inside as '\''. Returns the length written, or -1
 // for a null argument or when it doesn't fit (`out` is then the empty text).

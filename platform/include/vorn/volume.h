@@ -10,6 +10,24 @@
 extern "C" {
 #endif
 
+// One volume of an enumeration, in the order of the mount table.
+typedef struct VORNMountVolInfo {
+  char* path;                     // mount path; never empty
+  unsigned long long free_size;   // bytes free for users
+  unsigned long long total_size;  // bytes
+  struct VORNMountVolInfo* next;
+} VORNMountVolInfo;
+
+// Which volumes: all that hold users' data, or those of them that can have quotas as well. This
+// platform gives the same for both; the quota tool itself knows.
+enum { VORN_VOLUMES_OF_USAGE = 11, VORN_VOLUMES_OF_QUOTA = 15 };
+
+// The mounted volumes, freed by the caller; null when there are none. `filter` must be null. A
+// volume that can't be measured is left out, with one syslog line.
+VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int selector);
+// Frees the whole list; accepts null.
+void VORNMountVolInfoFree(VORNMountVolInfo* volumes);
+
 // Makes `*hash` (freed by the caller): share name to the mount path of the volume that holds the
 // share's folder. A share whose folder doesn't exist is left out. 0, or -1 with `*hash` null.
 int VornQazGetVolumePathHash(VLIBCSzHash** hash);
