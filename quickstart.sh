@@ -90,19 +90,22 @@ give_back() {
 
 # A system log of its own for the run: whatever comes in at the socket goes to a file.
 start_log() {
-  log_dir=$(mktemp -d)
-  perl -MSocket -e 'socket(LOG, AF_UNIX, SOCK_DGRAM, 0) && bind(LOG, sockaddr_un($ARGV[0])) or die;
-    while (defined(recv(LOG, $_, 65536, 0)) && $_ ne "stop") { s/^<\d+>.{16}//; s/\s*$/\n/; print }' \
-    "$log_dir/socket" | tr -d '\000-\010\013-\037\177' >"$log_dir/lines" &
+  log_dir=$(mktemp -d /tmp/vornreport-log.XXXXXX)
+  perl -MSocket -e '
+    socket(LOG, AF_UNIX, SOCK_DGRAM, 0) && bind(LOG, sockaddr_un($ARGV[0])) or die "no log: $!\n";
+    while (defined(recv(LOG, $_, 65536, 0)) && $_ ne "stop") {
+      s/^<\d+>.{16}//; s/\s*$/\n/; print;
+    }' "$log_dir/socket" | tr -d '\000-\010\013-\037\177' >"$log_dir/lines" &
   log_pid=$!
-  until [[ -S $log_dir/socket ]]; do
+  while [[ ! -S $log_dir/socket ]] && kill -0 "$log_pid" 2>/dev/null; do
     sleep 0.02
   done
 }
 
 stop_log() {
-  perl -MSocket -e 'socket(LOG, AF_UNIX, SOCK_DGRAM, 0); send(LOG, "stop", 0, sockaddr_un($ARGV[0]))' \
-    "$log_dir/socket"
+  perl -MSocket -e '
+    socket(LOG, AF_UNIX, SOCK_DGRAM, 0);
+    send(LOG, "stop", 0, sockaddr_un($ARGV[0]));' "$log_dir/socket"
   wait "$log_pid"
 }
 

@@ -152,7 +152,7 @@ class Machine:
 
     def report_folders(self, profile):
         folder = self.reports / profile
-        return sorted(p for p in folder.iterdir() if p.name != 'template') if folder.exists() else []
+        return sorted(path for path in folder.glob('*') if path.name != 'template')
 
     def leftovers(self):
         """What a run that has ended must not leave: temporary files, databases, partial reports."""

@@ -19,7 +19,7 @@ class Refused(ProductTest):
         self.assertEqual(self.m.leftovers(), [])
 
     def test_settings(self):
-        config, shares = 'etc/vornreport.conf', 'etc/share.conf'
+        config = 'etc/vornreport.conf'
         for name, keys, damage, lines in (
                 ('quote', {'report_dir': "/var/tmp/it's"}, None,
                  ['report_dir "/var/tmp/it\'s" holds a single quote', 'src/vornreport:313 ']),
@@ -81,7 +81,7 @@ class FullDisks(ProductTest):
         # What is found after the run stands behind a mark in the output.
         run = self.m.shell(f'{PROGRAM} --report weekly; echo "== $?"; '
                            'head -n 1 /usr/vorn/var/status/weekly; '
-                           f'cd {self.m.reports}/weekly && find . -name report.html -exec cat {{}} +')
+                           f'find {self.m.reports}/weekly -name report.html -exec cat {{}} +')
         result = run.out.split('\n== 0\n')[1].split('\n', 1)
         word, page = result[0], result[1] if len(result) > 1 else ''
         if page:

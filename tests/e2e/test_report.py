@@ -76,8 +76,8 @@ class Report(ProductTest):
         text = page.read_text()
         self.assertTrue(text.startswith('<!DOCTYPE html>\n') and text.endswith('\n</html>\n'))
         marks = [text.index(mark) for mark in (
-            "\nvar vornLang = 'en';\n", '\nvar vornShareListData = [\n', '\nvar vornSharePath = {\n',
-            '\nvar vornLargeFileData = [\n', '</head>', '<section data-report="share_list">',
+            "\nvar vornLang = 'en';\n", '\nvar vornShareListData = [\n',
+            '\nvar vornSharePath = {\n', '\nvar vornLargeFileData = [\n', '</head>', '<section data-report="share_list">',
             '<section data-report="large_file">')]
         self.assertEqual(marks, sorted(marks))
 

@@ -53,7 +53,8 @@ class Sandbox(unittest.TestCase):
                               capture_output=True)
 
     def test_leaves_the_machine_alone(self):
-        there_before = [os.path.exists(path) for path in ('/usr/vorn', '/etc/cron.d', '/dev/log')]
+        watched = ('/usr/vorn', '/etc/cron.d', '/dev/log')
+        there_before = [os.path.exists(path) for path in watched]
         with tempfile.TemporaryDirectory() as stage:
             done = self.run_in(stage, '--', 'sh', '-c', 'touch /tmp/mine /etc/cron.d/mine && '
                                'echo 1 >/usr/vorn/mine && test ! -e /dev/log && exit 7')
@@ -63,8 +64,7 @@ class Sandbox(unittest.TestCase):
             self.assertEqual((done.returncode, os.path.exists('/not-there')), (1, False))
             self.assertEqual(self.run_in(stage, '--unheard').returncode, 2)
         self.assertFalse(os.path.exists('/tmp/mine') or os.path.exists('/etc/cron.d/mine'))
-        self.assertEqual([os.path.exists(path) for path in ('/usr/vorn', '/etc/cron.d', '/dev/log')],
-                         there_before)
+        self.assertEqual([os.path.exists(path) for path in watched], there_before)
 
 
 class Template(unittest.TestCase):
