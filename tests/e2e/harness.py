@@ -19,7 +19,7 @@ ROOT = Path(__file__).resolve().parents[2]
 BUILD = Path(os.environ.get('VORN_BUILD', ROOT / 'build'))
 PROGRAM = '/usr/vorn/bin/vornreport'
 SCRIPTS = 'usr/vorn/vornreport/reportUI'
-LIMIT = 60  # seconds that no run of these tests comes near
+LIMIT = 30  # seconds that no run of these tests comes near
 
 
 class Log:
@@ -60,17 +60,19 @@ class Run:
         self.process = subprocess.Popen(machine.sandbox(log) + ['--', *command],
                                         stdin=subprocess.DEVNULL, **streams)
 
-    @property
     def pid(self):
-        """The program's process: the sandbox's only child. 0 when it is gone."""
+        """Waits for the program: the sandbox's only child. Its process id."""
         path = f'/proc/{self.process.pid}/task/{self.process.pid}/children'
-        for pid in Path(path).read_text().split():
-            if os.readlink(f'/proc/{pid}/exe').endswith('/vornreport'):
-                return int(pid)
-        return 0
+
+        def find():
+            for pid in Path(path).read_text().split():
+                if os.readlink(f'/proc/{pid}/exe').endswith('/vornreport'):
+                    return int(pid)
+            return None
+        return wait_for(find, 'the program')
 
     def signal(self, signo):
-        os.kill(wait_for(lambda: self.pid, 'the program'), signo)
+        os.kill(self.pid(), signo)
 
     def read_until(self, text):
         """Reads standard output up to a line that holds `text`."""
@@ -171,12 +173,17 @@ case "$1 $#" in
   "$(cat /tmp/stop 2>/dev/null || echo nowhere)"*)
     echo $$ >/tmp/stopped.new
     mv /tmp/stopped.new /tmp/stopped
-    while [ -e /tmp/stop ]; do sleep 0.05; done
+    rounds=0
+    while [ -e /tmp/stop ] && [ $rounds -lt 600 ]; do
+      rounds=$((rounds + 1))
+      sleep 0.05
+    done
     ;;
 esac
 exec /{SCRIPTS}/original.sh "$@"
 ''')
             script.chmod(0o755)
+        (self.tmp / 'stopped').unlink(missing_ok=True)
         (self.tmp / 'stop').write_text(call)
 
     def stopped_pid(self):

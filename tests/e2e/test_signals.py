@@ -20,7 +20,7 @@ class Sigterm(ProductTest):
         self.m.stop_at(stop)
         run = self.m.start('--report', 'weekly', **options)
         child = self.m.stopped_pid()
-        program = run.pid
+        program = run.pid()
         os.kill(program, signal.SIGTERM)
         run.finish()
         self.assertEqual(run.status, 1)
