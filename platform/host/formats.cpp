@@ -195,6 +195,16 @@ int VornQazTimeConvert(const char* seconds, char* out, size_t size) {
   return host::copy_out({text, static_cast<std::size_t>(length)}, out, size);
 }
 
+int VornQazGetTimeSecond(char* out, size_t size) {
+  if (out == nullptr || size == 0) {
+    return host::bad_argument(out, size);
+  }
+  char text[24];
+  const int length =
+      std::snprintf(text, sizeof text, "%lld", static_cast<long long>(time(nullptr)));
+  return host::copy_out({text, static_cast<std::size_t>(length)}, out, size);
+}
+
 int VornQazCsvFile(const char* path) try {
   constexpr std::string_view kMark = "\xEF\xBB\xBF";
   if (path == nullptr) {

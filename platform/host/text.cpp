@@ -11,6 +11,7 @@
 
 #include "file_io.hpp"
 #include "text_containers.hpp"
+#include "words.hpp"
 
 namespace {
 
@@ -173,6 +174,27 @@ const char* VLIBCSzListGet(const VLIBCSzList* list, int index) {
     return nullptr;
   }
   return list->texts[static_cast<std::size_t>(index)].c_str();
+}
+
+int VLIBCStrTok(const char* text, const char* separators, VLIBCSzList** list) {
+  if (text == nullptr || separators == nullptr || list == nullptr || *list == nullptr) {
+    errno = EINVAL;
+    return -1;
+  }
+  return guarded(-1, [=] {
+    std::string_view rest = text;
+    if (host::trimmed(rest).empty()) {
+      return 0;
+    }
+    for (int pieces = 1;; ++pieces) {
+      const std::size_t end = rest.find_first_of(separators);
+      (*list)->texts.emplace_back(host::trimmed(rest.substr(0, end)));
+      if (end == std::string_view::npos) {
+        return pieces;
+      }
+      rest.remove_prefix(end + 1);
+    }
+  });
 }
 
 int VLIBCEncShParam(const char* text, char* out, size_t size) {

@@ -1,71 +1,242 @@
-// User accounts. Only look-ups by name: domains of any size can be asked, not all enumerated.
+// User accounts. Looked up one by one, never enumerated: domains of any size can be asked that way.
+#include "users.hpp"
+
 #include <pwd.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <cstring>
 #include <memory>
 #include <optional>
-#include <string>
-#include <string_view>
 #include <unordered_map>
+#include <unordered_set>
+#include <utility>
 #include <vector>
 
 #include "file_io.hpp"
+#include "formats.hpp"
+#include "host_log.hpp"
 #include "text_containers.hpp"
 #include "vorn/report.h"
 #include "vorn/user.h"
 
+namespace host {
+
+const char* account_name_error(std::string_view name) {
+  constexpr std::size_t kLongest = 255;
+  if (name.empty() || name.size() > kLongest) {
+    return "is not 1 to 255 bytes long";
+  }
+  if (std::string_view("=+-@").find(name.front()) != std::string_view::npos) {
+    return "begins with one of = + - @";
+  }
+  if (name.find('\\') != std::string_view::npos) {
+    return "holds a backslash";
+  }
+  if (name.find_first_of("[]:;|=*?`") != std::string_view::npos) {
+    return "holds one of [ ] : ; | = * ? or a back quote";
+  }
+  // Reports write names as they are, so a name is harmless when escaping would change nothing.
+  if (escape_js(name, '\'') != name || csv_field(name) != name) {
+    return "holds a quote, '<', a control character or something else that needs escaping";
+  }
+  return nullptr;
+}
+
+std::string shown_account_name(std::string name) {
+  std::replace(name.begin(), name.end(), '\\', '/');
+  return name;
+}
+
 namespace {
 
-struct Ids {
-  uid_t user;
-  gid_t group;
+struct Account {
+  std::string name;  // the name service's
+  uid_t uid;
+  gid_t gid;
 };
 
-std::optional<Ids> ask_name_service(const std::string& name) {
+// Nothing: the name service knows no such account.
+using Found = std::optional<Account>;
+
+// getpwnam(3) lists these for an unknown account; all others are failures of the name service.
+constexpr bool means_unknown(int error) {
+  return error == 0 || error == ENOENT || error == ESRCH || error == EBADF || error == EPERM;
+}
+
+void log_failing_service(int error) {
+  static bool logged = false;
+  if (!std::exchange(logged, true)) {
+    log_line(
+        "the name service fails (%s), so accounts are missing from the reports; see to what "
+        "the passwd line of /etc/nsswitch.conf names",
+        std::strerror(error));
+  }
+}
+
+// `ask` is getpwnam_r or getpwuid_r without its first argument.
+template <typename Ask>
+Found ask_name_service(Ask ask) {
   constexpr std::size_t kLargestBuffer = std::size_t{1} << 20;
+  const ErrnoKeeper keeper;  // a name service probes sockets that needn't exist
   const long hint = sysconf(_SC_GETPW_R_SIZE_MAX);
   std::vector<char> buffer(hint > 0 ? static_cast<std::size_t>(hint) : 1024);
   for (;;) {
-    passwd account{};
+    passwd entry{};
     passwd* found = nullptr;
-    const int error = getpwnam_r(name.c_str(), &account, buffer.data(), buffer.size(), &found);
+    const int error = ask(&entry, buffer.data(), buffer.size(), &found);
+    if (found != nullptr) {
+      return Account{found->pw_name, found->pw_uid, found->pw_gid};
+    }
     if (error == ERANGE && buffer.size() < kLargestBuffer) {
       buffer.resize(buffer.size() * 2);
     } else if (error != EINTR) {
-      return found == nullptr ? std::nullopt : std::optional(Ids{found->pw_uid, found->pw_gid});
+      if (!means_unknown(error)) {
+        log_failing_service(error);
+      }
+      return std::nullopt;
     }
   }
 }
 
-// An index import asks for every file's owner, and one LDAP round trip takes a millisecond.
-std::optional<Ids> ids_of(std::string_view name) {
-  static std::unordered_map<std::string, std::optional<Ids>, host::KeyHash, host::KeyEqual> known;
+Found ask_for_name(const std::string& name) {
+  return ask_name_service([&](passwd* entry, char* buffer, std::size_t size, passwd** found) {
+    return getpwnam_r(name.c_str(), entry, buffer, size, found);
+  });
+}
+
+// A report asks for every row, an index import for every file, and one round trip to a domain takes
+// a millisecond. The unknown is kept as well.
+using ByName = std::unordered_map<std::string, Found, KeyHash, KeyEqual>;
+
+ByName& known_names() {
+  static ByName known;
+  return known;
+}
+
+const Found& account_named(std::string_view name) {
+  ByName& known = known_names();
   auto entry = known.find(name);
   if (entry == known.end()) {
-    const host::ErrnoKeeper keeper;  // a name service probes sockets that needn't exist
     std::string key(name);
-    const std::optional<Ids> ids = ask_name_service(key);
-    entry = known.emplace(std::move(key), ids).first;
+    Found account = ask_for_name(key);
+    if (!account && key.find('/') != std::string::npos) {
+      std::string native = key;
+      std::replace(native.begin(), native.end(), '/', '\\');
+      account = ask_for_name(native);
+    }
+    entry = known.emplace(std::move(key), std::move(account)).first;
   }
   return entry->second;
 }
 
+const Found& account_of(uid_t uid) {
+  static std::unordered_map<uid_t, Found> known;
+  auto entry = known.find(uid);
+  if (entry == known.end()) {
+    Found account =
+        ask_name_service([&](passwd* found, char* buffer, std::size_t size, passwd** result) {
+          return getpwuid_r(uid, found, buffer, size, result);
+        });
+    if (account) {
+      // Who sees this name looks it up next; a service may know the one and not the other.
+      known_names().try_emplace(shown_account_name(account->name), account);
+    }
+    entry = known.emplace(uid, std::move(account)).first;
+  }
+  return entry->second;
+}
+
+// Whether the name of an account that exists can be written to reports; logs once when it can't.
+bool can_be_shown(std::string_view name) {
+  const char* error = account_name_error(name);
+  if (error == nullptr) {
+    return true;
+  }
+  static std::unordered_set<std::string> logged;
+  if (!logged.emplace(name).second) {
+    return false;
+  }
+  const int length = static_cast<int>(std::min<std::size_t>(name.size(), 300));
+  if (name.find('\\') != std::string_view::npos) {
+    log_line(
+        "account \"%.*s\" is left out: write it with '/' in vornreport.conf; the quota report "
+        "shows it when smb.conf has another \"winbind separator\" than the backslash",
+        length, name.data());
+  } else {
+    log_line("account \"%.*s\" is left out of the reports: its name %s; rename the account", length,
+             name.data(), error);
+  }
+  return false;
+}
+
+// The record and the name in it are one allocation's worth of owner.
+struct Record : VORNUser {
+  Record(std::string shown, const Account& account) : text(std::move(shown)) {
+    name = text.data();
+    uid = account.uid;
+    gid = account.gid;
+  }
+  std::string text;
+};
+
+int hand_out(const Found& account, const std::string& shown, VORNUser** user) {
+  if (!account || !can_be_shown(shown)) {
+    errno = ENOENT;
+    return -1;
+  }
+  *user = std::make_unique<Record>(shown, *account).release();
+  return 0;
+}
+
 }  // namespace
+}  // namespace host
+
+int VORNUserGet(const char* name, VORNUser** user) try {
+  if (user != nullptr) {
+    *user = nullptr;
+  }
+  if (name == nullptr || *name == '\0' || user == nullptr) {
+    errno = EINVAL;
+    return -1;
+  }
+  return host::hand_out(host::account_named(name), name, user);
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
+
+int VORNUserGetByUID(uid_t uid, VORNUser** user) try {
+  if (user == nullptr) {
+    errno = EINVAL;
+    return -1;
+  }
+  *user = nullptr;
+  const host::Found& account = host::account_of(uid);
+  return host::hand_out(account, account ? host::shown_account_name(account->name) : "", user);
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
+
+void VORNUserFree(VORNUser* user) {
+  delete static_cast<host::Record*>(user);
+}
 
 int VORNUserGetUGID(const char* name, uid_t* uid, gid_t* gid) try {
   if (name == nullptr || *name == '\0' || uid == nullptr) {
     errno = EINVAL;
     return -1;
   }
-  const std::optional<Ids> ids = ids_of(name);
-  if (!ids) {
+  const host::Found& account = host::account_named(name);
+  if (!account) {
     errno = ENOENT;
     return -1;
   }
-  *uid = ids->user;
+  *uid = account->uid;
   if (gid != nullptr) {
-    *gid = ids->group;
+    *gid = account->gid;
   }
   return 0;
 } catch (...) {
@@ -81,7 +252,9 @@ int VornQazInitFilterUser(VLIBCSzHash** hash) try {
   *hash = nullptr;
   auto filter = std::make_unique<VLIBCSzHash>(0);
   filter->resolve_with([](std::string_view name) -> std::optional<std::string> {
-    return ids_of(name) ? std::optional<std::string>(name) : std::nullopt;
+    return !name.empty() && host::account_named(name) && host::can_be_shown(name)
+               ? std::optional<std::string>(name)
+               : std::nullopt;
   });
   *hash = filter.release();
   return 0;

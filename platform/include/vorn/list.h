@@ -9,8 +9,8 @@ extern "C" {
 typedef struct QAZLLNode {
   void* data;
   struct QAZLLNode* next;
-  struct QAZLLNode*
-      last;  // the list's own, in its first node: makes an append cost the same always
+  // The last node, kept in the first one for the list itself: an append costs the same always.
+  struct QAZLLNode* last;
 } QAZLLNode;
 
 // Decides where data goes in a platform that sorts; this one appends always and doesn't call it.
@@ -19,7 +19,8 @@ typedef int (*QAZLLCompare)(const void* listed, const void* added);
 // Appends `data` to the list at `*head` (null: empty). 0, or -1 for a null argument or without
 // memory; `data` is then still the caller's.
 int QAZLLadd(QAZLLNode** head, void* data, QAZLLCompare compare);
-// Calls `release` on the data of every node, in order, frees the nodes and empties the head.
+// Empties the head, calls `release` (may be null) on the data of every node, in order, and frees
+// the nodes.
 void QAZLLfree(QAZLLNode** head, void (*release)(void* data));
 
 #ifdef __cplusplus

@@ -1,0 +1,19 @@
+// Names of accounts, as the reports can show them.
+#ifndef VORN_HOST_USERS_HPP
+#define VORN_HOST_USERS_HPP
+
+#include <string>
+#include <string_view>
+
+namespace host {
+
+// What keeps `name` from being handed out (see vorn/user.h), as the end of a sentence that begins
+// with "its name"; null when nothing does.
+const char* account_name_error(std::string_view name);
+
+// The name to hand out for the name service's `name`: a domain is set off by '/'.
+std::string shown_account_name(std::string name);
+
+}  // namespace host
+
+#endif
