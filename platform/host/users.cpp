@@ -69,8 +69,8 @@ void log_failing_service(int error) {
   static bool logged = false;
   if (!std::exchange(logged, true)) {
     log_line(
-        "the name service fails (%s), so accounts are missing from the reports; see to what "
-        "the passwd line of /etc/nsswitch.conf names",
+        "the name service fails (%s), so accounts are missing from the reports; see to the "
+        "services that the passwd line of /etc/nsswitch.conf names",
         std::strerror(error));
   }
 }
@@ -171,7 +171,7 @@ bool can_be_shown(std::string_view name) {
   return false;
 }
 
-// The record and the name in it are one allocation's worth of owner.
+// What a caller holds as a VORNUser, with the text of its name.
 struct Record : VORNUser {
   Record(std::string shown, const Account& account) : text(std::move(shown)) {
     name = text.data();

@@ -6,12 +6,16 @@
 #include <cstdio>
 #include <cstring>
 #include <limits>
+#include <map>
 #include <memory>
+#include <optional>
 #include <set>
 #include <tuple>
+#include <utility>
 
 #include "file_io.hpp"
 #include "file_system.hpp"
+#include "host_log.hpp"
 #include "shares.hpp"
 #include "text_containers.hpp"
 #include "vorn/volume.h"
@@ -98,19 +102,6 @@ ServerVolumes read_volumes() {
   return server;
 }
 
-std::string uncut_path(const std::vector<Volume>& volumes, std::string_view path) {
-  const Volume* first = nullptr;
-  for (const Volume& volume : volumes) {
-    if (volume.path == path) {
-      return volume.path;
-    }
-    if (first == nullptr && volume.path.starts_with(path)) {
-      first = &volume;
-    }
-  }
-  return first == nullptr ? std::string(path) : first->path;
-}
-
 std::string volume_id(std::string_view path) {
   if (path.size() <= kIdLimit && std::all_of(path.begin(), path.end(), is_safe)) {
     return std::string(path);
@@ -123,7 +114,119 @@ std::string volume_id(std::string_view path) {
   return id + hash;
 }
 
+std::string cut_volume_id(const std::vector<Volume>& volumes, std::string_view cut) {
+  std::vector<const Volume*> meant;
+  for (const Volume& volume : volumes) {
+    if (volume.path.starts_with(cut) && (volume.holds_data || volume.path == cut)) {
+      meant.push_back(&volume);
+    }
+  }
+  if (meant.size() < 2) {
+    return volume_id(meant.empty() ? cut : meant.front()->path);
+  }
+  std::string id = volume_id(cut) + "...";
+  log_line(
+      "volumes \"%s\" and \"%s\" have the first %zu bytes in common, so that reports can't "
+      "tell them apart and call both %s; mount one of them at another path",
+      meant[0]->path.c_str(), meant[1]->path.c_str(), cut.size(), id.c_str());
+  return id;
+}
+
+Space space_of(const struct statvfs& measured) {
+  const std::uint64_t block = measured.f_frsize != 0 ? measured.f_frsize : measured.f_bsize;
+  const std::uint64_t used = measured.f_blocks - std::min(measured.f_bfree, measured.f_blocks);
+  // Some file systems count below zero when users have taken what is reserved for root.
+  const bool negative = (measured.f_bavail >> 63U) != 0;
+  const std::uint64_t available = negative ? 0 : measured.f_bavail;
+  return {(used + available) * block, available * block};
+}
+
+namespace {
+
+// What a caller holds as a VORNMountVolInfo, with the text of its path.
+struct Record : VORNMountVolInfo {
+  Record(std::string mount_path, Space space) : text(std::move(mount_path)) {
+    path = text.data();
+    free_size = space.free;
+    total_size = space.total;
+    next = nullptr;
+  }
+  std::string text;
+};
+
+struct FreeRecords {
+  void operator()(VORNMountVolInfo* volumes) const { VORNMountVolInfoFree(volumes); }
+};
+using Records = std::unique_ptr<VORNMountVolInfo, FreeRecords>;
+
+// Once for the run: a report asks for every row.
+const std::string& known_cut_volume_id(const std::string& cut) {
+  static const ServerVolumes server = read_volumes();
+  static std::map<std::string, std::string> known;
+  auto entry = known.find(cut);
+  if (entry == known.end()) {
+    entry = known.emplace(cut, cut_volume_id(server.volumes, cut)).first;
+  }
+  return entry->second;
+}
+
+std::optional<Space> measure(const std::string& path) {
+  const ErrnoKeeper keeper;
+  struct statvfs measured {};
+  int result = -1;
+  do {
+    result = statvfs(path.c_str(), &measured);
+  } while (result != 0 && errno == EINTR);
+  if (result != 0) {
+    log_line("volume \"%s\" is left out, since it can't be measured (%s); see to its mount",
+             path.c_str(), std::strerror(errno));
+    return std::nullopt;
+  }
+  return space_of(measured);
+}
+
+Records measure_volumes() {
+  Records first;
+  VORNMountVolInfo* last = nullptr;
+  for (const Volume& volume : read_volumes().volumes) {
+    const std::optional<Space> space = volume.holds_data ? measure(volume.path) : std::nullopt;
+    if (!space) {
+      continue;
+    }
+    Records added(new Record(volume.path, *space));
+    VORNMountVolInfo* record = added.get();
+    if (last == nullptr) {
+      first = std::move(added);
+    } else {
+      last->next = added.release();
+    }
+    last = record;
+  }
+  return first;
+}
+
+}  // namespace
 }  // namespace host
+
+VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int /*selector*/) try {
+  if (filter != nullptr) {
+    errno = EINVAL;
+    return nullptr;
+  }
+  const host::ErrnoKeeper keeper;
+  return host::measure_volumes().release();
+} catch (...) {
+  errno = ENOMEM;
+  return nullptr;
+}
+
+void VORNMountVolInfoFree(VORNMountVolInfo* volumes) {
+  while (volumes != nullptr) {
+    VORNMountVolInfo* next = volumes->next;
+    delete static_cast<host::Record*>(volumes);
+    volumes = next;
+  }
+}
 
 int VornQazGetVolumePathHash(VLIBCSzHash** hash) try {
   if (hash == nullptr) {
@@ -158,13 +261,8 @@ int VornQazVolumeGetId(const char* mount_path, char* id, size_t size) try {
     return -1;
   }
   const host::ErrnoKeeper keeper;
-  std::string whole = mount_path;
-  if (host::may_be_cut(whole)) {
-    // Once for the run: a report asks for every row.
-    static const host::ServerVolumes server = host::read_volumes();
-    whole = host::uncut_path(server.volumes, whole);
-  }
-  const std::string text = host::volume_id(whole);
+  const std::string text = host::may_be_cut(mount_path) ? host::known_cut_volume_id(mount_path)
+                                                        : host::volume_id(mount_path);
   std::memcpy(id, text.c_str(), text.size() + 1);
   return static_cast<int>(text.size());
 } catch (...) {

@@ -2,9 +2,11 @@
 #ifndef VORN_HOST_VOLUMES_HPP
 #define VORN_HOST_VOLUMES_HPP
 
+#include <sys/statvfs.h>
 #include <sys/types.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -43,12 +45,20 @@ constexpr bool may_be_cut(std::string_view path) {
   return path.size() == 15 || path.size() == 31;
 }
 
-// `path` when it is a volume's; otherwise the first volume's path that it is the beginning of;
-// `path` when there is none.
-std::string uncut_path(const std::vector<Volume>& volumes, std::string_view path);
-
 // The identifier of a whole mount path: at most 48 bytes of A-Z a-z 0-9 . _ - and '/'.
 std::string volume_id(std::string_view path);
+
+// The identifier for a path that may be cut: that of the volume whose path begins so; when several
+// do, one of its own that ends in "...", with one syslog line; of `cut` itself when none does.
+std::string cut_volume_id(const std::vector<Volume>& volumes, std::string_view cut);
+
+struct Space {
+  std::uint64_t total;  // bytes: used and free ones
+  std::uint64_t free;   // for users
+};
+
+// As df counts: what is reserved for root is neither used nor free, so it isn't in the total.
+Space space_of(const struct statvfs& measured);
 
 }  // namespace host
 

@@ -1,14 +1,14 @@
 // User accounts, through the system's name service.
 //
-// A name that is handed out stands for itself in a quoted JavaScript string, in a quoted CSV field
-// and as a key of a JavaScript object or, beside other characters than letters and digits, near
-// enough to one for the page to tell. Such a name is valid UTF-8 of at most 255 bytes without
-// control characters, quotes, back quotes, '<', '/' and what neither Unix nor Active Directory
-// allows ( [ ] : ; | = * ? ); it begins with none of '=', '+', '-', '@'. An account with any other
-// name is treated as unknown, with one syslog line in the life of the process.
+// Reports write names as they are into quoted JavaScript strings and CSV fields and, without
+// quotes, as keys of JavaScript objects. So a name that is handed out is valid UTF-8 of at most 255
+// bytes, holds no control character, quote, back quote, backslash or '<' and nothing that neither
+// Unix nor Active Directory allows ( [ ] : ; | = * ? ), and doesn't begin as a formula does (= + -
+// @). An account with any other name counts as unknown, with one syslog line in the life of the
+// process.
 //
-// The one exception is a domain's account as winbind names it by default, "DOM\name": it is handed
-// out, and asked for, as "DOM/name". Asked for with the backslash it is unknown.
+// The exception is a domain's account as winbind names it by default, "DOM\name": it is handed out,
+// and is to be asked for, as "DOM/name". Asked for with the backslash it counts as unknown.
 #ifndef VORN_USER_H
 #define VORN_USER_H
 

@@ -12,9 +12,11 @@ extern "C" {
 
 // One volume of an enumeration, in the order of the mount table.
 typedef struct VORNMountVolInfo {
-  char* path;                     // mount path; never empty
-  unsigned long long free_size;   // bytes free for users
-  unsigned long long total_size;  // bytes
+  char* path;                    // mount path; never empty
+  unsigned long long free_size;  // bytes free for users
+  // Bytes used or free for users. Their difference is what is used, as df shows it, and their
+  // ratio is df's; what a file system reserves for root is in neither.
+  unsigned long long total_size;
   struct VORNMountVolInfo* next;
 } VORNMountVolInfo;
 
@@ -34,8 +36,10 @@ int VornQazGetVolumePathHash(VLIBCSzHash** hash);
 
 // Writes the identifier of the volume mounted at `mount_path`: a short text, the same from run to
 // run, fit for a quoted JavaScript string and a quoted CSV field. Never fails for a volume of the
-// mount table, also when its path was cut at 15 or 31 bytes. The length, or -1 for a null or empty
-// argument or a buffer below 64 bytes.
+// mount table, also when its path was cut at 15 or 31 bytes: the identifier is then that of the
+// volume whose path begins so. Where several do, nobody can tell which is meant; all have one
+// identifier then, of the cut path and "...", and a syslog line says so once. The length, or -1 for
+// a null or empty argument or a buffer below 64 bytes.
 int VornQazVolumeGetId(const char* mount_path, char* id, size_t size);
 
 #ifdef __cplusplus
