@@ -29,7 +29,7 @@ void require_sandbox() {
       return;
     }
   }
-  std::fprintf(stderr, "platform_tests: run it through tools/sandbox.sh\n");
+  std::fprintf(stderr, "tests: run them through tools/sandbox.sh\n");
   std::exit(2);
 }
 
@@ -43,7 +43,7 @@ void bind_log_socket() {
   unlink(address.sun_path);
   if (bind(log_socket, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0 ||
       listen(log_socket, 128) != 0) {
-    std::perror("platform_tests: /dev/log");
+    std::perror("tests: /dev/log");
     std::exit(2);
   }
 }

@@ -1,4 +1,4 @@
-// What the platform's tests share: files in a temporary folder, and what went to syslog.
+// What the tests share: files in a temporary folder, and what went to syslog.
 #ifndef VORN_TESTS_SUPPORT_HPP
 #define VORN_TESTS_SUPPORT_HPP
 
