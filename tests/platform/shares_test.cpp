@@ -147,23 +147,4 @@ TEST(MatchShare, ReadsTheListAsNames) {
   }
 }
 
-TEST(Users, AreThoseOfTheNameService) {
-  uid_t uid = 1;
-  gid_t gid = 1;
-  EXPECT_EQ(0, VORNUserGetUGID("root", &uid, &gid));
-  EXPECT_EQ(0U, uid);
-  EXPECT_EQ(0U, gid);
-  EXPECT_EQ(0, VORNUserGetUGID("root", &uid, nullptr));
-  for (const char* name : {"no-such-account", "", static_cast<const char*>(nullptr)}) {
-    EXPECT_EQ(-1, VORNUserGetUGID(name, &uid, &gid));
-  }
-
-  VLIBCSzHash* made = nullptr;
-  ASSERT_EQ(0, VornQazInitFilterUser(&made));
-  const support::Hash filter(made);
-  EXPECT_NE(nullptr, VLIBCSzHashGetValue(made, "root"));
-  EXPECT_NE(nullptr, VLIBCSzHashGetValue(made, "daemon"));
-  EXPECT_EQ(nullptr, VLIBCSzHashGetValue(made, "no-such-account"));
-}
-
 }  // namespace

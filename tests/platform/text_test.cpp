@@ -71,6 +71,41 @@ TEST(List, TextsSurvivePushes) {
   EXPECT_EQ(VLIBCSzListGet(list, VLIBCSzListCount(list)), nullptr);
 }
 
+TEST(Splitting, KeepsEmptyPiecesAndDropsBlanks) {
+  using Pieces = std::vector<std::string>;
+  struct Case {
+    const char* text;
+    const char* separators;
+    Pieces expected;
+  };
+  const Case cases[] = {
+      {"anna,bob", ",", {"anna", "bob"}},
+      {" anna , bob smith\t", ",", {"anna", "bob smith"}},
+      {"anna,,bob,", ",", {"anna", "", "bob", ""}},
+      {"a;b,c", ",;", {"a", "b", "c"}},
+      {"a b", " ", {"a", "b"}},
+      {"anna", "", {"anna"}},
+      {",", ",", {"", ""}},
+      {"", ",", {}},
+      {" \t ", ",", {}},
+  };
+  for (const auto& [text, separators, expected] : cases) {
+    const support::List owner = support::make_list();
+    VLIBCSzList* list = owner.get();
+    EXPECT_EQ(VLIBCStrTok(text, separators, &list), static_cast<int>(expected.size())) << text;
+    EXPECT_EQ(support::texts(owner), expected) << text;
+  }
+  const support::List owner = support::make_list();
+  VLIBCSzList* list = owner.get();
+  VLIBCSzListPush(&list, "kept");
+  EXPECT_EQ(VLIBCStrTok("more", ",", &list), 1);
+  EXPECT_EQ(support::texts(owner), (Pieces{"kept", "more"}));
+  EXPECT_EQ(VLIBCStrTok(nullptr, ",", &list), -1);
+  EXPECT_EQ(VLIBCStrTok("a", nullptr, &list), -1);
+  list = nullptr;
+  EXPECT_EQ(VLIBCStrTok("a", ",", &list), -1);
+}
+
 TEST(ShellQuoting, TheShellReadsBackTheText) {
   for (const std::string text :
        {"", "plain", "two words", "it's", "''", "$HOME `id` \"x\" \\", "new\nline", "\xFF*?[]"}) {

@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdio>
+#include <memory>
 #include <set>
 
 #include "file_system.hpp"
@@ -103,6 +105,85 @@ TEST(Volumes, OfThisServerHoldItsShares) {
             })));
 }
 
+TEST(VolumeSpace, IsWhatDfCounts) {
+  struct Case {
+    unsigned long blocks, free, available;
+    host::Space expected;
+  };
+  const Case cases[] = {
+      {1000, 400, 400, {4096000, 1638400}},
+      {1000, 400, 350, {3891200, 1433600}},  // 50 blocks are reserved for root
+      {1000, 30, 0, {3973120, 0}},
+      {1000, 30, static_cast<unsigned long>(-20), {3973120, 0}},
+      {1000, 1200, 1200, {4915200, 4915200}},
+      {0, 0, 0, {0, 0}},
+  };
+  for (const auto& [blocks, free, available, expected] : cases) {
+    struct statvfs measured {};
+    measured.f_bsize = 65536;
+    measured.f_frsize = 4096;
+    measured.f_blocks = blocks;
+    measured.f_bfree = free;
+    measured.f_bavail = available;
+    const host::Space space = host::space_of(measured);
+    EXPECT_EQ(expected.total, space.total);
+    EXPECT_EQ(expected.free, space.free);
+  }
+}
+
+// What df says about the file system at `path`: "used available percent%".
+std::string df(const std::string& path) {
+  FILE* tool = popen(("/usr/bin/df -B1 --output=used,avail,pcent " + path).c_str(), "r");
+  char line[256] = "";
+  unsigned long long used = 0;
+  unsigned long long available = 0;
+  unsigned percent = 0;
+  while (std::fgets(line, sizeof line, tool) != nullptr) {
+    std::sscanf(line, "%llu %llu %u", &used, &available, &percent);
+  }
+  pclose(tool);
+  return std::to_string(used) + " " + std::to_string(available) + " " + std::to_string(percent);
+}
+
+std::string described(const VORNMountVolInfo& volume) {
+  const unsigned long long used = volume.total_size - volume.free_size;
+  const unsigned long long percent = (used * 100 + volume.total_size - 1) / volume.total_size;
+  return std::to_string(used) + " " + std::to_string(volume.free_size) + " " +
+         std::to_string(percent);
+}
+
+// The sandbox of this test has two small file systems in memory; shares make them volumes.
+TEST(Volumes, AreListedOnceWithWhatDfSays) {
+  const std::string first = "/tmp/vol-storage-1";
+  const std::string second = "/tmp/vol-storage-2";
+  support::write_file(first + "/file", std::string(1000000, 'x'));
+  support::write_file(VORN_PATH_SHARES, "[one]\npath = " + first + "\n[two]\npath = " + second +
+                                            "\n[again]\npath = " + second + "\n");
+  EXPECT_EQ(0, support::wait_child(support::fork_child([&] {
+              const std::unique_ptr<VORNMountVolInfo, decltype(&VORNMountVolInfoFree)> volumes(
+                  VORNMountVolAllEnum(nullptr, VORN_VOLUMES_OF_USAGE), &VORNMountVolInfoFree);
+              std::multiset<std::string> paths;
+              for (const auto* volume = volumes.get(); volume != nullptr; volume = volume->next) {
+                paths.insert(volume->path);
+                if (volume->path == first || volume->path == second) {
+                  EXPECT_EQ(df(volume->path), described(*volume)) << volume->path;
+                }
+              }
+              for (const std::string& path : {std::string("/"), first, second}) {
+                EXPECT_EQ(1U, paths.count(path)) << path;
+              }
+              for (const char* path : {"/proc", "/dev", "/tmp", "/run"}) {
+                EXPECT_EQ(0U, paths.count(path)) << path;
+              }
+              char id[64];
+              EXPECT_LT(0, VornQazVolumeGetId("/tmp/vol-storag", id, sizeof id));
+              EXPECT_STREQ("/tmp/vol-storag...", id);
+              return testing::Test::HasFailure() ? 1 : 0;
+            })));
+  VORNMountVolInfoFree(nullptr);
+  EXPECT_EQ(nullptr, VORNMountVolAllEnum("filter", VORN_VOLUMES_OF_USAGE));
+}
+
 TEST(VolumeId, IsSafeShortAndUnique) {
   const std::string plain48 = "/" + std::string(47, 'v');
   EXPECT_EQ("/", host::volume_id("/"));
@@ -138,15 +219,25 @@ TEST(VolumeId, OfACutPathIsThatOfTheVolume) {
       {1, "/srv/storage/projects", VORN_FS_EXT, true},
       {2, "/srv/storage/private", VORN_FS_EXT, true},
       {3, "/srv/storage/p", VORN_FS_EXT, true},
-      {4, "/srv/storage/archive/of/everything/old", VORN_FS_EXT, true}};
+      {4, "/srv/storage/archive/of/every thing", VORN_FS_EXT, true},
+      {5, "/srv/storage/backup", VORN_FS_EXT, true},
+      {6, "/srv/storage/backup/layer", VORN_FS_MEMORY, false}};
   const std::pair<const char*, const char*> cases[] = {
-      {"/srv/storage/pr", "/srv/storage/projects"},  // both begin so: the first in mount order
-      {"/srv/storage/p", "/srv/storage/p"},
-      {"/srv/storage/archive/of/everyth", "/srv/storage/archive/of/everything/old"},
+      {"/srv/storage/pr", "/srv/storage/pr..."},  // nobody can tell which of the two
+      {"/srv/storage/p", "/srv/storage/p..."},    // its own path is no proof either
+      {"/srv/storage/archive/of/every t", "/srv/storage/archive/of/every_thing-5e547bb7"},
+      {"/srv/storage/ba", "/srv/storage/backup"},  // the layer is no volume of the reports
       {"/srv/storage/xx", "/srv/storage/xx"}};
   for (const auto& [path, expected] : cases) {
-    EXPECT_EQ(expected, host::uncut_path(volumes, path));
+    EXPECT_EQ(expected, host::cut_volume_id(volumes, path));
   }
+  const auto lines = support::syslog_lines();
+  ASSERT_EQ(2U, lines.size());
+  EXPECT_EQ(
+      "volumes \"/srv/storage/projects\" and \"/srv/storage/private\" have the first 15 bytes "
+      "in common, so that reports can't tell them apart and call both /srv/storage/pr...; "
+      "mount one of them at another path",
+      lines[0]);
   EXPECT_TRUE(host::may_be_cut("/srv/storage/pr"));
   EXPECT_FALSE(host::may_be_cut("/srv/storage/p"));
 
