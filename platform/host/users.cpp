@@ -141,7 +141,8 @@ const Found& account_of(uid_t uid) {
         });
     if (account) {
       // Who sees this name looks it up next; a service may know the one and not the other.
-      known_names().try_emplace(shown_account_name(account->name), account);
+      Found& by_name = known_names()[shown_account_name(account->name)];
+      by_name = by_name ? by_name : account;
     }
     entry = known.emplace(uid, std::move(account)).first;
   }
