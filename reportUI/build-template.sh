@@ -69,11 +69,11 @@ language() { # CODE
   printf 'document.documentElement.lang = vornText.lang;\n</script>\n'
 }
 
-# A report without rows leaves an end tag that no start tag precedes. The parser drops it, so the
-# page is told their number: it tells "no rows" from "no data".
+# A report without rows leaves an end tag that no start tag precedes (file types: after a brace). The
+# parser drops it, so the page is told their number: it tells "no rows" from "no data".
 count_empty_blocks() { # FILE
   awk '/^<script/ { open = 1 }
-       /^<\/script>/ { if (!open) empty++; open = 0 }
+       /<\/script>$/ { if (!open) empty++; open = 0 }
        END { print empty + 0 }' <"$1"
 }
 
@@ -81,7 +81,7 @@ end_head() { # FILE
   empty=$(count_empty_blocks "$1")
   # A report that failed half-way leaves its block open, and the rest of the page inside it.
   case $(tail -n 1 -- "$1") in
-    '</script>' | '</style>') ;;
+    *'</script>' | '</style>') ;;
     *) printf '\n</script>\n' ;;
   esac
   # A run that found its language setting bad adds none; the page speaks English then.
@@ -99,14 +99,19 @@ start_body() {
 }
 
 section() { # REPORT
-  cat <<HTML
-<section data-report="$1">
-<h2>$(printf '%s' "$1" | tr _ ' ')</h2>
-<p class="csv"><a href="csv/$1.csv" data-text="csv">CSV file</a></p>
-<table></table>
-<noscript><p>This table needs JavaScript. The same rows stand in csv/$1.csv.</p></noscript>
-</section>
-HTML
+  printf '<section data-report="%s">\n<h2>%s</h2>\n' "$1" "$(printf '%s' "$1" | tr _ ' ')"
+  case $1 in
+    quota_usage | file_group) # whose rows are in no CSV file
+      echo '<table></table>'
+      echo '<noscript><p>This table needs JavaScript.</p></noscript>'
+      ;;
+    *)
+      printf '<p class="csv"><a href="csv/%s.csv" data-text="csv">CSV file</a></p>\n' "$1"
+      echo '<table></table>'
+      printf '<noscript><p>This table needs JavaScript. Its rows stand in csv/%s.csv.</p></noscript>\n' "$1"
+      ;;
+  esac
+  echo '</section>'
 }
 
 finish_page() {
