@@ -179,6 +179,10 @@ bool replace(const std::string& file, std::string_view text) {
 
 }  // namespace
 
+bool config_is_readable(const char* file) {
+  return read_config(file).has_value();
+}
+
 int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
                 std::string_view format, std::chrono::milliseconds lock_wait) {
   const int saved_errno = errno;

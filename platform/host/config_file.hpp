@@ -1,4 +1,4 @@
-// Rewriting a configuration section with a chosen patience.
+// What the host needs of configuration files besides the API.
 #ifndef VORN_HOST_CONFIG_FILE_HPP
 #define VORN_HOST_CONFIG_FILE_HPP
 
@@ -8,6 +8,9 @@
 #include "vorn/config.h"
 
 namespace host {
+
+// Whether `file` can be read; one log line when it can't.
+bool config_is_readable(const char* file);
 
 // VLIBCFileSetSection, waiting at most `lock_wait` for another writer.
 int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,

@@ -4,19 +4,12 @@
 #include <unordered_set>
 
 #include "host_log.hpp"
+#include "words.hpp"
 
 namespace host {
 namespace {
 
-constexpr std::string_view kBlanks = " \t";
 constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
-
-std::string_view trimmed(std::string_view text) {
-  const std::size_t first = text.find_first_not_of(kBlanks);
-  return first == std::string_view::npos
-             ? std::string_view()
-             : text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
-}
 
 bool has_control(std::string_view text) {
   return std::any_of(text.begin(), text.end(),
@@ -60,14 +53,7 @@ bool check_section(const std::vector<ConfigLine>& lines, const char* file,
 }  // namespace
 
 ConfigLine parse_line(std::string_view bytes) {
-  std::string_view content = bytes;
-  if (content.ends_with('\n')) {
-    content.remove_suffix(1);
-  }
-  if (content.ends_with('\r')) {
-    content.remove_suffix(1);
-  }
-  content = trimmed(content);
+  const std::string_view content = trimmed(bytes);  // line ends are blanks, too
   if (content.find('\0') != std::string_view::npos) {
     return malformed(bytes, "it holds a zero byte");
   }

@@ -15,9 +15,9 @@ enum class LineKind { ignored, header, entry, malformed };
 // One line of a file; the views point into the file's text.
 struct ConfigLine {
   LineKind kind = LineKind::ignored;
-  std::string_view bytes{};            // the whole line with its line end
-  std::string_view name{};             // of a section or a key
-  std::string_view value{};            // of an entry
+  std::string_view bytes{};          // the whole line with its line end
+  std::string_view name{};           // of a section or a key
+  std::string_view value{};          // of an entry
   const char* problem = nullptr;     // of a malformed line
   bool looks_like_a_header = false;  // of a malformed line
 };

@@ -18,22 +18,21 @@ constexpr bool is_code_char(char c) {
 }  // namespace
 
 int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size) {
-  if (hash == nullptr || code == nullptr || size == 0) {
+  constexpr std::string_view kDefault = "en";
+  if (hash == nullptr || code == nullptr || size <= kDefault.size()) {
     errno = EINVAL;
     return -1;
   }
-  *code = '\0';
   const char* value = VLIBCSzHashGetValue(hash, "language");
-  const std::string_view language = value == nullptr || *value == '\0' ? "en" : value;
+  std::string_view language = value == nullptr || *value == '\0' ? kDefault : value;
   const bool begins_well = language.front() != '-';  // or it would read as an option
   if (!begins_well || language.size() >= size ||
       !std::all_of(language.begin(), language.end(), is_code_char)) {
     host::log_line(
-        "language \"%s\" is no code of letters, digits and '-' of at most %zu bytes; "
-        "write language = en, for example, in %s",
+        "language \"%.80s\" is no code of at most %zu letters, digits and '-', so the page is in "
+        "English; write language = en, for example, in %s",
         value, size - 1, VORN_PATH_CONFIG);
-    errno = EINVAL;
-    return -1;
+    language = kDefault;
   }
   std::memcpy(code, language.data(), language.size());
   code[language.size()] = '\0';

@@ -1,9 +1,9 @@
 #include "page.hpp"
 
 #include <fcntl.h>
+#include <strings.h>
 #include <sys/stat.h>
 
-#include <algorithm>
 #include <string_view>
 
 #include "file_io.hpp"
@@ -11,6 +11,7 @@
 namespace host {
 
 bool page_is_complete(const char* path) {
+  constexpr std::string_view kBeginning = "<!DOCTYPE html>";
   constexpr std::string_view kLastLine = "\n</html>";
   const ErrnoKeeper keeper;
   const Fd fd(open(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
@@ -18,9 +19,13 @@ bool page_is_complete(const char* path) {
   if (!fd || fstat(fd.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
     return false;
   }
-  char buffer[16];
-  const off_t start = std::max<off_t>(status.st_size - static_cast<off_t>(sizeof buffer), 0);
-  const ssize_t got = pread(fd.get(), buffer, sizeof buffer, start);
+  char buffer[kBeginning.size()];
+  if (pread(fd.get(), buffer, sizeof buffer, 0) != static_cast<ssize_t>(sizeof buffer) ||
+      strncasecmp(buffer, kBeginning.data(), kBeginning.size()) != 0) {
+    return false;
+  }
+  const ssize_t got =
+      pread(fd.get(), buffer, sizeof buffer, status.st_size - static_cast<off_t>(sizeof buffer));
   if (got <= 0) {
     return false;
   }

@@ -4,8 +4,9 @@
 
 namespace host {
 
-// Whether `path` is a regular file (no link) whose last line is "</html>": the template script
-// writes that line last, so a page that lacks it was cut short.
+// Whether `path` is a regular file (no link) that begins with the document type, "<!DOCTYPE html>"
+// in any case, and whose last line is "</html>". The template script writes the one first and the
+// other last, so a page that lacks either has lost a part.
 bool page_is_complete(const char* path);
 
 }  // namespace host

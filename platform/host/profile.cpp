@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <cstring>
 #include <exception>
+#include <set>
 #include <string>
 #include <string_view>
 
@@ -29,6 +30,14 @@ bool only(std::string_view text, std::string_view extra) {
            return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') ||
                   extra.find(c) != std::string_view::npos;
          });
+}
+
+// Whether this is the first time: a run asks for its profile several times.
+bool is_news(const char* bad_name) noexcept try {
+  static std::set<std::string> told;
+  return told.insert(bad_name).second;
+} catch (const std::exception&) {
+  return true;
 }
 
 int enum_profiles(VLIBCSzList& list) {
@@ -90,10 +99,13 @@ bool valid_profile(const char* profile) {
   if (profile != nullptr && *profile != '.' && only(profile, "._-")) {
     return true;
   }
-  log_line(
-      "\"%.80s\" is no profile name; use 1 to 64 of A-Z a-z 0-9 . _ -, not beginning with a "
-      "dot",
-      profile == nullptr ? "" : profile);
+  const char* shown = profile == nullptr ? "" : profile;
+  if (is_news(shown)) {
+    log_line(
+        "\"%.80s\" is no profile name; use 1 to 64 of A-Z a-z 0-9 . _ -, not beginning with a "
+        "dot",
+        shown);
+  }
   errno = EINVAL;
   return false;
 }

@@ -14,15 +14,17 @@
 #include <memory>
 #include <string_view>
 
+#include "config_file.hpp"
 #include "file_io.hpp"
 #include "host_log.hpp"
 #include "profile.hpp"
 #include "run_lock.hpp"
 #include "run_temporary.hpp"
+#include "shares.hpp"
 #include "text_containers.hpp"
-#include "vorn/config.h"
 #include "vorn/paths.h"
 #include "vorn/report.h"
+#include "words.hpp"
 
 namespace host {
 namespace {
@@ -131,24 +133,13 @@ ReportRun unused_run(const std::string& profile, const std::string& folder) {
 
 // One line for each name that the profile selects and share.conf lacks: most likely a typing error.
 void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
-  const char* value = hash.find("share_list");
-  VLIBCSzList known;
-  VLIBCSzList* sections = &known;
-  if (value == nullptr || VLIBCFileEnumSection(VORN_PATH_SHARES, &sections) < 0) {
-    return;
-  }
-  std::string_view rest = value;
-  while (!rest.empty()) {
-    const std::string_view item = rest.substr(0, rest.find(','));
-    rest.remove_prefix(std::min(item.size() + 1, rest.size()));
-    const std::size_t first = item.find_first_not_of(" \t");
-    if (first == std::string_view::npos) {
-      continue;
-    }
-    const std::string name(item.substr(first, item.find_last_not_of(" \t") - first + 1));
-    if (std::find(known.texts.begin(), known.texts.end(), name) == known.texts.end()) {
+  const char* list = hash.find("share_list");
+  for (const std::string_view name : comma_words(list == nullptr ? "" : list)) {
+    const std::vector<Share>* shares = all_shares();
+    if (shares != nullptr && std::none_of(shares->begin(), shares->end(),
+                                          [name](const Share& s) { return s.name == name; })) {
       log_line(R"(profile "%s": share_list names "%s", which is no share of %s; correct the name)",
-               profile, name.c_str(), VORN_PATH_SHARES);
+               profile, std::string(name).c_str(), VORN_PATH_SHARES);
     }
   }
 }
@@ -188,7 +179,8 @@ std::optional<ReportRun> begin_report_run(const char* profile, const VLIBCSzHash
     errno = ENOLCK;
     return std::nullopt;
   }
-  if (!make_report_folder(dir, folder)) {
+  // Without any share the report would be empty, and look like a good one.
+  if (!config_is_readable(VORN_PATH_SHARES) || !make_report_folder(dir, folder)) {
     return std::nullopt;
   }
   remove_leftovers(profile, folder);

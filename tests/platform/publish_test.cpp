@@ -37,14 +37,12 @@ std::string link_of(const Entries& profile, const std::string& file, size_t size
 TEST(TargetLink, StandsForTheReportFolder) {
   const support::TempFolder folder;
   const std::string base = folder.path("r\xc3\xa4 #1");
-  const std::string page = base + "/weekly/2024-02-29_17-30-00/report.html";
-  support::write_file(page, "<!doctype html>\n</html>\n");
   const std::string rest = "/weekly/2024-02-29_17-30-00/report.html";
+  const std::string page = base + rest;
+  support::write_file(page, "<!doctype html>\n</html>\n");
   const std::string own = "file://" + folder.path("r%C3%A4%20%231") + rest;
-
-  EXPECT_EQ(own, link_of({{"report_dir", base}}, page));
-  EXPECT_EQ(own, link_of({{"report_dir", base + "//"}, {"link_base", ""}}, page));
   const std::pair<const char*, std::string> bases[] = {
+      {"", own},
       {"https://files.example.com/reports", "https://files.example.com/reports" + rest},
       {"http://user@h:8080/a%20b/", "http://user@h:8080/a%20b" + rest},
       {"file:///mnt/reports", "file:///mnt/reports" + rest},
@@ -59,24 +57,14 @@ TEST(TargetLink, StandsForTheReportFolder) {
       {"https://h/\x01", "refused"},
   };
   for (const auto& [link_base, expected] : bases) {
-    syslog_lines();
-    EXPECT_EQ(expected, link_of({{"report_dir", base}, {"link_base", link_base}}, page));
+    EXPECT_EQ(expected, link_of({{"report_dir", base + "//"}, {"link_base", link_base}}, page));
     EXPECT_EQ(expected == "refused" ? 1U : 0U, syslog_lines().size()) << link_base;
   }
-}
-
-TEST(TargetLink, IsOnlyForACompletePageBelowTheFolderThatFits) {
-  const support::TempFolder folder;
-  const std::string page = folder.path("r/p/t/report.html");
-  support::write_file(page, "</html>");
-  EXPECT_EQ("refused", link_of({{"report_dir", folder.path("r")}}, page)) << "no last line";
-  support::write_file(page, "x\n</html>\n");
+  EXPECT_EQ("refused", link_of({{"report_dir", base}}, page, own.size()));
+  EXPECT_EQ(own, link_of({{"report_dir", base}}, page, own.size() + 1));
   EXPECT_EQ("refused", link_of({{"report_dir", folder.path("other")}}, page));
-  EXPECT_EQ("refused", link_of({{"report_dir", folder.path("r")}}, page + "x"));
-  const std::string link = link_of({{"report_dir", folder.path("r")}}, page);
-  EXPECT_EQ("file://" + page, link);
-  EXPECT_EQ("refused", link_of({{"report_dir", folder.path("r")}}, page, link.size()));
-  EXPECT_EQ(link, link_of({{"report_dir", folder.path("r")}}, page, link.size() + 1));
+  support::write_file(page, "<!doctype html>\n");
+  EXPECT_EQ("refused", link_of({{"report_dir", base}}, page)) << "cut short";
 }
 
 // --- Mail ---------------------------------------------------------------------------------------
@@ -84,40 +72,31 @@ TEST(TargetLink, IsOnlyForACompletePageBelowTheFolderThatFits) {
 // The server script as a child process; ended with the scope.
 class MailServer {
  public:
-  explicit MailServer(const std::vector<std::string>& options = {}) {
+  explicit MailServer(const std::string& options = "") {
     int ends[2];
     if (pipe(ends) != 0) {
       throw std::runtime_error("pipe");
     }
     const std::string script = std::filesystem::path(__FILE__).parent_path() / "smtp_server.py";
-    std::vector<std::string> words = {"/usr/bin/python3", script, mails_.path()};
-    words.insert(words.end(), options.begin(), options.end());
+    const std::string command = "exec " + script + " " + mails_.path() + " " + options;
     pid_ = support::fork_child([&] {
       dup2(ends[1], STDOUT_FILENO);
-      std::vector<char*> arguments;
-      for (std::string& word : words) {
-        arguments.push_back(word.data());
-      }
-      arguments.push_back(nullptr);
-      execv(arguments[0], arguments.data());
-      return 127;
+      return execl("/bin/sh", "sh", "-c", command.c_str(), nullptr);
     });
     close(ends[1]);
-    FILE* output = fdopen(ends[0], "r");
-    if (std::fscanf(output, "%d", &port_) != 1) {
-      ADD_FAILURE() << "the mail server doesn't start";
-    }
-    std::fclose(output);
+    char port[8] = "";
+    EXPECT_GT(read(ends[0], port, sizeof port - 1), 0) << "the mail server doesn't start";
+    close(ends[0]);
+    port_ = std::to_string(std::atoi(port));
   }
-  MailServer(const MailServer&) = delete;
-  MailServer& operator=(const MailServer&) = delete;
+  MailServer(MailServer&&) = delete;
   ~MailServer() {
     kill(pid_, SIGKILL);
     support::wait_child(pid_);
   }
 
-  std::string port() const { return std::to_string(port_); }
-  std::string url() const { return "smtp://127.0.0.1:" + port(); }
+  const std::string& port() const { return port_; }
+  std::string url() const { return "smtp://127.0.0.1:" + port_; }
   // Message `n`, from 1.
   std::string mail(int n) const {
     return support::read_file(mails_.path(std::to_string(n) + ".eml"));
@@ -130,7 +109,7 @@ class MailServer {
  private:
   support::TempFolder mails_;
   pid_t pid_ = -1;
-  int port_ = 0;
+  std::string port_;
 };
 
 int send(Entries profile, const std::string& url, const char* to = "a@example.com") {
@@ -168,24 +147,20 @@ TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
     EXPECT_EQ(i == 0 ? "a" : "b", parts[1]);
     ports[i] = parts[2];
     const std::string body = std::regex_replace(parts[3].str(), std::regex("=\r\n"), "");
-    EXPECT_NE(std::string::npos, body.find(std::string(1000, 'x') + "?=3D.\r\n.\r\nend\r\n"))
-        << "lines of one dot must not end the message: " << body;
-    EXPECT_NE(std::string::npos, body.find("\"weekly\""));
-    EXPECT_NE(std::string::npos, body.find("share_list,large_file"));
+    for (const char* text : {"x?=3D.\r\n.\r\nend\r\n",  // a line of one dot must not end it
+                             "\"weekly\"", "share_list,large_file"}) {
+      EXPECT_NE(std::string::npos, body.find(text)) << body;
+    }
   }
   EXPECT_EQ(ports[0], ports[1]);
 }
 
 TEST(SendReport, NamesEachRefusedRecipient) {
-  {
-    const MailServer server({"--refuse", "b@example.com"});
-    EXPECT_EQ(0, send({}, server.url(), "a@example.com,b@example.com,c@example.com"));
-    EXPECT_EQ(2U, server.count());
-    const auto lines = syslog_lines();
-    ASSERT_EQ(1U, lines.size());
-    EXPECT_NE(std::string::npos, lines[0].find("b@example.com: 550 5.1.1 no mailbox")) << lines[0];
-  }
-  const MailServer server({"--refuse", "*"});
+  const MailServer picky("--refuse b@example.com");
+  EXPECT_EQ(0, send({}, picky.url(), "a@example.com,b@example.com,c@example.com"));
+  EXPECT_EQ(2U, picky.count());
+  EXPECT_NE(std::string::npos, syslog_text().find("b@example.com: 550 5.1.1 no mailbox"));
+  const MailServer server("--refuse '*'");
   EXPECT_EQ(-1, send({}, server.url(), "a@example.com,b@example.com"));
   EXPECT_EQ(0U, server.count());
   EXPECT_EQ(2U, syslog_lines().size());
@@ -200,71 +175,60 @@ TEST(SendReport, GivesUpOnAServerThatIsAbsentOrSilent) {
   auto* generic = reinterpret_cast<sockaddr*>(&address);
   ASSERT_EQ(0, bind(listener, generic, length));
   ASSERT_EQ(0, getsockname(listener, generic, &length));
-  const std::string url = "smtp://127.0.0.1:" + std::to_string(ntohs(address.sin_port));
-
-  EXPECT_EQ(-1, send({}, url, "a@example.com,b@example.com")) << "nobody listens yet";
-  auto lines = syslog_lines();
-  ASSERT_EQ(1U, lines.size());
-  EXPECT_NE(std::string::npos, lines[0].find("2 recipients not served")) << lines[0];
-
-  ASSERT_EQ(0, listen(listener, 5));
+  const support::Hash hash =
+      make_hash({{"smtp_url", "smtp://127.0.0.1:" + std::to_string(ntohs(address.sin_port))},
+                 {"mail_to", "a@example.com,b@example.com"}});
   using std::chrono::milliseconds;
   const host::MailLimits limits{milliseconds(200), milliseconds(400), milliseconds(800)};
-  const support::Hash hash =
-      make_hash({{"smtp_url", url}, {"mail_to", "a@example.com,b@example.com"}});
-  errno = 0;
-  EXPECT_EQ(-1, host::send_report("weekly", "l", *hash, limits)) << "it never greets";
-  EXPECT_EQ(ETIMEDOUT, errno);
-  EXPECT_EQ(1U, syslog_lines().size());
+  for (const int code : {ECONNREFUSED, ETIMEDOUT}) {  // nobody listens; nobody greets
+    errno = 0;
+    EXPECT_EQ(-1, host::send_report("weekly", "l", *hash, limits));
+    EXPECT_EQ(code == ETIMEDOUT, errno == ETIMEDOUT);
+    const auto lines = syslog_lines();
+    ASSERT_EQ(1U, lines.size());
+    EXPECT_NE(std::string::npos, lines[0].find("2 recipients not served")) << lines[0];
+    ASSERT_EQ(0, listen(listener, 5));
+  }
   close(listener);
 }
 
 TEST(SendReport, LogsInWithThePasswordOfASafeFile) {
   const support::TempFolder folder;
-  const std::string file = folder.path("password");
-  support::write_file(file, "s3cret: \"x\r\nsecond line\n");
-  ASSERT_EQ(0, chmod(file.c_str(), 0640));
-  const MailServer server({"--login", "joe:s3cret: \"x"});
-  const Entries good = {{"smtp_user", "joe"}, {"smtp_password_file", file}};
-  EXPECT_EQ(0, send(good, server.url()));
-  EXPECT_EQ(1U, server.count());
+  const auto password_file = [&folder](const char* name, const char* text, mode_t mode) {
+    support::write_file(folder.path(name), text);
+    EXPECT_EQ(0, chmod(folder.path(name).c_str(), mode));
+    return folder.path(name);
+  };
+  const std::string good = password_file("password", "s3cret: \"x\r\nsecond line\n", 0640);
+  const MailServer server("--login 'joe:s3cret: \"x'");
+  EXPECT_EQ(0, send({{"smtp_user", "joe"}, {"smtp_password_file", good}}, server.url()));
   EXPECT_EQ(-1, send({}, server.url())) << "the server wants a user";
-  EXPECT_EQ(-1, send({{"smtp_user", "eve"}, {"smtp_password_file", file}}, server.url()));
+  EXPECT_EQ(-1, send({{"smtp_user", "eve"}, {"smtp_password_file", good}}, server.url()));
   syslog_lines();
-
-  support::write_file(folder.path("empty"), "\nx");
-  chmod(folder.path("empty").c_str(), 0600);
-  support::write_file(folder.path("open"), "x");
-  chmod(folder.path("open").c_str(), 0604);
-  for (const std::string& name :
-       {std::string(), std::string("password"), folder.path(), folder.path("empty"),
-        folder.path("open"), folder.path("absent")}) {
-    EXPECT_EQ(-1, send({{"smtp_user", "joe"}, {"smtp_password_file", name}}, server.url()));
-    EXPECT_EQ(1U, syslog_lines().size()) << name;
+  for (const std::string& bad :
+       {std::string(), std::string("password"), folder.path(), password_file("empty", "\nx", 0600),
+        password_file("open", "s3cret: \"x", 0604), folder.path("absent")}) {
+    EXPECT_EQ(-1, send({{"smtp_user", "joe"}, {"smtp_password_file", bad}}, server.url()));
+    EXPECT_EQ(1U, syslog_lines().size()) << bad;
   }
   EXPECT_EQ(1U, server.count());
 }
 
-std::string self_signed_certificate(const support::TempFolder& folder) {
-  std::string pem = folder.path("server.pem");
+TEST(SendReport, EncryptsAsMuchAsThePasswordNeeds) {
+  const support::TempFolder folder;
+  const std::string pem = folder.path("server.pem");
   const std::string command =
       "/usr/bin/openssl req -x509 -newkey ec -pkeyopt ec_paramgen_curve:prime256v1 -nodes -days 2 "
       "-subj /CN=test -keyout " +
       pem + " -out " + pem + ".crt 2>/dev/null && cat " + pem + ".crt >> " + pem;
-  EXPECT_EQ(0, std::system(command.c_str()));
-  return pem;
-}
-
-TEST(SendReport, EncryptsAsMuchAsThePasswordNeeds) {
-  const support::TempFolder folder;
-  const std::string pem = self_signed_certificate(folder);
+  ASSERT_EQ(0, std::system(command.c_str()));
   support::write_file(folder.path("password"), "x");
   ASSERT_EQ(0, chmod(folder.path("password").c_str(), 0600));
   const Entries nobody;
   const Entries user = {{"smtp_user", "joe"}, {"smtp_password_file", folder.path("password")}};
   const MailServer plain;
-  const MailServer starttls({"--certificate", pem});
-  const MailServer smtps({"--certificate", pem, "--smtps"});
+  const MailServer starttls("--certificate " + pem);
+  const MailServer smtps("--smtps --certificate " + pem);
   struct Case {
     const MailServer& server;
     const char* url;  // 0.0.0.0 leads here too, but isn't a name of this machine
@@ -277,17 +241,15 @@ TEST(SendReport, EncryptsAsMuchAsThePasswordNeeds) {
       {starttls, "smtp://0.0.0.0:", user, nullptr},  {smtps, "smtps://127.0.0.1:", nobody, nullptr},
       {smtps, "smtps://0.0.0.0:", nobody, nullptr}};
   for (const auto& [server, url, profile, secure] : cases) {
-    syslog_lines();
     const std::size_t before = server.count();
     EXPECT_EQ(secure == nullptr ? -1 : 0, send(profile, url + server.port())) << url;
-    EXPECT_EQ(before + (secure == nullptr ? 0 : 1), server.count()) << url;
     const std::string log = syslog_text();
+    ASSERT_EQ(before + (secure == nullptr ? 0 : 1), server.count()) << url << log;
     if (secure == nullptr) {
       EXPECT_TRUE(std::regex_search(log, std::regex("certificate|STARTTLS|SSL"))) << log;
     } else {
-      EXPECT_NE(std::string::npos,
-                server.mail(static_cast<int>(before) + 1).find(std::string("Secure: ") + secure))
-          << url;
+      const std::string mail = server.mail(static_cast<int>(server.count()));
+      EXPECT_NE(std::string::npos, mail.find(std::string("Secure: ") + secure)) << url;
     }
   }
 }
@@ -300,28 +262,28 @@ TEST(SendReport, RefusesWhatItCannotUse) {
     EXPECT_EQ(-1, send({}, url)) << url;
     EXPECT_EQ(1U, syslog_lines().size()) << url;
   }
-  EXPECT_EQ(-1, send({{"mail_from", "not an address"}}, server.url()));
-  EXPECT_EQ(1U, syslog_lines().size());
-  EXPECT_EQ(-1, send({}, server.url(), "x, <y@z>")) << "two bad addresses";
-  EXPECT_EQ(2U, syslog_lines().size());
-  EXPECT_EQ(0, send({}, server.url(), "x, a@example.com"));
-  EXPECT_EQ(1U, syslog_lines().size());
+  const struct {
+    const char* from;
+    const char* to;
+    int result;
+    std::size_t lines;
+  } cases[] = {{"not an address", "a@example.com", -1, 1},
+               {"", "x, <y@z>", -1, 2},
+               {"", "x, a@example.com", 0, 1},
+               {"", " , ", 0, 0}};
+  for (const auto& [from, to, result, lines] : cases) {
+    EXPECT_EQ(result, send({{"mail_from", from}}, server.url(), to)) << to;
+    EXPECT_EQ(lines, syslog_lines().size()) << to;
+  }
   EXPECT_EQ(1U, server.count());
-
-  EXPECT_EQ(0, VornQazSendReport("weekly", "l", make_hash({{"mail_to", " , "}}).get()));
   EXPECT_EQ(0, VornQazSendReport("weekly", "l", make_hash().get()));
-  EXPECT_EQ("", syslog_text());
-  EXPECT_EQ(-1, VornQazSendReport("../x", "l", make_hash().get()));
 }
 
 TEST(MailAddress, IsPlainEnoughForAHeader) {
-  for (const char* address : {"a@b", "first.last+tag@mail.example.com", "o/x=1@[host]"}) {
-    EXPECT_EQ(std::string_view(address).find('[') == std::string_view::npos,
-              host::valid_address(address))
-        << address;
-  }
-  for (const char* address : {"", "a", "@b", "a@", "a@b@c", "a b@c", "a@b\r\nBcc: x@y", "\"a\"@b",
-                              "<a@b>", "a,b@c", "a@b\x7f", "\xc3\xa4@b", "-oX@b", "a@.b", "a@b."}) {
+  EXPECT_TRUE(host::valid_address("first.last+tag@mail.example.com"));
+  for (const char* address :
+       {"", "a", "@b", "a@", "a@b@c", "a b@c", "a@b\r\nBcc: x@y", "\"a\"@b", "<a@b>", "a,b@c",
+        "a@b\x7f", "\xc3\xa4@b", "-oX@b", "a@.b", "a@b.", "o/x=1@[host]"}) {
     EXPECT_FALSE(host::valid_address(address)) << address;
   }
   EXPECT_FALSE(host::valid_address(std::string(250, 'x') + "@b.cd"));

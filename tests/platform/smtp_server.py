@@ -9,7 +9,6 @@ import asyncio
 import logging
 import pathlib
 import ssl
-import sys
 import warnings
 
 from aiosmtpd.smtp import SMTP, AuthResult
@@ -21,7 +20,7 @@ class Recorder:
         self.count = 0
 
     async def handle_RCPT(self, server, session, envelope, address, rcpt_options):
-        if address in self.options.refuse or "*" in self.options.refuse:
+        if self.options.refuse in (address, "*"):
             return f"550 5.1.1 no mailbox <{address}> here"
         envelope.rcpt_tos.append(address)
         return "250 OK"
@@ -38,48 +37,34 @@ class Recorder:
         path.write_bytes(head.encode() + envelope.original_content)
         return "250 stored"
 
+    def check(self, server, session, envelope, mechanism, data):
+        login = f"{data.login.decode()}:{data.password.decode()}"
+        return AuthResult(success=login == self.options.login, handled=False)
+
 
 async def serve(options):
-    recorder = Recorder(options)
-
-    def check(server, session, envelope, mechanism, data):
-        login = f"{data.login.decode()}:{data.password.decode()}"
-        return AuthResult(success=login == options.login, handled=False)
-
     context = None
     if options.certificate:
         context = ssl.SSLContext(ssl.PROTOCOL_TLS_SERVER)
         context.load_cert_chain(options.certificate)
-
-    def protocol():
-        return SMTP(
-            recorder,
-            hostname="test.invalid",
-            authenticator=check,
-            auth_required=bool(options.login),
-            auth_require_tls=False,
-            tls_context=None if options.smtps else context,
-        )
-
+    recorder = Recorder(options)
     server = await asyncio.get_running_loop().create_server(
-        protocol, "127.0.0.1", 0, ssl=context if options.smtps else None
-    )
+        lambda: SMTP(recorder, hostname="test.invalid", authenticator=recorder.check,
+                     auth_required=bool(options.login), auth_require_tls=False,
+                     tls_context=None if options.smtps else context),
+        "127.0.0.1", 0, ssl=context if options.smtps else None)
     print(server.sockets[0].getsockname()[1], flush=True)
     await server.serve_forever()
 
 
-def main():
+if __name__ == "__main__":
     # A log-in without TLS is meant here.
     warnings.simplefilter("ignore")
     logging.disable()
     parser = argparse.ArgumentParser()
     parser.add_argument("folder", type=pathlib.Path)
-    parser.add_argument("--refuse", action="append", default=[], help="a recipient, or * for all")
+    parser.add_argument("--refuse", help="a recipient, or * for all")
     parser.add_argument("--login", help="USER:PASSWORD that must be given")
     parser.add_argument("--certificate", help="PEM file with key and certificate, for STARTTLS")
     parser.add_argument("--smtps", action="store_true", help="TLS from the start")
     asyncio.run(serve(parser.parse_args()))
-
-
-if __name__ == "__main__":
-    sys.exit(main())

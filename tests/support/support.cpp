@@ -21,54 +21,35 @@ namespace {
 
 int log_socket = -1;
 
-// The tests write to the product's fixed places; only the sandbox makes those private.
-void require_sandbox() {
-  std::ifstream mounts("/proc/self/mounts");
-  for (std::string line; std::getline(mounts, line);) {
-    if (line.find(" /usr/vorn ") != std::string::npos) {
-      return;
-    }
-  }
-  std::fprintf(stderr, "tests: run them through tools/sandbox.sh\n");
-  std::exit(2);
-}
-
-// A stream, which syslog(3) falls back to: a datagram socket takes as few as ten messages before
-// the sender blocks, and the sender is this process.
-void bind_log_socket() {
-  log_socket = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  std::snprintf(address.sun_path, sizeof address.sun_path, "/dev/log");
-  unlink(address.sun_path);
-  if (bind(log_socket, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0 ||
-      listen(log_socket, 128) != 0) {
-    std::perror("tests: /dev/log");
-    std::exit(2);
-  }
-}
-
-class Environment : public testing::Environment {
+class Environment : public testing::Environment, public testing::EmptyTestEventListener {
  public:
   void SetUp() override {
-    require_sandbox();
+    // The tests write to the product's fixed places; only the sandbox makes those private.
+    if (read_file("/proc/self/mounts").find(" /usr/vorn ") == std::string::npos) {
+      std::fprintf(stderr, "tests: run them through tools/sandbox.sh\n");
+      std::exit(2);
+    }
     for (const auto& left : std::filesystem::directory_iterator("/usr/vorn")) {
       std::filesystem::remove_all(left);  // an earlier run's
     }
-    bind_log_socket();
+    // A stream, which syslog(3) falls back to: a datagram socket takes as few as ten messages
+    // before the sender blocks, and the sender is this process.
+    log_socket = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+    const sockaddr_un address{.sun_family = AF_UNIX, .sun_path = "/dev/log"};
+    unlink(address.sun_path);
+    if (bind(log_socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0 ||
+        listen(log_socket, 128) != 0) {
+      std::perror("tests: /dev/log");
+      std::exit(2);
+    }
   }
+  // Each test begins with an empty log, and no test can fill the socket's queue for the next.
+  void OnTestStart(const testing::TestInfo& /*info*/) override { syslog_lines(); }
 };
 
-[[maybe_unused]] const testing::Environment* const environment =
-    testing::AddGlobalTestEnvironment(new Environment);
-
-// Each test begins with an empty log, and no test can fill the socket's queue for the next.
-class LogDrainer : public testing::EmptyTestEventListener {
-  void OnTestStart(const testing::TestInfo&) override { syslog_lines(); }
-};
-
-[[maybe_unused]] const bool drainer_added = [] {
-  testing::UnitTest::GetInstance()->listeners().Append(new LogDrainer);
+[[maybe_unused]] const bool added = [] {
+  testing::AddGlobalTestEnvironment(new Environment);
+  testing::UnitTest::GetInstance()->listeners().Append(new Environment);
   return true;
 }();
 
@@ -156,24 +137,25 @@ int wait_child(pid_t child) {
   return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
 }
 
+bool passes_in_child(const std::function<void()>& check) {
+  return wait_child(fork_child([&check] {
+           check();
+           return testing::Test::HasFailure() ? 1 : 0;
+         })) == 0;
+}
+
 OtherRun::OtherRun(const std::string& profile, const std::function<void()>& work) {
   int ready[2];
   if (pipe(ready) != 0) {
-    return;
+    throw std::runtime_error("pipe");
   }
   pid_ = fork_child([&] {
-    const int busy = VornQazProfileRunning(profile.c_str());
+    const bool holds = VornQazProfileRunning(profile.c_str()) == 0;
     work();
-    if (write(ready[1], &busy, sizeof busy) < 0) {
-      return 1;
-    }
-    for (;;) {
-      pause();
-    }
+    return write(ready[1], &holds, sizeof holds) > 0 ? pause() : 1;
   });
   close(ready[1]);
-  int busy = 1;
-  started_ = read(ready[0], &busy, sizeof busy) > 0 && busy == 0;
+  started_ = read(ready[0], &started_, sizeof started_) > 0 && started_;
   close(ready[0]);
 }
 

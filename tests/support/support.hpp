@@ -18,8 +18,7 @@ namespace support {
 class TempFolder {
  public:
   TempFolder();
-  TempFolder(const TempFolder&) = delete;
-  TempFolder& operator=(const TempFolder&) = delete;
+  TempFolder(TempFolder&&) = delete;
   ~TempFolder();
   // The folder, or a name in it.
   std::string path(std::string_view name = "") const;
@@ -45,14 +44,15 @@ std::string syslog_text();
 pid_t fork_child(const std::function<int()>& work);
 // The exit status of `child`, or -signal.
 int wait_child(pid_t child);
+// Whether no expectation of `check` fails in a child: for what a process can do only once.
+bool passes_in_child(const std::function<void()>& check);
 
 // A process that is in the middle of a run of `profile`, having done `work`, until it is killed.
 class OtherRun {
  public:
   explicit OtherRun(
       const std::string& profile, const std::function<void()>& work = [] {});
-  OtherRun(const OtherRun&) = delete;
-  OtherRun& operator=(const OtherRun&) = delete;
+  OtherRun(OtherRun&&) = delete;
   ~OtherRun() { end(); }
   bool started() const { return started_; }
   pid_t pid() const { return pid_; }

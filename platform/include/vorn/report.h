@@ -1,7 +1,8 @@
 // Report support: environment, profiles and their paths, run status, formats, publishing.
 //
 // A profile name is 1 to 64 of A-Z a-z 0-9 . _ - and doesn't begin with a dot. Every call that
-// takes one fails for anything else with one syslog line, and makes no path from it.
+// takes one fails for anything else, with one syslog line for each such name in the life of the
+// process, and makes no path from it.
 #ifndef VORN_REPORT_H
 #define VORN_REPORT_H
 
@@ -47,7 +48,8 @@ int VornQazInitLocation(VLIBCSzHash** hash, int flags);
 // With `for_report` 1 the caller holds the profile: what a killed run of it left behind is removed,
 // the folders are made, and the run's temporary names in /tmp are taken (made anew, empty, mode
 // 0600, so that nobody else's file or link can stand there). With 0 nothing on disk changes.
-// 0, or -1 with one syslog line.
+// 0, or -1 with one syslog line; with `for_report` 1 also when share.conf can't be read,
+// since the report would be empty and look like a good one.
 int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report);
 
 // Removes what an unfinished run of `profile` left: its `.partial` folders, its statistics database
@@ -63,7 +65,9 @@ int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash);
 int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key);
 
 // Copies the profile's language code (key `language`, default "en") into `code`. Only letters,
-// digits and '-' pass, at most `size` - 1 bytes. 0, or -1 with one syslog line.
+// digits and '-' pass, at most `size` - 1 bytes and not beginning with '-'; anything else is one
+// syslog line and "en", so that no report is lost over it. 0, or -1 for a null argument or a `code`
+// that "en" doesn't fit.
 int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size);
 
 // Non-zero when the profile selects `share`: its key `share_list` (names separated by commas) is
