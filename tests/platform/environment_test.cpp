@@ -1,5 +1,4 @@
 // The process as it is prepared, and SQLite's memory in it.
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 #include <sys/resource.h>
@@ -12,6 +11,7 @@
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <random>
 #include <vector>
 
@@ -23,124 +23,92 @@ extern char** environ;
 
 namespace {
 
+const sqlite3_mem_methods& memory = host::sqlite_memory;
+
 TEST(SetEnv, PreparesAProcessStartedAnyhow) {
-  const pid_t child = support::fork_child([] {
+  EXPECT_TRUE(support::passes_in_child([] {
     setenv("LD_PRELOAD_X", "1", 1);
     setenv("TZ", "XXX-5", 1);
     close(STDIN_FILENO);
-    close(STDOUT_FILENO);
     rlimit limit{};
     getrlimit(RLIMIT_NOFILE, &limit);
     limit.rlim_cur = 256;
     setrlimit(RLIMIT_NOFILE, &limit);
     errno = 77;
     VornQazSetEnv();
-    if (errno != 77) {
-      return 2;
-    }
+    EXPECT_EQ(77, errno);
     std::vector<std::string> variables;
     for (char** entry = environ; *entry != nullptr; ++entry) {
       variables.emplace_back(*entry);
     }
     std::sort(variables.begin(), variables.end());
-    if (variables != std::vector<std::string>{"HOME=/", "LC_ALL=C.UTF-8",
-                                              "PATH=/usr/sbin:/usr/bin:/sbin:/bin"}) {
-      return 3;
-    }
-    struct stat null_device {};
-    struct stat output {};
-    stat("/dev/null", &null_device);
-    if (fstat(STDOUT_FILENO, &output) != 0 || output.st_rdev != null_device.st_rdev ||
-        fcntl(STDIN_FILENO, F_GETFD) != 0) {
-      return 4;
-    }
+    EXPECT_EQ((std::vector<std::string>{"HOME=/", "LC_ALL=C.UTF-8",
+                                        "PATH=/usr/sbin:/usr/bin:/sbin:/bin"}),
+              variables);
+    EXPECT_EQ("/dev/null", std::filesystem::read_symlink("/proc/self/fd/0"));
     getrlimit(RLIMIT_NOFILE, &limit);
-    if (limit.rlim_cur < std::min<rlim_t>(limit.rlim_max, 8192)) {
-      return 5;
-    }
-    if (umask(0) != 027 || std::signal(SIGPIPE, SIG_DFL) != SIG_IGN) {
-      return 6;
-    }
-    umask(0);
+    EXPECT_GE(limit.rlim_cur, std::min<rlim_t>(limit.rlim_max, 8192));
+    EXPECT_EQ(SIG_IGN, std::signal(SIGPIPE, SIG_DFL));
+    EXPECT_EQ(027U, umask(0));
     VornQazSetEnv();  // once and never again
-    return umask(0) == 0 ? 0 : 7;
-  });
-  EXPECT_EQ(0, support::wait_child(child));
+    EXPECT_EQ(0U, umask(0));
+  }));
 }
 
 struct Block {
-  void* memory;
+  unsigned char* bytes;
   int size;
   unsigned char fill;
+  bool intact() const {
+    return std::all_of(bytes, bytes + size, [this](unsigned char c) { return c == fill; });
+  }
 };
 
-bool intact(const Block& block) {
-  const auto* bytes = static_cast<unsigned char*>(block.memory);
-  return std::all_of(bytes, bytes + block.size, [&](unsigned char c) { return c == block.fill; });
-}
-
-// Up to 128 KiB, more often small than large.
-int random_size(std::mt19937& random) {
-  const int bits = static_cast<int>(random() % 17);
-  return 1 + static_cast<int>(random() % (2U << bits));
-}
-
 TEST(SqliteMemory, KeepsEveryByteOfEveryBlock) {
-  const sqlite3_mem_methods& memory = host::sqlite_memory;
   std::mt19937 random(20240229);
-  std::vector<Block> blocks;
+  std::vector<Block> blocks(500);
   for (int step = 0; step < 20'000; ++step) {
-    const int size = random_size(random);
+    // Up to 128 KiB, more often small than large.
+    const int size = 1 + static_cast<int>(random() % (2U << (random() % 17)));
     const auto fill = static_cast<unsigned char>(random());
-    const std::size_t chosen = random() % 500;
-    if (chosen >= blocks.size()) {
-      blocks.push_back({memory.xMalloc(memory.xRoundup(size)), size, fill});
+    Block& block = blocks[random() % blocks.size()];
+    ASSERT_TRUE(block.intact()) << "of " << block.size << " bytes";
+    void* changed = nullptr;
+    if (block.bytes != nullptr && random() % 2 == 0) {
+      changed = memory.xRealloc(block.bytes, memory.xRoundup(size));
+      block = {static_cast<unsigned char*>(changed), std::min(size, block.size), block.fill};
+      ASSERT_TRUE(block.intact()) << "moved to " << size << " bytes";
     } else {
-      Block& block = blocks[chosen];
-      ASSERT_TRUE(intact(block)) << "of " << block.size << " bytes";
-      if (random() % 2 == 0) {
-        memory.xFree(block.memory);
-        block = {memory.xMalloc(size), size, fill};
-      } else {
-        block.memory = memory.xRealloc(block.memory, memory.xRoundup(size));
-        block.size = std::min(size, block.size);
-        ASSERT_TRUE(intact(block)) << "moved to " << size << " bytes";
-        block = {block.memory, size, fill};
-      }
+      memory.xFree(block.bytes);
+      changed = memory.xMalloc(random() % 2 == 0 ? memory.xRoundup(size) : size);
     }
-    const Block& changed = blocks[std::min(chosen, blocks.size() - 1)];
-    ASSERT_EQ(0U, reinterpret_cast<std::uintptr_t>(changed.memory) % 8);
-    ASSERT_GE(memory.xSize(changed.memory), size);
-    std::memset(changed.memory, fill, static_cast<std::size_t>(size));
+    ASSERT_EQ(0U, reinterpret_cast<std::uintptr_t>(changed) % 8);
+    ASSERT_GE(memory.xSize(changed), size);
+    std::memset(changed, fill, static_cast<std::size_t>(size));
+    block = {static_cast<unsigned char*>(changed), size, fill};
   }
   for (const Block& block : blocks) {
-    EXPECT_TRUE(intact(block));
-    memory.xFree(block.memory);
+    EXPECT_TRUE(block.intact());
+    memory.xFree(block.bytes);
   }
 }
 
 TEST(SqliteMemory, UsesFreedBlocksAgain) {
-  const pid_t child = support::fork_child([] {
-    const sqlite3_mem_methods& memory = host::sqlite_memory;
-    rusage first{};
-    std::vector<void*> blocks;
+  EXPECT_TRUE(support::passes_in_child([] {
+    rusage usage{};
+    long early = 0;
     for (int round = 0; round < 200; ++round) {
-      blocks.clear();
+      std::vector<void*> blocks;
       for (int size = 1; size <= 16000; size += 16) {
         blocks.push_back(memory.xRealloc(memory.xMalloc(size), size + round));
         std::memset(blocks.back(), 1, static_cast<std::size_t>(size));
       }
       std::for_each(blocks.begin(), blocks.end(), memory.xFree);
-      if (round == 10) {
-        getrusage(RUSAGE_SELF, &first);
-      }
+      getrusage(RUSAGE_SELF, &usage);
+      early = round == 10 ? usage.ru_maxrss : early;
     }
-    rusage last{};
-    getrusage(RUSAGE_SELF, &last);
-    constexpr long kBoundKiB = 4096;  // a round takes twice that
-    return last.ru_maxrss - first.ru_maxrss < kBoundKiB ? 0 : 1;
-  });
-  EXPECT_EQ(0, support::wait_child(child));
+    EXPECT_LT(usage.ru_maxrss - early, 4096) << "a round takes twice that";
+  }));
 }
 
 }  // namespace
