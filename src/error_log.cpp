@@ -58,6 +58,7 @@ void REPORT_LOG_ERR_NESTED(const char* module, int line, const char* format, ...
   std::snprintf(position, sizeof position, "(%s:%d)(%m)", module, line);
   va_list args;
   va_start(args, format);
+  errno = error;
   const std::string message = position + format_text(format, args) + "\n\n";
   va_end(args);
   errno = error;

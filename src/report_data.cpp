@@ -20,11 +20,16 @@ PathText report_data_path() {
   return path;
 }
 
-FileHandle open_report_file(const char* path, const char* mode, const char* module, int line) {
+FileHandle open_report_file(const char* path, const char* mode, const char* module, int line,
+                            LogForm form) {
   FileHandle file(std::fopen(path, mode));
   if (!file) {
     const bool no_room = errno == ENOSPC || errno == EDQUOT || errno == EIO || errno == EROFS;
-    REPORT_LOG_ERR_NESTED(module, line, "open file=%s failed", path);
+    if (form == LogForm::kNested) {
+      REPORT_LOG_ERR_NESTED(module, line, "open file=%s failed", path);
+    } else {
+      REPORT_LOG_ERR(module, line, "open file=%s failed\n", path);
+    }
     if (no_room) {
       mark_report_data_lost();
     }

@@ -3,10 +3,11 @@
 #include <sqlite3.h>
 
 #include <array>
-#include <string_view>
+#include <cstdlib>
 #include <utility>
 
 #include "vorn/report.h"
+#include "vorn/user.h"
 #include "vorn/volume.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
@@ -25,12 +26,8 @@ using ColumnBuffer = std::array<char, 8192>;
 struct RowValues {
   std::array<const char*, kMostColumns> text{};
   std::array<char, kVolumeIdSize> volume_id{};
+  UserHandle owner;
 };
-
-bool args_are_complete(const ReportArgs* args) {
-  return args != nullptr && !is_unset(args->profile) && args->profile_hash != nullptr &&
-         args->user_hash != nullptr && args->volume_hash != nullptr && args->share_hash != nullptr;
-}
 
 // The identifier of the share's volume, empty (and logged) when the platform has none; null, which
 // leaves the row out, when the share has no volume.
@@ -48,43 +45,45 @@ const char* share_volume(const report_row_ctx& ctx, const char* share,
   return id.data();
 }
 
+// The account name of a user id; null, which leaves the row out, when there is none (logged) or the
+// user filter lacks it.
+const char* owner_name(const report_row_ctx& ctx, const char* uid, UserHandle& owner) {
+  VORNUser* user = nullptr;
+  const auto id = static_cast<uid_t>(std::strtoul(uid, nullptr, 10));
+  const int found = VORNUserGetByUID(id, &user);
+  owner.reset(user);
+  if (found < 0 || user == nullptr || is_unset(user->name)) {
+    REPORT_LOG_ERR_NESTED(ctx.report->module, __LINE__, "get user name failed");
+    return nullptr;
+  }
+  return VLIBCSzHashGetValue(ctx.filter_user, user->name) != nullptr ? user->name : nullptr;
+}
+
+const char* column_value(const report_row_ctx& ctx, const ReportColumn& column, const char* value,
+                         RowValues& row) {
+  switch (column.source) {
+    case ColumnSource::kShareVolume:
+      return share_volume(ctx, value, row.volume_id);
+    case ColumnSource::kOwnerName:
+      return owner_name(ctx, value, row.owner);
+    case ColumnSource::kQuery:
+      break;
+  }
+  return value;
+}
+
 // False when the row is left out.
 bool resolve_values(const report_row_ctx& ctx, char* const* query_values, RowValues& row) {
   size_t place = 0;
   for (const ReportColumn& column : ctx.report->columns) {
-    const char* value = query_values[column.index];
-    value = value != nullptr ? value : "";
-    if (column.source == ColumnSource::kShareVolume) {
-      value = share_volume(ctx, value, row.volume_id);
-      if (value == nullptr) {
-        return false;
-      }
+    const char* given = query_values[column.index];
+    const char* value = column_value(ctx, column, given != nullptr ? given : "", row);
+    if (value == nullptr) {
+      return false;
     }
     row.text[place++] = value;
   }
   return true;
-}
-
-void write_data_value(const report_row_ctx& ctx, const ReportColumn& column, const char* value) {
-  if (column.data_text != ColumnText::kEscaped) {
-    std::fputs(value, ctx.data_fp);
-    return;
-  }
-  static ColumnBuffer escaped;
-  if (VornQazEscChar(value, escaped.data(), escaped.size(), '\'') < 0) {
-    REPORT_LOG_ERR(ctx.report->module, __LINE__, "escape file failed, file=%s\n", escaped.data());
-    return;
-  }
-  std::fputs(escaped.data(), ctx.data_fp);
-}
-
-void write_csv_value(const report_row_ctx& ctx, const ReportColumn& column, const char* value) {
-  static ColumnBuffer field;
-  if (column.csv_text == ColumnText::kField &&
-      VornQazFormatCsvString(value, field.data(), field.size()) >= 0) {
-    value = field.data();
-  }
-  std::fputs(value, ctx.csv_fp);
 }
 
 void write_data_row(const report_row_ctx& ctx, const RowValues& row) {
@@ -98,7 +97,7 @@ void write_data_row(const report_row_ctx& ctx, const RowValues& row) {
   size_t place = 0;
   for (const ReportColumn& column : ctx.report->columns) {
     std::fputs(before, ctx.data_fp);
-    write_data_value(ctx, column, row.text[place++]);
+    write_data_text(ctx.data_fp, column.data_text, row.text[place++], ctx.report->module);
     std::fputc('\'', ctx.data_fp);
     before = ", '";
   }
@@ -110,7 +109,7 @@ void write_csv_row(const report_row_ctx& ctx, const RowValues& row) {
   size_t place = 0;
   for (const ReportColumn& column : ctx.report->columns) {
     std::fputs(before, ctx.csv_fp);
-    write_csv_value(ctx, column, row.text[place++]);
+    write_csv_text(ctx.csv_fp, column.csv_text, row.text[place++], ctx.report->module);
     std::fputc('"', ctx.csv_fp);
     before = "\t\"";
   }
@@ -175,7 +174,7 @@ int32_t write_rows(const StatisticsReport& report, sqlite3* db, report_row_ctx& 
                    bool is_embedded) {
   VornQazSetEnv();
   char* message = nullptr;
-  const int result = sqlite3_exec(db, report.sql, report_row_writer, &ctx, &message);
+  const int result = sqlite3_exec(db, report.sql, report.row_writer, &ctx, &message);
   if (result != SQLITE_OK) {
     const SqliteText owned(message);
     REPORT_LOG_ERR(report.module, __LINE__, "Exec sql:[%s] error: %s\n\n", report.sql,
@@ -194,7 +193,47 @@ int32_t write_rows(const StatisticsReport& report, sqlite3* db, report_row_ctx& 
   return 0;
 }
 
+// `seconds` as local time; null, logged, when it has none.
+const char* local_time(const char* seconds, std::array<char, 128>& buffer, const char* module) {
+  if (VornQazTimeConvert(seconds, buffer.data(), buffer.size()) < 0 || buffer[0] == '\0') {
+    REPORT_LOG_ERR(module, __LINE__, "translate time format error, time=%s\n", seconds);
+    return nullptr;
+  }
+  return buffer.data();
+}
+
 }  // namespace
+
+bool args_are_complete(const ReportArgs* args) {
+  return args != nullptr && !is_unset(args->profile) && args->profile_hash != nullptr &&
+         args->user_hash != nullptr && args->volume_hash != nullptr && args->share_hash != nullptr;
+}
+
+void write_data_text(FILE* data, ColumnText text, const char* value, const char* module) {
+  static ColumnBuffer escaped;
+  if (text == ColumnText::kEscaped) {
+    if (VornQazEscChar(value, escaped.data(), escaped.size(), '\'') < 0) {
+      REPORT_LOG_ERR(module, __LINE__, "escape file failed, file=%s\n", escaped.data());
+      return;
+    }
+    value = escaped.data();
+  }
+  std::fputs(value, data);
+}
+
+void write_csv_text(FILE* csv, ColumnText text, const char* value, const char* module) {
+  static ColumnBuffer field;
+  std::array<char, 128> time{};
+  if (text == ColumnText::kTime) {
+    value = local_time(value, time, module);
+  } else if (text == ColumnText::kField &&
+             VornQazFormatCsvString(value, field.data(), field.size()) >= 0) {
+    value = field.data();
+  }
+  if (value != nullptr) {
+    std::fputs(value, csv);
+  }
+}
 
 int report_row_writer(void* context, int /*columns*/, char** values, char** names) noexcept {
   auto* ctx = static_cast<report_row_ctx*>(context);

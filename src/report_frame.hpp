@@ -28,6 +28,8 @@ enum class ColumnSource : uint8_t {
   kQuery,        // the query's column `index`
   kShareVolume,  // identifier of the volume that holds the share named in query column `index`;
                  // a share without a volume has no row
+  kOwnerName,  // account name of the user id in query column `index`; an owner without account, or
+               // outside the user filter, has no row
 };
 
 // How a value is written.
@@ -35,6 +37,7 @@ enum class ColumnText : uint8_t {
   kRaw,      // as it is
   kEscaped,  // data file: escaped for a single-quoted string; empty, and logged, when that fails
   kField,    // CSV: formatted for a quoted field; raw when that fails
+  kTime,     // CSV: seconds since the epoch as local time; empty, and logged, when that fails
 };
 
 struct ReportColumn {
@@ -55,12 +58,24 @@ constexpr ReportColumn path_column(int index) {
 constexpr ReportColumn field_column(int index) {
   return {ColumnSource::kQuery, index, ColumnText::kRaw, ColumnText::kField};
 }
+constexpr ReportColumn time_column(int index) {
+  return {ColumnSource::kQuery, index, ColumnText::kRaw, ColumnText::kTime};
+}
+constexpr ReportColumn owner_column(int index) {
+  return {ColumnSource::kOwnerName, index, ColumnText::kRaw, ColumnText::kRaw};
+}
 constexpr ReportColumn share_volume_column(int index) {
   return {ColumnSource::kShareVolume, index, ColumnText::kRaw, ColumnText::kRaw};
 }
 
 // Whether the folders of all shares are written to the page before the first row.
 enum class SharePaths : uint8_t { kLeftOut, kImported };
+
+// An sqlite3_exec callback over a report_row_ctx. 0 to go on, -1 to stop the query.
+using RowWriter = int (*)(void* context, int columns, char** values, char** names);
+
+// The row writer of every report that doesn't bring its own.
+int report_row_writer(void* context, int columns, char** values, char** names) noexcept;
 
 // One report.
 struct StatisticsReport {
@@ -73,6 +88,7 @@ struct StatisticsReport {
   uint64_t csv_limit;      // rows for the CSV file; 0: all
   SharePaths share_paths;
   std::span<const ReportColumn> columns;
+  RowWriter row_writer = report_row_writer;
 };
 
 // The context of a row writer, which SQLite hands through.
@@ -96,7 +112,12 @@ struct report_row_ctx {
 // file is not finished.
 int32_t run_statistics_report(const StatisticsReport& report, const ReportArgs* args);
 
-// The row writer: an sqlite3_exec callback over a report_row_ctx. 0 to go on, -1 to stop the query.
-int report_row_writer(void* context, int columns, char** values, char** names) noexcept;
+// The argument check that every report begins with.
+bool args_are_complete(const ReportArgs* args);
+
+// Writes `value` as a path of the page (ColumnText::kEscaped) or as a field of the CSV file
+// (kField, kTime, kRaw), without quotes around it.
+void write_data_text(FILE* data, ColumnText text, const char* value, const char* module);
+void write_csv_text(FILE* csv, ColumnText text, const char* value, const char* module);
 
 }  // namespace vornreport

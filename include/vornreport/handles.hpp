@@ -9,6 +9,8 @@
 #include <memory>
 
 #include "vorn/text.h"
+#include "vorn/user.h"
+#include "vorn/volume.h"
 
 namespace vornreport {
 
@@ -16,7 +18,7 @@ template <auto Release>
 struct ReleaseWith {
   template <typename T>
   void operator()(T* handle) const noexcept {
-    static_cast<void>(Release(handle));
+    static_cast<void>(Release(handle));  // whatever it returns: there is nobody left to tell
   }
 };
 
@@ -25,6 +27,8 @@ using SqliteText = std::unique_ptr<char, ReleaseWith<&sqlite3_free>>;
 using FileHandle = std::unique_ptr<FILE, ReleaseWith<&std::fclose>>;
 using DirHandle = std::unique_ptr<DIR, ReleaseWith<&closedir>>;
 using HashHandle = std::unique_ptr<VLIBCSzHash, ReleaseWith<&VLIBCSzHashFree>>;
+using UserHandle = std::unique_ptr<VORNUser, ReleaseWith<&VORNUserFree>>;
+using VolumesHandle = std::unique_ptr<VORNMountVolInfo, ReleaseWith<&VORNMountVolInfoFree>>;
 using ListHandle = std::unique_ptr<VLIBCSzList, ReleaseWith<&VLIBCSzListFree>>;
 
 // Runs a platform call that fills or replaces a hash or list through its address:

@@ -3,6 +3,7 @@
 // lost on the way to the page.
 #pragma once
 
+#include <cstdint>
 #include <cstdio>
 
 #include "vornreport/fixed_text.hpp"
@@ -13,9 +14,11 @@ namespace vornreport {
 // The data file's path for this process.
 PathText report_data_path();
 
-// Opens a file for appending or writing and logs "open file=%s failed" (nested form, `module`,
-// `line`) when that fails; when the disk is the reason, the run's data counts as lost.
-FileHandle open_report_file(const char* path, const char* mode, const char* module, int line);
+// Opens a file for appending or writing and logs "open file=%s failed" at `module`
+// and `line` when that fails; when the disk is the reason, the run's data counts as lost.
+enum class LogForm : uint8_t { kSimple, kNested };
+FileHandle open_report_file(const char* path, const char* mode, const char* module, int line,
+                            LogForm form = LogForm::kNested);
 
 // Closes a file that rows went to. When a write or the close failed (a full disk), logs it, marks
 // the run's data as lost and returns false. An empty handle is fine.

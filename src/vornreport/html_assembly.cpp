@@ -27,9 +27,10 @@ int build_sections(const char* report_list, const char* data_path, const char* b
     report_trace(kDriverModule, 169, "build report=%s\n\n", entry.name);
     ++count;
     if (count == 1) {
-      run_command(171, VORN_PATH_TEMPLATE_SCRIPT " header %s %s", data_path, entry.name);
+      run_command(kDriverModule, 171, VORN_PATH_TEMPLATE_SCRIPT " header %s %s", data_path,
+                  entry.name);
     }
-    run_command(173, VORN_PATH_TEMPLATE_SCRIPT " body %s %s", body_path, entry.name);
+    run_command(kDriverModule, 173, VORN_PATH_TEMPLATE_SCRIPT " body %s %s", body_path, entry.name);
   }
   return count;
 }
@@ -48,11 +49,11 @@ int build_report_html(const char* profile, const VLIBCSzHash* profile_hash, cons
   }
   FixedText<512> body;
   body.format(VORN_TMP_BODY_FORMAT, static_cast<unsigned>(getpid()));
-  run_command(165, VORN_PATH_TEMPLATE_SCRIPT " body   %s", body.c_str());
+  run_command(kDriverModule, 165, VORN_PATH_TEMPLATE_SCRIPT " body   %s", body.c_str());
   const int count = build_sections(report_list, data_path, body.c_str());
-  run_command(179, VORN_PATH_TEMPLATE_SCRIPT " tail %s", body.c_str());
-  run_command(182, "/bin/cat %s >> %s", body.c_str(), data_path);
-  run_command(183, "/bin/rm -f %s", body.c_str());
+  run_command(kDriverModule, 179, VORN_PATH_TEMPLATE_SCRIPT " tail %s", body.c_str());
+  run_command(kDriverModule, 182, "/bin/cat %s >> %s", body.c_str(), data_path);
+  run_command(kDriverModule, 183, "/bin/rm -f %s", body.c_str());
 
   const char* template_dir = set_value(profile_hash, "real_path_template");
   if (template_dir == nullptr) {
@@ -65,10 +66,10 @@ int build_report_html(const char* profile, const VLIBCSzHash* profile_hash, cons
     return -1;
   }
   if (!is_link(template_dir)) {
-    run_command(200, "/bin/rm -rf '%s'", template_dir);
-    run_command(201, "/bin/cp -rfp %s '%s'", VORN_PATH_TEMPLATE, template_dir);
+    run_command(kDriverModule, 200, "/bin/rm -rf '%s'", template_dir);
+    run_command(kDriverModule, 201, "/bin/cp -rfp %s '%s'", VORN_PATH_TEMPLATE, template_dir);
   }
-  run_command(204, "/bin/mv %s '%s/'report.html", data_path, date_dir);
+  run_command(kDriverModule, 204, "/bin/mv %s '%s/'report.html", data_path, date_dir);
   return count;
 }
 

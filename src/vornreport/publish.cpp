@@ -24,7 +24,7 @@ int correct_report_dir(const char* profile, const VLIBCSzHash* profile_hash) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 101, "get report correct dir failed");
     return -1;
   }
-  run_command(107, "/bin/mv %s %s", quoted_working.data(), quoted_final.data());
+  run_command(kDriverModule, 107, "/bin/mv %s %s", quoted_working.data(), quoted_final.data());
   return 0;
 }
 

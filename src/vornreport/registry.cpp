@@ -10,15 +10,28 @@
 #include <cstring>
 #include <string_view>
 
+#include "rep_duplicate_file/duplicate_file.hpp"
+#include "rep_file_group.hpp"
+#include "rep_file_owner.hpp"
 #include "rep_large_file.hpp"
+#include "rep_modify_time.hpp"
+#include "rep_quota_usage.hpp"
 #include "rep_share_list.hpp"
+#include "rep_volume_usage.hpp"
 
 namespace vornreport {
 namespace {
 
-constexpr std::array<ReportEntry, 2> kRegistry{{
+constexpr std::array<ReportEntry, 9> kRegistry{{
+    {"quota_usage", ReportSource::kSystem, quota_usage, nullptr},
+    {"file_owner", ReportSource::kStatistics, file_owner_db, nullptr},
+    {"volume_usage", ReportSource::kSystem, volume_usage, volume_usage_collect_data},
     {"share_list", ReportSource::kStatistics, share_list_db, nullptr},
+    {"file_group", ReportSource::kStatistics, file_group_db, nullptr},
+    {"duplicate_file", ReportSource::kStatistics, duplicate_file, nullptr},
     {"large_file", ReportSource::kStatistics, large_file_db, nullptr},
+    {"least_modify", ReportSource::kStatistics, least_modify_db, nullptr},
+    {"most_modify", ReportSource::kStatistics, most_modify_db, nullptr},
 }};
 
 // Selection looks for a name anywhere in the list, so a name inside another would be selected with

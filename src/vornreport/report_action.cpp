@@ -121,14 +121,15 @@ int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, cha
     return -1;
   }
   std::snprintf(out_path, static_cast<size_t>(out_size), "%s", report_data_path().c_str());
-  run_command(238, VORN_PATH_TEMPLATE_SCRIPT " header %s", out_path);
+  run_command(kDriverModule, 238, VORN_PATH_TEMPLATE_SCRIPT " header %s", out_path);
   std::array<char, 8> language{};
   if (VornQazImportLang(profile_hash, language.data(), language.size()) < 0 ||
       is_unset(language.data())) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 241, "Failed to setting language");
     return -1;
   }
-  run_command(244, VORN_PATH_TEMPLATE_SCRIPT " lang %s %s", out_path, language.data());
+  run_command(kDriverModule, 244, VORN_PATH_TEMPLATE_SCRIPT " lang %s %s", out_path,
+              language.data());
   gather_when_needed(profile, profile_hash, report_list);
   if (!load_volumes_and_shares(look_ups)) {
     return -1;

@@ -22,7 +22,7 @@ void remove_all_statistics(const VLIBCSzHash* locations) {
     REPORT_LOG_ERR(kDriverModule, __LINE__, "get base path failed\n");
     return;
   }
-  run_command(480, "/bin/rm -f %s/%s.*", base.data(), "stat.db");
+  run_command(kDriverModule, 480, "/bin/rm -f %s/%s.*", base.data(), "stat.db");
 }
 
 }  // namespace
