@@ -1,0 +1,193 @@
+#include "candidate.hpp"
+
+#include <fcntl.h>
+#include <linux/openat2.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+#include <xxhash.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <new>
+#include <string_view>
+#include <unordered_set>
+
+#include "module.hpp"
+#include "vorn/report.h"
+#include "vornreport/error_log.hpp"
+
+namespace vornreport {
+namespace {
+
+enum Column { kShare, kPath, kSize, kModifyTime };
+constexpr size_t kLongestText = 4095;
+
+class Descriptor {
+ public:
+  explicit Descriptor(int fd) : fd_(fd) {}
+  ~Descriptor() {
+    if (fd_ >= 0) {
+      close(fd_);
+    }
+  }
+  Descriptor(const Descriptor&) = delete;
+  Descriptor& operator=(const Descriptor&) = delete;
+  int get() const { return fd_; }
+
+ private:
+  int fd_;
+};
+
+// There are few shares and many files.
+const char* interned(const char* text) {
+  static std::unordered_set<std::string> texts;
+  return texts.emplace(text, 0, kLongestText).first->c_str();
+}
+
+// Opens a gathered file as the walk found it: below its share's folder and through no link, so that
+// a user who has put a link in its way since can't have another file read. Doesn't wait for the
+// writer of a fifo. Errors as open().
+int open_gathered(const dup_file_node& file) {
+  constexpr uint64_t kFlags = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
+  const std::string_view folder = file.share_folder != nullptr ? file.share_folder : "";
+  const std::string_view path = file.path;
+  const Descriptor top(folder.empty() ? -1 : open(file.share_folder, O_PATH | O_CLOEXEC));
+  if (top.get() < 0 || !path.starts_with(folder) || path.size() <= folder.size() + 1) {
+    return open(file.path.c_str(), static_cast<int>(kFlags));
+  }
+  open_how how{};
+  how.flags = kFlags;
+  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
+  const char* below = file.path.c_str() + folder.size();
+  while (*below == '/') {
+    ++below;
+  }
+  return static_cast<int>(syscall(SYS_openat2, top.get(), below, &how, sizeof how));
+}
+
+void log_open_failure(const dup_file_node& file) {
+  if (errno == ENOENT) {
+    report_trace(kDuplicateModule, __LINE__, "open file failed, file=%s,(%d)%m\n",
+                 file.path.c_str(), errno);
+  } else {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "open file failed, file=%s,(%d)%m",
+                          file.path.c_str(), errno);
+  }
+}
+
+// The sample's bytes, zeros where there are none. Read, not mapped: a file that shrinks meanwhile
+// must not end the process.
+void read_sample(const dup_file_node& file, std::array<char, kSampleSize>& sample) {
+  const uint64_t length = std::min(file.size, kSampleSize);
+  const uint64_t offset = file.size <= kSampleSize ? 0 : file.size / 2 / kSampleSize * kSampleSize;
+  sample.fill(0);
+  const Descriptor opened(open_gathered(file));
+  if (opened.get() < 0) {
+    log_open_failure(file);
+    return;
+  }
+  struct stat status {};
+  if (fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
+      pread(opened.get(), sample.data(), length, static_cast<off_t>(offset)) < 0) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__,
+                          "map file failed, file=%s, nSeg=%llu, offset=%llu", file.path.c_str(),
+                          static_cast<unsigned long long>(length),
+                          static_cast<unsigned long long>(offset));
+  }
+}
+
+// False, reported, when the file's digest can't be had.
+bool ensure_digest(dup_file_node& file) {
+  if (file.digest_done) {
+    return true;
+  }
+  const int result =
+      VornQazGetFileMd5(file.path.c_str(), file.size, file.md5.data(), file.md5.size());
+  if (result == 0) {
+    file.digest_done = true;
+    return true;
+  }
+  const auto size = static_cast<unsigned long long>(file.size);
+  if (result == 2) {
+    report_trace(kDuplicateModule, __LINE__, "count md5 failed, file=%s, size=%llu\n",
+                 file.path.c_str(), size);
+  } else {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "count md5 failed, file=%s, size=%llu",
+                          file.path.c_str(), size);
+  }
+  return false;
+}
+
+void delete_file(void* data) {
+  delete static_cast<dup_file_node*>(data);
+}
+void keep_file(void* /*data*/) {}  // a group's members are the candidate list's
+
+}  // namespace
+
+int add_candidate(QAZLLNode** candidates, char* const* columns, int32_t ordinal,
+                  const char* share_folder) {
+  if (candidates == nullptr || columns == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
+    return -1;
+  }
+  const auto text = [&](Column column) {
+    return columns[column] != nullptr ? columns[column] : "";
+  };
+  std::unique_ptr<dup_file_node> file(new (std::nothrow) dup_file_node{});
+  if (!file) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "memory allocate failed");
+    return -1;
+  }
+  file->share = interned(text(kShare));
+  file->path.assign(text(kPath), 0, kLongestText);
+  file->size = std::strtoull(text(kSize), nullptr, 10);
+  file->mtime = static_cast<int32_t>(std::strtoll(text(kModifyTime), nullptr, 10));
+  file->ordinal = ordinal;
+  file->share_folder = share_folder;
+  if (QAZLLadd(candidates, file.get(), nullptr) < 0) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "add list failed");
+    return -1;
+  }
+  static_cast<void>(file.release());
+  return 0;
+}
+
+int read_fast_digests(const QAZLLNode* candidates) {
+  if (candidates == nullptr || candidates->data == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
+    return -1;
+  }
+  if (file_of(candidates)->size == 0) {
+    return 0;
+  }
+  static std::array<char, kSampleSize> sample;
+  for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
+    dup_file_node& file = *file_of(node);
+    read_sample(file, sample);
+    const XXH128_hash_t digest = XXH3_128bits(sample.data(), sample.size());
+    file.sample = {digest.high64, digest.low64};
+  }
+  return 0;
+}
+
+int compare_files(dup_file_node& a, dup_file_node& b) {
+  if (a.size == 0 && b.size == 0) {
+    return 0;
+  }
+  if (!ensure_digest(a) || !ensure_digest(b)) {
+    return -1;
+  }
+  return a.md5 == b.md5 ? 0 : 1;
+}
+
+void release_bucket(QAZLLNode** groups, QAZLLNode** candidates) {
+  QAZLLfree(groups, keep_file);
+  QAZLLfree(candidates, delete_file);
+}
+
+}  // namespace vornreport

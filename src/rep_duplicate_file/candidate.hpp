@@ -1,0 +1,60 @@
+// Files of one size whose contents are to be compared.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <string>
+
+#include "vorn/list.h"
+
+namespace vornreport {
+
+// A 128-bit digest of a sample. Equal samples have equal digests; that two others meet is as good
+// as impossible, and would cost one comparison of whole files.
+struct SampleDigest {
+  uint64_t high;
+  uint64_t low;
+  auto operator<=>(const SampleDigest&) const = default;
+};
+
+// One file. A bucket can hold a million of them, so a node holds real texts, not their widest
+// fields, and the members of a group are the candidates themselves, linked by `next`.
+struct dup_file_node {
+  uint64_t size;    // bytes
+  int32_t mtime;    // seconds since the epoch
+  int32_t ordinal;  // place in the size bucket, from 1
+  std::string path;
+  const char* share;         // interned for the life of the process
+  const char* share_folder;  // belongs to the share path hash; null when unknown
+  dup_file_node* next;       // the member of the group that was found before this one
+  SampleDigest sample;       // of 4096 bytes, filled up with zeros
+  std::array<char, 32> md5;  // hexadecimal digits, once `digest_done`
+  bool digest_done;
+  bool grouped;
+};
+
+// The file of a node of the candidate or the group list.
+inline dup_file_node* file_of(const QAZLLNode* node) {
+  return static_cast<dup_file_node*>(node->data);
+}
+
+// Bytes of a sample.
+inline constexpr uint64_t kSampleSize = 4096;
+
+// Makes a candidate of a row (share, path, size, modification time, file name) and appends it to
+// the list. 0, or -1 (logged).
+int add_candidate(QAZLLNode** candidates, char* const* columns, int32_t ordinal,
+                  const char* share_folder);
+
+// Reads the sample of every candidate: the whole file up to 4096 bytes, else 4096 bytes from its
+// middle. A file that can't be read (logged) keeps a sample of zeros. 0; -1 for an empty list.
+int read_fast_digests(const QAZLLNode* candidates);
+
+// Compares two files of one size by their MD5 digests, each of which is computed once. 0 when they
+// match, 1 when they differ, -1 (logged) when a digest can't be had.
+int compare_files(dup_file_node& a, dup_file_node& b);
+
+// Frees a bucket's lists; both are empty then.
+void release_bucket(QAZLLNode** groups, QAZLLNode** candidates);
+
+}  // namespace vornreport

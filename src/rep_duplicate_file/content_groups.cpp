@@ -1,0 +1,213 @@
+#include "content_groups.hpp"
+
+#include <algorithm>
+#include <numeric>
+#include <utility>
+#include <vector>
+
+#include "module.hpp"
+#include "vorn/report.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/fixed_text.hpp"
+#include "vornreport/handles.hpp"
+#include "vornreport/report_data.hpp"
+
+namespace vornreport {
+namespace {
+
+// Numbers that go on through the process.
+int32_t g_data_group = 1;  // of the next group for the page
+int32_t g_csv_group = 1;   // of the next group for the CSV file
+uint64_t g_digested = 0;   // files for which a digest was about to be computed
+uint64_t g_grouped = 0;    // files placed into groups
+
+// The candidates of a bucket, and for each the later ones with an equal sample, found by look-up:
+// comparing every pair's samples would be a million millions for a million files.
+class Bucket {
+ public:
+  explicit Bucket(const QAZLLNode* candidates) {
+    for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
+      files_.push_back(file_of(node));
+    }
+    by_sample_.resize(files_.size());
+    std::iota(by_sample_.begin(), by_sample_.end(), uint32_t{0});
+    // Stable: within one sample the list's order is kept.
+    std::stable_sort(by_sample_.begin(), by_sample_.end(), [this](uint32_t a, uint32_t b) {
+      return files_[a]->sample < files_[b]->sample;
+    });
+    place_.resize(files_.size());
+    for (uint32_t place = 0; place < by_sample_.size(); ++place) {
+      place_[by_sample_[place]] = place;
+    }
+  }
+
+  // Appends every group to `groups`, in the order of their first members.
+  void find_groups(QAZLLNode** groups) {
+    for (uint32_t first = 0; first < files_.size(); ++first) {
+      if (files_[first]->grouped) {
+        continue;
+      }
+      dup_file_node* chain = gather_matches(first);
+      if (chain != nullptr && QAZLLadd(groups, chain, nullptr) < 0) {
+        REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "add node failed");
+      }
+    }
+  }
+
+ private:
+  // The file and all later ones that match it, last match first; null when none does.
+  dup_file_node* gather_matches(uint32_t first) {
+    dup_file_node& a = *files_[first];
+    dup_file_node* chain = nullptr;
+    for (size_t place = place_[first] + size_t{1}; place < by_sample_.size(); ++place) {
+      dup_file_node& b = *files_[by_sample_[place]];
+      if (b.sample != a.sample) {
+        break;
+      }
+      if (b.grouped) {
+        continue;
+      }
+      g_digested += (a.digest_done ? 0U : 1U) + (b.digest_done ? 0U : 1U);
+      if (compare_files(a, b) != 0) {
+        report_trace(kDuplicateModule, __LINE__, "##### match(%llu/%llu), not match file=(%s,%s)\n",
+                     static_cast<unsigned long long>(g_grouped),
+                     static_cast<unsigned long long>(g_digested), a.path.c_str(), b.path.c_str());
+        continue;
+      }
+      if (!a.grouped) {
+        prepend(a, chain);
+      }
+      prepend(b, chain);
+    }
+    return chain;
+  }
+
+  static void prepend(dup_file_node& file, dup_file_node*& chain) {
+    ++g_grouped;
+    file.grouped = true;
+    file.next = chain;
+    chain = &file;
+  }
+
+  std::vector<dup_file_node*> files_;  // in list order
+  std::vector<uint32_t> by_sample_;    // indices of files_, by sample
+  std::vector<uint32_t> place_;        // of each file in by_sample_
+};
+
+void write_data_member(FILE* data, const dup_file_node& file, bool is_first) {
+  static std::array<char, 4096> path;
+  std::fputs(is_first ? "<script type='text/javascript'>\nvar vornDuplicateHashMatch = 1;\nvar "
+                        "vornDuplicateFileData = [\n"
+                      : ",\n",
+             data);
+  if (VornQazEscChar(file.path.c_str(), path.data(), path.size(), '\'') < 0) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "escape file failed, file=%s",
+                          file.path.c_str());
+    return;
+  }
+  std::fprintf(data, "[ '%d', '%s', '%s', %llu, %d ]", g_data_group, file.share, path.data(),
+               static_cast<unsigned long long>(file.size), file.mtime);
+}
+
+void write_csv_member(FILE* csv, const dup_file_node& file) {
+  static std::array<char, 8192> field;
+  const std::string seconds = std::to_string(file.mtime);
+  std::array<char, 128> time{};
+  const bool has_time =
+      VornQazTimeConvert(seconds.c_str(), time.data(), time.size()) >= 0 && time[0] != '\0';
+  const bool has_field = VornQazFormatCsvString(file.path.c_str(), field.data(), field.size()) >= 0;
+  std::fprintf(csv, "%d\t%s\t%s\t%llu\t%s\n", g_csv_group, file.share,
+               has_field ? field.data() : file.path.c_str(),
+               static_cast<unsigned long long>(file.size),
+               has_time ? time.data() : seconds.c_str());
+}
+
+}  // namespace
+
+int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups,
+                       QAZLLNode** candidates) {
+  if (profile_hash == nullptr || groups == nullptr || candidates == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
+    return -1;
+  }
+  int result = 0;
+  if (*candidates != nullptr) {
+    if (read_fast_digests(*candidates) < 0) {
+      REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "fast digest list failed");
+      result = -1;
+    } else {
+      Bucket(*candidates).find_groups(groups);
+      if (*groups != nullptr) {
+        write_data_groups(*groups, kMostDataGroups, GroupsAre::kContinued);
+        write_csv_groups(profile_hash, *groups, GroupsAre::kContinued);
+      }
+    }
+  }
+  release_bucket(groups, candidates);
+  return result;
+}
+
+int write_data_groups(const QAZLLNode* groups, int limit, GroupsAre close) {
+  const PathText path = report_data_path();
+  FileHandle data = open_report_file(path.c_str(), "a", kDuplicateModule, __LINE__);
+  if (!data) {
+    return -1;
+  }
+  int result = -1;
+  if (groups == nullptr || limit < 0) {
+    if (close == GroupsAre::kContinued) {
+      REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
+    }
+  } else {
+    for (; groups != nullptr && g_data_group <= limit; groups = groups->next, ++g_data_group) {
+      const dup_file_node* first = file_of(groups);
+      for (const dup_file_node* file = first; file != nullptr; file = file->next) {
+        write_data_member(data.get(), *file, g_data_group == 1 && file == first);
+      }
+    }
+    result = g_data_group;
+  }
+  if (close == GroupsAre::kComplete) {
+    std::fputs(g_data_group > 1 ? "\n];\n</script>\n" : "</script>\n", data.get());
+  }
+  return close_report_file(std::move(data), path.c_str(), kDuplicateModule, __LINE__) ? result : -1;
+}
+
+int write_csv_groups(const VLIBCSzHash* profile_hash, const QAZLLNode* groups, GroupsAre close) {
+  const char* csv_dir =
+      profile_hash != nullptr ? set_value(profile_hash, "real_path_csv") : nullptr;
+  PathText path;
+  FileHandle csv;
+  int result = -1;
+  if (csv_dir == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "get csv dir failed");
+  } else {
+    path.format("%s/%s.csv", csv_dir, "duplicate_file");
+    csv = open_report_file(path.c_str(), "a", kDuplicateModule, __LINE__, LogForm::kSimple);
+  }
+  if (csv && groups == nullptr) {
+    if (close == GroupsAre::kContinued) {
+      REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
+      return -1;
+    }
+  } else if (csv) {
+    if (g_csv_group == 1) {
+      std::fputs("Duplicate Group\tShare\tFile\tSize(Byte)\tModify Time\n", csv.get());
+    }
+    for (; groups != nullptr; groups = groups->next, ++g_csv_group) {
+      for (const dup_file_node* file = file_of(groups); file != nullptr; file = file->next) {
+        write_csv_member(csv.get(), *file);
+      }
+    }
+    result = 0;
+  }
+  if (!close_report_file(std::move(csv), path.c_str(), kDuplicateModule, __LINE__)) {
+    return -1;
+  }
+  if (close == GroupsAre::kComplete && g_csv_group > 1) {
+    VornQazCsvFile(path.c_str());
+  }
+  return result;
+}
+
+}  // namespace vornreport

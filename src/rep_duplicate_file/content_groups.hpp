@@ -1,0 +1,27 @@
+// Groups of files with equal content, found size bucket by size bucket and written at once.
+#pragma once
+
+#include "candidate.hpp"
+#include "vorn/list.h"
+#include "vorn/text.h"
+
+namespace vornreport {
+
+// The page shows this many groups; the CSV file all.
+inline constexpr int kMostDataGroups = 200;
+
+// Whether more groups may follow those of this call; when not, block and CSV file are closed.
+enum class GroupsAre : int { kContinued = 0, kComplete = 1 };
+
+// Finds the groups of the collected size bucket, writes them to the page and the CSV file, and
+// releases both lists. 0, also for an empty bucket; -1 (logged) when the samples could not be read.
+int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups, QAZLLNode** candidates);
+
+// Appends groups to the report data file, numbered through the process, up to number `limit`. The
+// next group's number, or -1 (logged).
+int write_data_groups(const QAZLLNode* groups, int limit, GroupsAre close);
+
+// Appends groups to the CSV file. 0 or -1 (logged).
+int write_csv_groups(const VLIBCSzHash* profile_hash, const QAZLLNode* groups, GroupsAre close);
+
+}  // namespace vornreport

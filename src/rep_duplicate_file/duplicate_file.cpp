@@ -1,0 +1,225 @@
+#include "rep_duplicate_file/duplicate_file.hpp"
+
+#include <strings.h>
+
+#include <string>
+
+#include "content_groups.hpp"
+#include "module.hpp"
+#include "report_frame.hpp"
+#include "vorn/list.h"
+#include "vorn/report.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/handles.hpp"
+
+namespace vornreport {
+namespace {
+
+enum Column { kShare, kPath, kSize, kModifyTime, kName };
+enum class Match { kUndecided = -1, kNameAndSize = 0, kContent = 1 };
+
+// What the row writer knows from row to row. It lives as long as the process.
+struct Grouping {
+  Match match = Match::kUndecided;
+  int32_t number = 0;  // of the group; by content: of the row in its size bucket
+  std::string size;    // of the row that last began a group or bucket, 127 bytes at most
+  std::string name;
+};
+Grouping g_grouping;
+
+constexpr size_t kLongestSize = 127;
+constexpr size_t kLongestName = 4095;
+
+const char* text_of(char* const* values, Column column) {
+  return values[column] != nullptr ? values[column] : "";
+}
+
+bool compares_content(const VLIBCSzHash* profile_hash) {
+  const char* value = VLIBCSzHashGetValue(profile_hash, "duplicate_compare");
+  return value != nullptr && strcasecmp(value, "true") == 0;
+}
+
+void decide_match(const VLIBCSzHash* profile_hash) {
+  if (g_grouping.match != Match::kUndecided) {
+    return;
+  }
+  if (compares_content(profile_hash)) {
+    g_grouping.match = Match::kContent;
+    report_trace(kDuplicateModule, __LINE__, "run full match\n");
+  } else {
+    g_grouping.match = Match::kNameAndSize;
+    report_trace(kDuplicateModule, __LINE__, "run partial match\n");
+  }
+}
+
+// Content mode: rows are collected until the size changes.
+void collect_row(const report_row_ctx& ctx, char* const* values) {
+  const std::string size(text_of(values, kSize), 0, kLongestSize);
+  if (size != g_grouping.size) {
+    if (!g_grouping.size.empty() &&
+        handle_size_bucket(ctx.profile_hash, ctx.dup_group_list, ctx.dup_list) < 0) {
+      REPORT_LOG_ERR(kDuplicateModule, __LINE__, "handle candidate error\n");
+    }
+    g_grouping.number = 0;
+    g_grouping.size = size;
+  }
+  ++g_grouping.number;
+  const char* share_folder = VLIBCSzHashGetValue(ctx.share_path_hash, text_of(values, kShare));
+  if (add_candidate(ctx.dup_list, values, g_grouping.number, share_folder) < 0) {
+    REPORT_LOG_ERR(kDuplicateModule, __LINE__, "add candidate error\n");
+  }
+}
+
+// Name-and-size mode: the query's order puts the members of a group one after another.
+void number_row(char* const* values) {
+  const char* size = text_of(values, kSize);
+  const char* name = text_of(values, kName);
+  if (g_grouping.size != size || g_grouping.name != name) {
+    g_grouping.size.assign(size, 0, kLongestSize);
+    g_grouping.name.assign(name, 0, kLongestName);
+    ++g_grouping.number;
+  }
+}
+
+bool within(uint64_t limit) {
+  return limit == 0 || static_cast<uint64_t>(g_grouping.number) <= limit;
+}
+
+void write_data_row(const report_row_ctx& ctx, char* const* values) {
+  if (ctx.row_count == 0) {
+    std::fprintf(ctx.data_fp,
+                 "<script type='text/javascript'>\nvar vornDuplicateHashMatch = 0;\nvar %s = [\n",
+                 ctx.report->variable);
+  } else {
+    std::fputs(",\n", ctx.data_fp);
+  }
+  std::fprintf(ctx.data_fp, "[ '%d'", g_grouping.number);
+  for (const Column column : {kShare, kPath, kSize, kModifyTime}) {
+    std::fputs(", '", ctx.data_fp);
+    write_data_text(ctx.data_fp, column == kPath ? ColumnText::kEscaped : ColumnText::kRaw,
+                    text_of(values, column), kDuplicateModule);
+    std::fputc('\'', ctx.data_fp);
+  }
+  std::fputs(" ]", ctx.data_fp);
+}
+
+void write_csv_row(const report_row_ctx& ctx, char* const* values) {
+  std::fprintf(ctx.csv_fp, "\"%d\"", g_grouping.number);
+  for (const Column column : {kShare, kPath, kSize, kModifyTime}) {
+    std::fputs("\t\"", ctx.csv_fp);
+    write_csv_text(ctx.csv_fp, column == kModifyTime ? ColumnText::kTime : ColumnText::kField,
+                   text_of(values, column), kDuplicateModule);
+    std::fputc('"', ctx.csv_fp);
+  }
+  std::fputc('\n', ctx.csv_fp);
+}
+
+int duplicate_row_writer(void* context, int /*columns*/, char** values, char** names) noexcept {
+  auto* ctx = static_cast<report_row_ctx*>(context);
+  if (ctx == nullptr || ctx->data_fp == nullptr || ctx->csv_fp == nullptr || values == nullptr ||
+      names == nullptr || ctx->profile_hash == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
+    return -1;
+  }
+  if (ctx->share_path_hash != nullptr) {
+    VornQazImportSharePathHash(ctx->share_path_hash, ctx->data_fp);
+  }
+  decide_match(ctx->profile_hash);
+  if (g_grouping.match == Match::kContent) {
+    collect_row(*ctx, values);
+    return 0;
+  }
+  number_row(values);
+  if (within(ctx->js_limit)) {
+    write_data_row(*ctx, values);
+  }
+  if (within(ctx->csv_limit)) {
+    write_csv_row(*ctx, values);
+  }
+  ++ctx->row_count;
+  return 0;
+}
+
+constexpr char kVariable[] = "vornDuplicateFileData";
+constexpr char kHeader[] = "Duplicate Group\tShare\tFile\tSize(Byte)\tModify Time";
+
+constexpr StatisticsReport kByNameAndSize{
+    .name = "duplicate_file",
+    .module = kDuplicateModule,
+    .sql =
+        "select share,path,size,mtime,filename from file_stat except select "
+        "share,path,size,mtime,filename from file_stat group by filename,size having "
+        "count(id)=1 order by size desc,filename;",
+    .variable = kVariable,
+    .csv_header = kHeader,
+    .js_limit = 200,  // groups
+    .csv_limit = 0,
+    .share_paths = SharePaths::kImported,
+    .columns = {},
+    .row_writer = duplicate_row_writer,
+};
+
+constexpr StatisticsReport kBySize{
+    .name = "duplicate_file",
+    .module = kDuplicateModule,
+    .sql =
+        "select share,path,size,mtime,filename from file_stat except select "
+        "share,path,size,mtime,filename from file_stat group by size having count(id)=1 order "
+        "by size desc;",
+    .variable = kVariable,
+    .csv_header = kHeader,
+    .js_limit = 500,  // without effect: the rows are collected, not written
+    .csv_limit = 0,
+    .share_paths = SharePaths::kImported,
+    .columns = {},
+    .row_writer = duplicate_row_writer,
+};
+
+int32_t report_by_content(ReportArgs& args) {
+  args.embedded = 1;  // header, closing tag and CSV finishing belong to the group writers
+  if (duplicate_file2_db(&args) < 0) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "duplicate_file_db failed");
+    return -1;
+  }
+  if (handle_size_bucket(args.profile_hash, args.dup_group_list, args.dup_list) < 0) {
+    REPORT_LOG_ERR(kDuplicateModule, __LINE__, "handle candidate error\n");
+  }
+  // Both lists are empty now: these only close the block and finish the CSV file.
+  write_data_groups(*args.dup_group_list, kMostDataGroups, GroupsAre::kComplete);
+  write_csv_groups(args.profile_hash, *args.dup_group_list, GroupsAre::kComplete);
+  return 0;
+}
+
+}  // namespace
+
+int32_t duplicate_file_db(ReportArgs* args) {
+  return run_statistics_report(kByNameAndSize, args);
+}
+
+int32_t duplicate_file2_db(ReportArgs* args) {
+  return run_statistics_report(kBySize, args);
+}
+
+int32_t duplicate_file(ReportArgs* args) {
+  if (args == nullptr || args->profile_hash == nullptr) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
+    return -1;
+  }
+  QAZLLNode* candidates = nullptr;
+  QAZLLNode* groups = nullptr;
+  args->dup_list = &candidates;
+  args->dup_group_list = &groups;
+  int32_t result = 0;
+  if (compares_content(args->profile_hash)) {
+    result = report_by_content(*args);
+  } else if (duplicate_file_db(args) < 0) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "duplicate_file_db failed");
+    result = -1;
+  }
+  release_bucket(&groups, &candidates);
+  args->dup_list = nullptr;
+  args->dup_group_list = nullptr;
+  return result;
+}
+
+}  // namespace vornreport

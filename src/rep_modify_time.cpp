@@ -1,0 +1,49 @@
+#include "rep_modify_time.hpp"
+
+#include "report_frame.hpp"
+
+namespace vornreport {
+namespace {
+
+constexpr ReportColumn kColumns[] = {raw_column(0), path_column(1), field_column(2),
+                                     time_column(3)};
+
+constexpr StatisticsReport kLeastModify{
+    .name = "least_modify",
+    .module = "src/rep_modify_time",
+    .sql =
+        "select share,path,size,mtime from file_stat where mtime < strftime('%s','now') - "
+        "60*60*24*90 order by mtime asc limit 0, 10000;",
+    .variable = "vornLeastModifyData",
+    .csv_header = "Share\tFile\tSize(Byte)\tModify Time",
+    .js_limit = 200,
+    .csv_limit = 10000,
+    .share_paths = SharePaths::kLeftOut,
+    .columns = kColumns,
+};
+
+constexpr StatisticsReport kMostModify{
+    .name = "most_modify",
+    .module = "src/rep_modify_time",
+    .sql =
+        "select share,path,size,mtime from file_stat where mtime > strftime('%s','now') - "
+        "60*60*24*7 order by mtime desc limit 0, 10000;",
+    .variable = "vornMostModifyData",
+    .csv_header = "Share\tFile\tSize(Byte)\tModify Time",
+    .js_limit = 200,
+    .csv_limit = 10000,
+    .share_paths = SharePaths::kImported,
+    .columns = kColumns,
+};
+
+}  // namespace
+
+int32_t least_modify_db(ReportArgs* args) {
+  return run_statistics_report(kLeastModify, args);
+}
+
+int32_t most_modify_db(ReportArgs* args) {
+  return run_statistics_report(kMostModify, args);
+}
+
+}  // namespace vornreport
