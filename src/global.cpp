@@ -1,7 +1,7 @@
 #include "vornreport/global.hpp"
 
+#include "rep_volume_usage.hpp"
 #include "vornreport/error_log.hpp"
-#include "vornreport/registry.hpp"
 
 int VornQazGlobalCollectData(const VLIBCSzHash* profile_hash) {
   using namespace vornreport;  // NOLINT(google-build-using-namespace): exported from outside it
@@ -9,12 +9,5 @@ int VornQazGlobalCollectData(const VLIBCSzHash* profile_hash) {
     REPORT_LOG_ERR_NESTED("src/global", 22, "bad parameter");
     return -1;
   }
-  int result = 0;
-  for (const ReportEntry& entry : report_registry()) {
-    if (entry.collect != nullptr) {
-      const int collected = entry.collect("global", profile_hash);
-      result = collected < 0 ? collected : result;
-    }
-  }
-  return result;
+  return volume_usage_collect_data("global", profile_hash);
 }

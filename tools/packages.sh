@@ -4,7 +4,7 @@
 # To build and to try the product.
 build_packages=(
   g++ cmake ninja-build pkg-config
-  libsqlite3-dev libcurl4-openssl-dev libmount-dev libssl-dev
+  libsqlite3-dev libcurl4-openssl-dev libmount-dev libssl-dev libxxhash-dev
   bubblewrap
 )
 # Besides those, to run all tests. (CMake looks for GoogleTest only when tests are built.)

@@ -5,7 +5,6 @@
 
 extern "C" {
 
-// Runs every collect function of the registry for the profile "global". Their last failure, else
-// 0; -1 for a null hash.
+// Stores a sample of every volume's usage for the profile "global". 0 or -1.
 int VornQazGlobalCollectData(const VLIBCSzHash* profile_hash);
 }

@@ -27,6 +27,19 @@ class UnitTest : public testing::Test {
     return testing::internal::GetCapturedStdout();
   }
 
+  // Runs `work` in a child, for what the program keeps as long as the process, and returns the text
+  // that it gives.
+  template <typename Work>
+  std::string in_child(Work&& work) {
+    const std::string file = folder_.path("child-result");
+    const pid_t child = support::fork_child([&] {
+      support::write_file(file, work());
+      return 0;
+    });
+    EXPECT_EQ(support::wait_child(child), 0);
+    return support::read_file(file);
+  }
+
   // `text` without what %m gave, so that an expectation needn't know an errno left from before.
   static std::string without_errno(std::string text) {
     for (size_t open = text.find('('); open != std::string::npos;) {

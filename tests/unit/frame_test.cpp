@@ -3,66 +3,15 @@
 
 #include <algorithm>
 
-#include "fixture.hpp"
 #include "rep_large_file.hpp"
 #include "rep_share_list.hpp"
+#include "report_fixture.hpp"
 #include "vornreport/report_data.hpp"
-#include "vornreport/statistics_db.hpp"
 
 namespace vornreport {
 namespace {
 
-class FrameTest : public UnitTest {
- protected:
-  FrameTest() : data_(report_data_path().c_str()) {
-    unlink(data_.c_str());
-    set_profile("real_path_stat_db", folder_.path("stat.db"));
-    set_profile("real_path_csv", folder_.path());
-    users_.reset(VLIBCSzHashAlloc(8));
-    shares_.reset(VLIBCSzHashAlloc(8));
-    volumes_.reset(VLIBCSzHashAlloc(8));
-  }
-  ~FrameTest() override { unlink(data_.c_str()); }
-
-  static void set(HashHandle& hash, const std::string& key, const std::string& value) {
-    VLIBCSzHash* raw = hash ? hash.release() : VLIBCSzHashAlloc(8);
-    VLIBCSzHashSetValue(&raw, key.c_str(), value.c_str());
-    hash.reset(raw);
-  }
-  void set_profile(const std::string& key, const std::string& value) { set(profile_, key, value); }
-
-  void add(const std::string& share, const std::string& name, off_t size) {
-    const SqliteHandle db = VORNReportDBInit(profile_.get());
-    add(db.get(), share, name, size);
-  }
-  static void add(sqlite3* db, const std::string& share, const std::string& name, off_t size) {
-    struct stat status {};
-    status.st_size = size;
-    const std::string path = std::string("/").append(share).append("/").append(name);
-    const FileInfo info{share.c_str(), path.c_str(), name.c_str(), "", &status};
-    ASSERT_EQ(ReportDBAddFile(db, &info), 0);
-  }
-
-  int run(ReportFunction report, int embedded = 0) {
-    ReportArgs args{"p1",          profile_.get(), users_.get(), volumes_.get(),
-                    shares_.get(), nullptr,        nullptr,      embedded};
-    int result = 0;
-    output_ = printed([&] { result = report(&args); });
-    return result;
-  }
-
-  std::string data() const { return support::read_file(data_); }
-  std::string csv(const std::string& name) const {
-    return support::read_file(folder_.path(name + ".csv"));
-  }
-
-  std::string data_;
-  std::string output_;
-  HashHandle profile_;
-  HashHandle users_;
-  HashHandle volumes_;
-  HashHandle shares_;
-};
+using FrameTest = ReportTest;
 
 TEST_F(FrameTest, TwoReportsAppendTheirBlocksInOrder) {
   add("photo", "b", 7);

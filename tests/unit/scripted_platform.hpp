@@ -24,7 +24,14 @@ struct ScriptedPlatform {
   TextMap volume_ids;                                       // mount path to identifier
   TextMap file_types;                                       // extension to label
   std::map<std::string, unsigned> users;                    // name to uid
-  std::set<std::string> unselected;                         // shares that the profile leaves out
+  struct Volume {
+    std::string path;
+    unsigned long long free_size;
+    unsigned long long total_size;
+  };
+  std::vector<Volume> mounted;
+  std::map<std::string, std::string> digests;  // path to MD5 text; "2" or "-1": that result
+  std::set<std::string> unselected;            // shares that the profile leaves out
   int fs_kind = 1;
   std::map<std::string, int> fs_kinds;  // for single folders
   std::string language = "en";

@@ -1,0 +1,134 @@
+// Quotas: the tool's output in all its forms, the blocks, and a tool that doesn't behave.
+#include "rep_quota_usage.hpp"
+#include "report_fixture.hpp"
+#include "shell.hpp"
+
+namespace vornreport {
+namespace {
+
+class QuotaTest : public ReportTest {
+ protected:
+  ~QuotaTest() override { QAZLLfree(&list_, QuotaFreeVolume); }
+
+  int parse(const std::string& output, const char* path = "/srv") {
+    std::string copy = output;
+    const FileHandle stream(fmemopen(copy.data(), copy.size(), "r"));
+    int result = 0;
+    output_ =
+        printed([&] { result = QuotaUsageParse(stream.get(), &list_, path, 5000, users_.get()); });
+    return result;
+  }
+
+  // "name used quota" of the kept users.
+  std::string kept() const {
+    std::string text;
+    for (const auto& [used, user] : quota_volume_of(list_)->users) {
+      text += user.name + " " + std::to_string(used) + " " + std::to_string(user.quota) + "\n";
+    }
+    return text;
+  }
+
+  QAZLLNode* list_ = nullptr;
+};
+
+constexpr char kHead[] =
+    "*** Report for user quotas on device /dev/loop0\nBlock grace time: 7days\n"
+    "                        Block limits\nUser            used    soft\n"
+    "----------------------------------------------------------\n";
+
+TEST_F(QuotaTest, ReadsTheUserTableInAllItsForms) {
+  for (const char* name : {"ann", "bob", "eve", "x"}) {
+    set(users_, name, "1");
+  }
+  const struct {
+    const char* what;
+    std::string lines;
+    int result;
+    const char* kept;
+    uint64_t max_quota;
+    uint64_t max_used;
+  } cases[] = {
+      {"a table", "ann  --  20  100  200  1 0 0\nbob  +-  10   0  0  1 0 0\n\n\n", 0,
+       "bob 10 0\nann 20 100\n", 5000, 20},
+      {"equal usage keeps the order", "eve -- 5 1 1\nann -- 5 2 1\n", 3, "eve 5 1\nann 5 2\n", 2,
+       5},
+      {"others count for the quota only", "root -- 900 9000 0 \nann -- 1 10 0\n", 3, "ann 1 10\n",
+       9000, 1},
+      {"short lines are dropped, one of four fields stays without quota",
+       "ann\nbob --\neve -- 7\nx -- 8 300\n", 3, "x 8 0\n", 0, 0},
+      {"numbers that are none", "ann -- many none 0\n", 3, "ann 0 0\n", 5000, 0},
+      {"no user line", "", -1, "", 0, 0},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    EXPECT_EQ(parse(kHead + c.lines), c.result);
+    EXPECT_EQ(kept(), c.kept);
+    EXPECT_EQ(quota_volume_of(list_)->maxQuota, c.max_quota);
+    EXPECT_EQ(quota_volume_of(list_)->maxUserUsed, c.max_used);
+    QAZLLfree(&list_, QuotaFreeVolume);
+  }
+  // Without the line of dashes nothing is a user line; a line beyond all bounds is one line.
+  EXPECT_EQ(parse("ann -- 1 2 3\n"), -1);
+  QAZLLfree(&list_, QuotaFreeVolume);
+  EXPECT_EQ(parse(kHead + std::string(100000, 'z') + " -- 1 2 3\nann -- 1 2 3\n"), 3);
+  EXPECT_EQ(kept(), "ann 1 2\n");
+}
+
+TEST_F(QuotaTest, KeepsTheHundredUsersOfSmallestUsage) {
+  std::string lines;
+  for (int i = 0; i < 1000; ++i) {
+    const std::string name = "u" + std::to_string(i);
+    set(users_, name, "1");
+    lines += name + " -- " + std::to_string(2000 - i) + " 0 0\n";
+  }
+  parse(kHead + lines);
+  EXPECT_EQ(quota_volume_of(list_)->users.size(), 100U);
+  EXPECT_EQ(kept().rfind("u999 1001 0\nu998 1002 0\n", 0), 0U);
+  EXPECT_EQ(quota_volume_of(list_)->maxUserUsed, 2000U);
+}
+
+TEST_F(QuotaTest, WritesBothBlocks) {
+  set(users_, "ann", "1");
+  set(users_, "bob", "1");
+  parse(std::string(kHead) + "ann -- 30 40 0 0\nbob -- 60 0 0 0\n", "/srv/a-rather-long-path");
+  parse(std::string(kHead) + "ann -- 0 7 0 0\n", "/b");
+  platform.volume_ids = {{"/srv/a-rather-l", "A"}, {"/b", "B"}};
+  printed([&] { EXPECT_EQ(QuotaUsageWrite("p1", profile_.get(), list_, users_.get()), 0); });
+  EXPECT_EQ(data(),
+            "<script type='text/javascript'>\nvar vornQuotaUsageData = {\n'A' : {\n"
+            "\tmaxQuota : '5000',\n\tmaxUserUsed: 60,\n\tdata: [],\n\traw : [\n"
+            "[[0, 0, 50.000000]],\n[[0, 1, 100.000000]]\n],\n\tlabels : [\n\t\t'ann'\n\t\t,\n"
+            "\t\t'bob'\n\t]\n} , \n'B' : {\n\tmaxQuota : '7',\n\tmaxUserUsed: 0,\n\tdata: [],\n"
+            "\traw : [\n[[0, 0, -nan]]\n],\n\tlabels : [\n\t\t'ann'\n\t]\n}}\n</script>\n"
+            "<script type='text/javascript'>\nvar vornQuotaUsageTable = {\n'A' : [\n"
+            "['ann', 40960, 30720, 75.0],\n['bob', 0, 61440, -1.0]] , \n'B' : [\n"
+            "['ann', 7168, 0, 0.0]]}\n</script>\n");
+}
+
+TEST_F(QuotaTest, EndsACommandAtItsLimits) {
+  const CommandLimits limits{.seconds = 1, .bytes = 1000};
+  const auto all = [](const FileHandle& stream) {
+    std::string text;
+    for (int c = std::fgetc(stream.get()); c != EOF; c = std::fgetc(stream.get())) {
+      text += static_cast<char>(c);
+    }
+    return text;
+  };
+  printed([&] {
+    EXPECT_EQ(run_limited("src/x", "exit 3", limits), 3);
+    EXPECT_EQ(run_limited("src/x", "yes | head -c 100000; exit 0", limits), 0);
+    EXPECT_EQ(all(open_limited("src/x", "echo one; echo two", limits)), "one\ntwo\n");
+    EXPECT_EQ(support::syslog_text(), "");
+    EXPECT_EQ(run_limited("src/x", "sleep 600", limits), -1);
+    EXPECT_EQ(all(open_limited("src/x", "echo one; sleep 600 | cat", limits)), "one\n");
+    EXPECT_LE(all(open_limited("src/x", "yes", limits)).size(), 1000U);
+  });
+  const std::string log = without_errno(support::syslog_text());
+  EXPECT_NE(log.find("command took too long, ended cmd=sleep 600\n"), std::string::npos) << log;
+  EXPECT_NE(log.find("command took too long, ended cmd=echo one; sleep 600 | cat\n"),
+            std::string::npos);
+  EXPECT_NE(log.find("command printed too much, ended cmd=yes\n"), std::string::npos);
+}
+
+}  // namespace
+}  // namespace vornreport

@@ -1,0 +1,283 @@
+// The reports that differ from the frame's usual one, over a real statistics database.
+#include <algorithm>
+#include <random>
+#include <sstream>
+
+#include "rep_duplicate_file/content_groups.hpp"
+#include "rep_duplicate_file/duplicate_file.hpp"
+#include "rep_file_group.hpp"
+#include "rep_file_owner.hpp"
+#include "rep_modify_time.hpp"
+#include "report_fixture.hpp"
+
+namespace vornreport {
+namespace {
+
+constexpr char kScript[] = "<script type='text/javascript'>\n";
+
+class ReportsTest : public ReportTest {
+ protected:
+  // Adds rows in one transaction.
+  template <typename Work>
+  void fill(Work&& work) {
+    const SqliteHandle db = VORNReportDBInit(profile_.get());
+    sqlite3_exec(db.get(), "BEGIN", nullptr, nullptr, nullptr);
+    work(db.get());
+    sqlite3_exec(db.get(), "COMMIT", nullptr, nullptr, nullptr);
+  }
+
+  using ReportTest::add;
+  static void add(QAZLLNode** candidates, std::string path, std::string size,
+                  const char* share_folder = nullptr) {
+    char* columns[] = {const_cast<char*>("s"), path.data(), size.data(), const_cast<char*>("5"),
+                       const_cast<char*>("n")};
+    ASSERT_EQ(add_candidate(candidates, columns, 1, share_folder), 0);
+  }
+};
+
+TEST_F(ReportsTest, ModificationTimesHaveStrictBoundsAndOneImport) {
+  constexpr time_t kDay = 86400;
+  const time_t now = time(nullptr);
+  fill([&](sqlite3* db) {
+    for (const int days : {1, 6, 8, 89, 91, 400}) {
+      add(db, "s", "d" + std::to_string(days), 1, 0, now - days * kDay);
+    }
+  });
+  const auto seconds = [&](int days) { return std::to_string(now - days * kDay); };
+  EXPECT_EQ(run(least_modify_db), 0);
+  EXPECT_EQ(data(), std::string(kScript) +
+                        "var vornLeastModifyData = [\n[ 's', 'esc(/s/d400)'', "
+                        "'1', '" +
+                        seconds(400) + "' ],\n[ 's', 'esc(/s/d91)'', '1', '" + seconds(91) +
+                        "' ]\n];\n</script>\n");
+  EXPECT_EQ(csv("least_modify"),
+            "Share\tFile\tSize(Byte)\tModify Time\n\"s\"\t\"csv(/s/d400)\"\t\"csv(1)\"\t\"time(" +
+                seconds(400) + ")\"\n\"s\"\t\"csv(/s/d91)\"\t\"csv(1)\"\t\"time(" + seconds(91) +
+                ")\"\n");
+  unlink(data_.c_str());
+  platform.failing = {"TimeConvert"};
+  EXPECT_EQ(run(most_modify_db), 0);
+  EXPECT_EQ(data(), std::string("<import>") + kScript +
+                        "var vornMostModifyData = [\n[ 's', 'esc(/s/d1)'', '1', '" + seconds(1) +
+                        "' ]<import>,\n[ 's', 'esc(/s/d6)'', '1', '" + seconds(6) +
+                        "' ]\n];\n</script>\n");
+  EXPECT_NE(csv("most_modify").find("\t\"\"\n"), std::string::npos);
+  EXPECT_NE(support::syslog_text().find("translate time format error, time=" + seconds(1) + "\n"),
+            std::string::npos);
+}
+
+TEST_F(ReportsTest, OwnersAreNamedFilteredAndOrdered) {
+  platform.users = {{"ann", 10}, {"bob", 20}, {"eve", 30}};
+  set(users_, "ann", "1");
+  set(users_, "bob", "1");
+  fill([&](sqlite3* db) {
+    add(db, "small", "a", 5, 10);
+    add(db, "big", "a", 9, 10);
+    add(db, "many", "a", 4, 10);
+    add(db, "many", "b", 1, 10);
+    add(db, "small", "x", 1, 20);
+    add(db, "small", "e", 1, 30);   // outside the filter: silent
+    add(db, "small", "g", 1, 999);  // no account: logged
+  });
+  EXPECT_EQ(run(file_owner_db), 0);
+  EXPECT_EQ(data(), std::string(kScript) +
+                        "var vornFileOwnerData = [\n[ 'ann', 'big', '1', '9' ],\n"
+                        "[ 'ann', 'many', '2', '5' ],\n[ 'ann', 'small', '1', '5' ],\n"
+                        "[ 'bob', 'small', '1', '1' ]\n];\n</script>\n");
+  EXPECT_EQ(
+      csv("file_owner").substr(0, 72),
+      "Owner\tShare\tFile Count\tSize(Byte)\n\"ann\"\t\"csv(big)\"\t\"csv(1)\"\t\"csv(9)\"\n\"");
+  const std::string log = support::syslog_text();
+  EXPECT_NE(log.find("get user name failed"), std::string::npos);
+  EXPECT_EQ(log.find("get user name failed"), log.rfind("get user name failed"));
+}
+
+TEST_F(ReportsTest, FileGroupSectionsShareTheirLimit) {
+  platform.users = {{"ann", 10}, {"bob", 20}};
+  EXPECT_EQ(outcome(file_group_db, "file_group"), "\n}</script>\n|Group, Share, Size\n");
+  fill([&](sqlite3* db) {
+    add(db, "s", "a", 5, 10, 0, "doc");
+    add(db, "s", "b", 7, 20, 0, "doc");
+  });
+  set_profile("limit_user", "ann,,ghost, bob");
+  EXPECT_EQ(outcome(file_group_db, "file_group"),
+            std::string(kScript) +
+                "var vornFileGroupTableData = {\nvornAll : [\n[ 'doc', 's', 12 ]]\n,\nann : [\n"
+                "[ 'doc', 's', 5 ]\n]\n,\nbob : [\n[ 'doc', 's', 7 ]\n]\n\n}</script>\n"
+                "|Group, Share, Size\n");
+  // 99 more types: the hundred rows end before ann's section, which keeps its closing bracket.
+  fill([&](sqlite3* db) {
+    for (int i = 0; i < 99; ++i) {
+      add(db, "s", "t", 1, 10, 0, ("type" + std::to_string(i)).c_str());
+    }
+  });
+  const std::string full = outcome(file_group_db, "file_group");
+  EXPECT_EQ(std::count(full.begin(), full.end(), '['), 101);
+  EXPECT_EQ(full.find("ann"), std::string::npos);
+  EXPECT_NE(full.find("]]\n\n]\n\n]\n\n}</script>\n"), std::string::npos);
+}
+
+TEST_F(ReportsTest, DuplicatesByNameAndSizeAreNumberedInOrder) {
+  fill([&](sqlite3* db) {
+    add(db, "s", "x/a.txt", 10, 0, 1);
+    add(db, "s", "y/a.txt", 10, 0, 2);
+    add(db, "s", "z/a.txt", 11);
+    add(db, "s", "x/b", 10);
+    add(db, "s", "x/big", 900);
+    add(db, "s", "y/big", 900);
+  });
+  const std::string text = outcome(duplicate_file, "duplicate_file");
+  EXPECT_EQ(text.rfind("<import>" + std::string(kScript) +
+                           "var vornDuplicateHashMatch = 0;\nvar vornDuplicateFileData = [\n"
+                           "[ '1', 's', 'esc(/s/x/big)'', '900', '0' ]",
+                       0),
+            0U)
+      << text;
+  EXPECT_NE(text.find("[ '2', 's', 'esc(/s/y/a.txt)'', '10', '2' ]\n];\n</script>\n|Duplicate "
+                      "Group\tShare\tFile\tSize(Byte)\tModify Time\n\"1\"\t\"csv(s)\""),
+            std::string::npos)
+      << text;
+  EXPECT_EQ(text.find("z/a.txt"), std::string::npos);
+  EXPECT_EQ(text.find("/b"), text.find("/big"));
+}
+
+TEST_F(ReportsTest, DuplicatesBeyondGroup200AreForTheCsvOnly) {
+  fill([&](sqlite3* db) {
+    for (int i = 0; i < 500; ++i) {
+      add(db, "s", std::to_string(i % 2) + "/f" + std::to_string(i / 2), 1000 - i / 2);
+    }
+  });
+  const std::string text = outcome(duplicate_file, "duplicate_file");
+  EXPECT_NE(text.find("[ '200', 's'"), std::string::npos);
+  EXPECT_EQ(text.find("[ '201', 's'"), std::string::npos);
+  EXPECT_NE(text.find("\"250\"\t"), std::string::npos);
+}
+
+// What the pairwise walk over a bucket gives, computed the plain way.
+struct Expected {
+  std::string groups;  // paths of each group, last match first
+  std::string lines;   // pairs that did not match
+};
+
+Expected pairwise(const std::vector<std::string>& paths, const std::vector<std::string>& samples,
+                  const std::vector<std::string>& digests) {
+  Expected expected;
+  std::vector<bool> grouped(paths.size());
+  for (size_t a = 0; a < paths.size(); ++a) {
+    std::string chain;
+    for (size_t b = a + 1; b < paths.size() && !grouped[a]; ++b) {
+      if (grouped[b] || samples[a] != samples[b]) {
+        continue;
+      }
+      if (digests[a].size() > 2 && digests[a] == digests[b]) {
+        chain = paths[b] + " " + (chain.empty() ? paths[a] : chain);
+        grouped[b] = true;
+      } else {
+        expected.lines += "(" + paths[a] + "," + paths[b] + ")\n";
+      }
+    }
+    grouped[a] = grouped[a] || !chain.empty();
+    expected.groups += chain.empty() ? "" : chain + "\n";
+  }
+  return expected;
+}
+
+// The paths of each group of a content mode CSV file, one line a group.
+std::string groups_of(const std::string& csv) {
+  std::istringstream lines(csv);
+  std::string line;
+  std::string last;
+  std::string groups;
+  std::getline(lines, line);  // the header
+  while (std::getline(lines, line)) {
+    const std::string number = line.substr(0, line.find('\t'));
+    const size_t path = line.find("csv(") + 4;
+    groups += number == last ? " " : last.empty() ? "" : "\n";
+    groups += line.substr(path, line.find(')') - path);
+    last = number;
+  }
+  return groups.empty() ? "" : groups + "\n";
+}
+
+// The pairs of the "not match" lines, one a line.
+std::string mismatches_of(const std::string& output) {
+  constexpr std::string_view kStart = "not match file=";
+  std::string pairs;
+  for (size_t at = output.find(kStart); at != std::string::npos; at = output.find(kStart, at + 1)) {
+    const size_t begin = at + kStart.size();
+    pairs += output.substr(begin, output.find('\n', begin) + 1 - begin);
+  }
+  return pairs;
+}
+
+// A bucket is looked up by sample; its groups and the order of its lines must be the pairwise
+// walk's. Samples and digests are drawn from few values, some digests can't be had.
+TEST_F(ReportsTest, ContentGroupsAreThoseOfThePairwiseWalk) {
+  std::mt19937 random(7);
+  for (int round = 0; round < 40; ++round) {
+    std::vector<std::string> paths;
+    std::vector<std::string> samples;
+    std::vector<std::string> digests;
+    const auto count = 2 + random() % 30;
+    for (size_t i = 0; i < count; ++i) {
+      paths.push_back(folder_.path("f" + std::to_string(i)));
+      samples.emplace_back(1, static_cast<char>('a' + random() % 4));
+      digests.emplace_back(std::array{"same", "other", "third", "2"}[random() % 4]);
+      support::write_file(paths.back(), samples.back());
+      platform.digests[paths.back()] = digests.back();
+    }
+    const std::string found = in_child([&] {
+      QAZLLNode* candidates = nullptr;
+      QAZLLNode* groups = nullptr;
+      for (std::string& path : paths) {
+        add(&candidates, path, "1");
+      }
+      const std::string output =
+          printed([&] { handle_size_bucket(profile_.get(), &groups, &candidates); });
+      return mismatches_of(output) + "|" + groups_of(csv("duplicate_file"));
+    });
+    const Expected expected = pairwise(paths, samples, digests);
+    EXPECT_EQ(found, expected.lines + "|" + expected.groups);
+    unlink(folder_.path("duplicate_file.csv").c_str());
+  }
+}
+
+TEST_F(ReportsTest, ContentModeClosesItsBlockItself) {
+  set_profile("duplicate_compare", "TRUE");
+  EXPECT_EQ(outcome(duplicate_file, "duplicate_file"), "</script>\n|");
+  fill([&](sqlite3* db) {
+    for (const char* name : {"t/e1", "t/e2"}) {
+      add(db, "s", name, 0);  // empty: equal without being opened
+    }
+    add(db, "s", "t/x", 7);
+    add(db, "s", "t/gone", 7);  // neither exists
+  });
+  const std::string text = outcome(duplicate_file, "duplicate_file");
+  EXPECT_EQ(text, "<import><import><import><import>" + std::string(kScript) +
+                      "var vornDuplicateHashMatch = 1;\nvar vornDuplicateFileData = [\n"
+                      "[ '1', 's', 'esc(/s/t/e2)'', 0, 0 ],\n[ '1', 's', 'esc(/s/t/e1)'', 0, 0 ]\n"
+                      "];\n</script>\n|Duplicate Group\tShare\tFile\tSize(Byte)\tModify Time\n"
+                      "1\ts\tcsv(/s/t/e2)\t0\ttime(0)\n1\ts\tcsv(/s/t/e1)\t0\ttime(0)\n");
+}
+
+// A link that was put in a folder's place since the gathering is not followed to the file behind
+// it.
+TEST_F(ReportsTest, SamplesAreNotReadThroughLinks) {
+  const std::string share = folder_.path("share");
+  support::write_file(folder_.path("outside/f"), "secret");
+  support::write_file(share + "/f", "secret");
+  ASSERT_EQ(symlink("../outside", (share + "/in").c_str()), 0);
+  QAZLLNode* candidates = nullptr;
+  QAZLLNode* groups = nullptr;
+  for (std::string path : {share + "/f", share + "/in/f"}) {
+    add(&candidates, path, "6", share.c_str());
+  }
+  printed([&] { EXPECT_EQ(read_fast_digests(candidates), 0); });
+  EXPECT_NE(file_of(candidates)->sample, file_of(candidates->next)->sample);
+  EXPECT_NE(support::syslog_text().find("open file failed, file=" + share + "/in/f,(40)"),
+            std::string::npos);
+  release_bucket(&groups, &candidates);
+}
+
+}  // namespace
+}  // namespace vornreport
