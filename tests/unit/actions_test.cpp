@@ -247,8 +247,9 @@ TEST_F(ActionsTest, CollectCountsTheSelectedReports) {
   EXPECT_EQ(platform.calls.back(), "StatusUpdate p1 success");
   platform.config["global"] = {{"report_list", "volume_usage"}};
   platform.calls.clear();
-  output_ = printed([&] { EXPECT_EQ(collect_action(nullptr), 0); });
+  output_ = printed([&] { EXPECT_EQ(collect_action(nullptr), -1); });  // there is no volume
   EXPECT_EQ(platform.calls.back(), "InitRealPath global 0");
+  expect_nested("src/vornreport:425", "collect global data failed");
 }
 
 TEST_F(ActionsTest, CollectLogsWhatFailed) {
