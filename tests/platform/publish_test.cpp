@@ -45,20 +45,16 @@ TEST(TargetLink, StandsForTheReportFolder) {
       {"", own},
       {"https://files.example.com/reports", "https://files.example.com/reports" + rest},
       {"http://user@h:8080/a%20b/", "http://user@h:8080/a%20b" + rest},
-      {"file:///mnt/reports", "file:///mnt/reports" + rest},
-      {"javascript:alert(1)", "refused"},
-      {"ftp://h/x", "refused"},
-      {"file://relative", "refused"},
-      {"https:///x", "refused"},
-      {"https://h/a b", "refused"},
-      {"https://h/\"x", "refused"},
-      {"https://h/'x", "refused"},
-      {"https://h/?q", "refused"},
-      {"https://h/\x01", "refused"},
-  };
+      {"file:///mnt/reports", "file:///mnt/reports" + rest}};
   for (const auto& [link_base, expected] : bases) {
     EXPECT_EQ(expected, link_of({{"report_dir", base + "//"}, {"link_base", link_base}}, page));
-    EXPECT_EQ(expected == "refused" ? 1U : 0U, syslog_lines().size()) << link_base;
+  }
+  EXPECT_EQ("", syslog_text());
+  for (const char* bad :
+       {"javascript:alert(1)", "ftp://h/x", "file://relative", "https:///x", "https://h/a b",
+        "https://h/\"x", "https://h/'x", "https://h/?q", "https://h/\x01"}) {
+    EXPECT_EQ("refused", link_of({{"report_dir", base}, {"link_base", bad}}, page));
+    EXPECT_EQ(1U, syslog_lines().size()) << bad;
   }
   EXPECT_EQ("refused", link_of({{"report_dir", base}}, page, own.size()));
   EXPECT_EQ(own, link_of({{"report_dir", base}}, page, own.size() + 1));
@@ -290,16 +286,10 @@ TEST(MailAddress, IsPlainEnoughForAHeader) {
 }
 
 TEST(QuotedPrintable, KeepsLinesShortAndBytesWhole) {
-  const std::pair<std::string, std::string> cases[] = {
-      {"a=b\n", "a=3Db\r\n"},
-      {"x \ny ", "x=20\r\ny=20"},
-      {"\xc3\xa4\t", "=C3=A4=09"},
-      {std::string(76, 'x'), std::string(75, 'x') + "=\r\nx"},
-      {std::string(74, 'x') + "=", std::string(74, 'x') + "=\r\n=3D"},
-  };
-  for (const auto& [text, expected] : cases) {
-    EXPECT_EQ(expected, host::quoted_printable(text));
-  }
+  const std::string line(74, 'x');
+  EXPECT_EQ("a=3Db\r\nx=20\r\n=C3=A4=09", host::quoted_printable("a=b\nx \n\xc3\xa4\t"));
+  EXPECT_EQ(line + "x=\r\nx", host::quoted_printable(line + "xx"));
+  EXPECT_EQ(line + "=\r\n=3D", host::quoted_printable(line + "="));
 }
 
 }  // namespace
