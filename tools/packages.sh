@@ -9,7 +9,7 @@ build_packages=(
 )
 # Besides those, to run all tests. (CMake looks for GoogleTest only when tests are built.)
 test_packages=(
-  libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck
+  libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota
 )
 
 as_root() {
