@@ -87,8 +87,7 @@ class Run:
         """Waits until the program and whatever holds its output have ended."""
         out, err = self.process.communicate(timeout=LIMIT)
         self.status = self.process.returncode
-        self.out = (out or b'').decode(errors='surrogateescape')
-        self.err = (err or b'').decode(errors='surrogateescape')
+        self.out, self.err = ((text or b'').decode(errors='surrogateescape') for text in (out, err))
         if isinstance(self.log, Log):
             self.log.close()
             self.log_lines = self.log.lines
@@ -99,19 +98,16 @@ class Machine:
     """A machine with the product installed: a stage, a /tmp, shares and a report folder."""
 
     def __init__(self, base, stage):
-        self.base = Path(base)
-        self.stage = self.base / 'stage'
+        self.base, self.stage = Path(base), Path(base, 'stage')
         shutil.copytree(stage, self.stage, symlinks=True)
         self.vorn = self.stage / 'usr/vorn'
-        self.tmp = self.base / 'tmp'
-        self.cron = self.base / 'cron'
-        self.reports = self.base / 'reports'
+        self.config, self.shares = (self.vorn / 'etc' / f'{name}.conf'
+                                    for name in ('vornreport', 'share'))
+        self.tmp, self.cron, self.reports = (self.base / name for name in ('tmp', 'cron', 'reports'))
         for folder in (self.tmp, self.cron, self.reports):
             folder.mkdir()
         self.options = []  # for the sandbox, besides those for the folders above
         self._logs = 0
-        self.config = self.vorn / 'etc/vornreport.conf'
-        self.shares = self.vorn / 'etc/share.conf'
 
     def share(self, name, path=None):
         folder = Path(path or self.base / 'shares' / name)

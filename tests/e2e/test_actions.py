@@ -107,24 +107,10 @@ report_list =  large_file
         self.assertNotIn(b'schedule_collect_id', self.m.config.read_bytes())
 
     def test_what_cannot_be_cleaned(self):
-        for name, line in (('unheard', r'src/vornreport:525 .*Get section failed, section=unheard'),
-                           ('../etc', r'Get section failed, section=\.\./etc')):
-            with self.subTest(name):
-                run = self.m.run('--clean', name)
-                self.assertEqual(run.status, 0)
-                self.assertRegex('|'.join(run.log_lines), line)
-                self.assertEqual(self.m.config.read_bytes(), self.CONFIG)
-        self.assertEqual(len(self.cron_files()), 3)
-
-    def test_a_running_report_is_left_alone(self):
-        make_files(self.m.share('photos'), {'a.jpg': 10})
-        self.m.profile('busy', report_list='share_list')
-        self.m.stop_at('tail')
-        run = self.m.start('--report', 'busy')
-        self.m.stopped_pid()
-        self.m.run('--clean', 'busy')
-        self.m.go_on()
-        self.assertSucceeded(run.finish(), 'busy')
+        for name in ('unheard', '../etc'):
+            run = self.m.run('--clean', name)
+            self.assertRegex('|'.join(run.log_lines), f'Get section failed, section={name}')
+        self.assertEqual((self.m.config.read_bytes(), len(self.cron_files())), (self.CONFIG, 3))
 
 
 if __name__ == '__main__':

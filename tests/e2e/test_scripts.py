@@ -88,16 +88,14 @@ class Template(unittest.TestCase):
                 self.assertFalse(os.path.exists(self.file))
 
     def test_parts_that_are_not_there(self):
-        for arguments in (('lang', 'en'), ('header', 'x'), ('body', 'x'), ('tail',)):
-            with self.subTest(arguments):
-                call = (arguments[0], self.file, *arguments[1:])
-                self.assertEqual(self.call(*call).returncode, 1)
+        for command, *word in (('lang', 'en'), ('header', 'x'), ('body', 'x'), ('tail',)):
+            with self.subTest(command):
+                self.assertEqual(self.call(command, self.file, *word).returncode, 1)
                 self.assertFalse(os.path.exists(self.file))
-                Path(self.file).write_text('<main>\ncut sho')
-                if arguments[0] != 'header':
-                    self.assertEqual(self.call(*call).returncode, 1)
-                    self.assertEqual(Path(self.file).read_text(), '<main>\ncut sho')
-                os.unlink(self.file)
+        Path(self.file).write_text('<main>\ncut sho')
+        for command, *word in (('lang', 'en'), ('body', 'x'), ('tail',)):
+            self.assertEqual(self.call(command, self.file, *word).returncode, 1)
+        self.assertEqual(Path(self.file).read_text(), '<main>\ncut sho')
 
     def test_links_are_not_followed(self):
         os.symlink(self.file + '2', self.file)
@@ -109,15 +107,12 @@ class Template(unittest.TestCase):
 class Quickstart(unittest.TestCase):
     def test_bad_folders(self):
         with tempfile.TemporaryDirectory() as folder:
-            Path(folder, 'file').touch()
             os.mkdir(os.path.join(folder, "it's"))
-            for name, message in (('gone', 'no such folder'), ('file', 'not a folder'),
-                                  ("it's", 'single quote')):
-                with self.subTest(name):
-                    done = subprocess.run([ROOT / 'quickstart.sh', os.path.join(folder, name)],
-                                          text=True, capture_output=True)
-                    self.assertEqual((done.returncode, done.stdout), (1, ''))
-                    self.assertRegex(done.stderr, f'^quickstart.sh: .*{message}.*\n$')
+            for name, message in (('gone', 'no such folder'), ("it's", 'single quote')):
+                done = subprocess.run([ROOT / 'quickstart.sh', os.path.join(folder, name)],
+                                      text=True, capture_output=True)
+                self.assertEqual((done.returncode, done.stdout), (1, ''))
+                self.assertRegex(done.stderr, f'^quickstart.sh: .*{message}.*\n$')
 
 
 if __name__ == '__main__':
