@@ -196,6 +196,7 @@ void run_command(const char* module, int line, const char* format, ...) {
   CommandText command;
   va_list args;
   va_start(args, format);
+  // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized): it is, one line above
   std::vsnprintf(command.data(), CommandText::size(), format, args);
   va_end(args);
   report_trace(module, line, "run cmd=%s\n\n", command.c_str());

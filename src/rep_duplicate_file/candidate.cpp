@@ -42,10 +42,14 @@ class Descriptor {
   int fd_;
 };
 
+std::string_view cut(const char* text) {
+  return std::string_view(text).substr(0, kLongestText);
+}
+
 // There are few shares and many files.
 const char* interned(const char* text) {
   static std::unordered_set<std::string> texts;
-  return texts.emplace(text, 0, kLongestText).first->c_str();
+  return texts.emplace(cut(text)).first->c_str();
 }
 
 // Opens a gathered file as the walk found it: below its share's folder and through no link, so that
@@ -144,7 +148,7 @@ int add_candidate(QAZLLNode** candidates, char* const* columns, int32_t ordinal,
     return -1;
   }
   file->share = interned(text(kShare));
-  file->path.assign(text(kPath), 0, kLongestText);
+  file->path = cut(text(kPath));
   file->size = std::strtoull(text(kSize), nullptr, 10);
   file->mtime = static_cast<int32_t>(std::strtoll(text(kModifyTime), nullptr, 10));
   file->ordinal = ordinal;

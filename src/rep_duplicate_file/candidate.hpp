@@ -4,6 +4,7 @@
 #include <array>
 #include <cstdint>
 #include <string>
+#include <utility>
 
 #include "vorn/list.h"
 
@@ -11,11 +12,7 @@ namespace vornreport {
 
 // A 128-bit digest of a sample. Equal samples have equal digests; that two others meet is as good
 // as impossible, and would cost one comparison of whole files.
-struct SampleDigest {
-  uint64_t high;
-  uint64_t low;
-  auto operator<=>(const SampleDigest&) const = default;
-};
+using SampleDigest = std::pair<uint64_t, uint64_t>;
 
 // One file. A bucket can hold a million of them, so a node holds real texts, not their widest
 // fields, and the members of a group are the candidates themselves, linked by `next`.

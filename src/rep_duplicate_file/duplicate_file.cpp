@@ -3,6 +3,7 @@
 #include <strings.h>
 
 #include <string>
+#include <string_view>
 
 #include "content_groups.hpp"
 #include "module.hpp"
@@ -34,6 +35,10 @@ const char* text_of(char* const* values, Column column) {
   return values[column] != nullptr ? values[column] : "";
 }
 
+std::string_view cut(const char* text, size_t longest) {
+  return std::string_view(text).substr(0, longest);
+}
+
 bool compares_content(const VLIBCSzHash* profile_hash) {
   const char* value = VLIBCSzHashGetValue(profile_hash, "duplicate_compare");
   return value != nullptr && strcasecmp(value, "true") == 0;
@@ -54,7 +59,7 @@ void decide_match(const VLIBCSzHash* profile_hash) {
 
 // Content mode: rows are collected until the size changes.
 void collect_row(const report_row_ctx& ctx, char* const* values) {
-  const std::string size(text_of(values, kSize), 0, kLongestSize);
+  const std::string_view size = cut(text_of(values, kSize), kLongestSize);
   if (size != g_grouping.size) {
     if (!g_grouping.size.empty() &&
         handle_size_bucket(ctx.profile_hash, ctx.dup_group_list, ctx.dup_list) < 0) {
@@ -72,11 +77,11 @@ void collect_row(const report_row_ctx& ctx, char* const* values) {
 
 // Name-and-size mode: the query's order puts the members of a group one after another.
 void number_row(char* const* values) {
-  const char* size = text_of(values, kSize);
-  const char* name = text_of(values, kName);
+  const std::string_view size = cut(text_of(values, kSize), kLongestSize);
+  const std::string_view name = cut(text_of(values, kName), kLongestName);
   if (g_grouping.size != size || g_grouping.name != name) {
-    g_grouping.size.assign(size, 0, kLongestSize);
-    g_grouping.name.assign(name, 0, kLongestName);
+    g_grouping.size = size;
+    g_grouping.name = name;
     ++g_grouping.number;
   }
 }

@@ -86,12 +86,13 @@ TEST_F(VolumeUsageTest, EstimatesTheDaysUntilFull) {
 }
 
 TEST_F(VolumeUsageTest, HistoryIsChainedNewestFirstAndNamesNoLostVolume) {
-  for (const auto& [volume, date] : std::vector<std::pair<const char*, const char*>>{
-           {"/v", "1000"}, {"/gone", "1000"}, {"/v", "1100"}, {"/gone", "1100"}}) {
-    printed([&] {
-      EXPECT_EQ(VornQazDBVolumeUsageInsert("global", volume, "5", "6", "45.4545", date), 0);
-    });
-  }
+  printed([] {
+    for (const char* date : {"1000", "1100"}) {
+      for (const char* volume : {"/v", "/gone"}) {
+        EXPECT_EQ(VornQazDBVolumeUsageInsert("global", volume, "5", "6", "45.4545", date), 0);
+      }
+    }
+  });
   printed([&] { VornQazDBVolumeUsageInsert("p1", "/v", "5", "6", "45", "1050"); });
   add_volume("/v", sample("1200", "9", "2"));
   const std::string output =
