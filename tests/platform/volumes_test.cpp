@@ -93,16 +93,15 @@ TEST(Volumes, OfThisServerHoldItsShares) {
   support::write_file(VORN_PATH_SHARES,
                       "[tmp]\npath = /tmp\n[proc]\npath = /proc\n[gone]\npath = /no/such\n"
                       "[bad]\npath = rel\n");
-  EXPECT_EQ(0, support::wait_child(support::fork_child([] {
-              VLIBCSzHash* hash = nullptr;
-              EXPECT_EQ(0, VornQazGetVolumePathHash(&hash));
-              const support::Hash owner(hash);
-              EXPECT_STREQ("/tmp", VLIBCSzHashGetValue(hash, "tmp"));
-              for (const char* share : {"proc", "gone", "bad"}) {
-                EXPECT_EQ(nullptr, VLIBCSzHashGetValue(hash, share)) << share;
-              }
-              return testing::Test::HasFailure() ? 1 : 0;
-            })));
+  EXPECT_TRUE(support::passes_in_child([] {
+    VLIBCSzHash* hash = nullptr;
+    EXPECT_EQ(0, VornQazGetVolumePathHash(&hash));
+    const support::Hash owner(hash);
+    EXPECT_STREQ("/tmp", VLIBCSzHashGetValue(hash, "tmp"));
+    for (const char* share : {"proc", "gone", "bad"}) {
+      EXPECT_EQ(nullptr, VLIBCSzHashGetValue(hash, share)) << share;
+    }
+  }));
 }
 
 TEST(VolumeSpace, IsWhatDfCounts) {
@@ -159,27 +158,26 @@ TEST(Volumes, AreListedOnceWithWhatDfSays) {
   support::write_file(first + "/file", std::string(1000000, 'x'));
   support::write_file(VORN_PATH_SHARES, "[one]\npath = " + first + "\n[two]\npath = " + second +
                                             "\n[again]\npath = " + second + "\n");
-  EXPECT_EQ(0, support::wait_child(support::fork_child([&] {
-              const std::unique_ptr<VORNMountVolInfo, decltype(&VORNMountVolInfoFree)> volumes(
-                  VORNMountVolAllEnum(nullptr, VORN_VOLUMES_OF_USAGE), &VORNMountVolInfoFree);
-              std::multiset<std::string> paths;
-              for (const auto* volume = volumes.get(); volume != nullptr; volume = volume->next) {
-                paths.insert(volume->path);
-                if (volume->path == first || volume->path == second) {
-                  EXPECT_EQ(df(volume->path), described(*volume)) << volume->path;
-                }
-              }
-              for (const std::string& path : {std::string("/"), first, second}) {
-                EXPECT_EQ(1U, paths.count(path)) << path;
-              }
-              for (const char* path : {"/proc", "/dev", "/tmp", "/run"}) {
-                EXPECT_EQ(0U, paths.count(path)) << path;
-              }
-              char id[64];
-              EXPECT_LT(0, VornQazVolumeGetId("/tmp/vol-storag", id, sizeof id));
-              EXPECT_STREQ("/tmp/vol-storag...", id);
-              return testing::Test::HasFailure() ? 1 : 0;
-            })));
+  EXPECT_TRUE(support::passes_in_child([&] {
+    const std::unique_ptr<VORNMountVolInfo, decltype(&VORNMountVolInfoFree)> volumes(
+        VORNMountVolAllEnum(nullptr, VORN_VOLUMES_OF_USAGE), &VORNMountVolInfoFree);
+    std::multiset<std::string> paths;
+    for (const auto* volume = volumes.get(); volume != nullptr; volume = volume->next) {
+      paths.insert(volume->path);
+      if (volume->path == first || volume->path == second) {
+        EXPECT_EQ(df(volume->path), described(*volume)) << volume->path;
+      }
+    }
+    for (const std::string& path : {std::string("/"), first, second}) {
+      EXPECT_EQ(1U, paths.count(path)) << path;
+    }
+    for (const char* path : {"/proc", "/dev", "/tmp", "/run"}) {
+      EXPECT_EQ(0U, paths.count(path)) << path;
+    }
+    char id[64];
+    EXPECT_LT(0, VornQazVolumeGetId("/tmp/vol-storag", id, sizeof id));
+    EXPECT_STREQ("/tmp/vol-storag...", id);
+  }));
   VORNMountVolInfoFree(nullptr);
   EXPECT_EQ(nullptr, VORNMountVolAllEnum("filter", VORN_VOLUMES_OF_USAGE));
 }
@@ -191,16 +189,9 @@ TEST(VolumeId, IsSafeShortAndUnique) {
   EXPECT_EQ(plain48, host::volume_id(plain48));
   EXPECT_EQ("/srv/a_b-47bf2a0c", host::volume_id("/srv/a b")) << "stored from run to run";
 
-  const std::string hostile[] = {"/srv/a b",
-                                 "/srv/a'b",
-                                 "/srv/a\"b",
-                                 "/srv/a\\b",
-                                 "/srv/a\nb",
-                                 "/srv/a\xff"
-                                 "b",
-                                 plain48 + "1",
-                                 plain48 + "2",
-                                 "/" + std::string(4000, 'x')};
+  const std::string hostile[] = {"/srv/a b",    "/srv/a'b",    "/srv/a\"b",
+                                 "/srv/a\\b",   "/srv/a\nb",   "/srv/a\xff",
+                                 plain48 + "1", plain48 + "2", "/" + std::string(4000, 'x')};
   std::set<std::string> ids;
   for (const std::string& path : hostile) {
     const std::string id = host::volume_id(path);
