@@ -113,7 +113,8 @@ stop_log() {
 
 show_rows() { # CSV-FILE COLUMN-OF-NAME COUNT
   # Names may hold anything; a terminal gets no control characters from them.
-  tail -n +2 "$1" | head -n "$3" | tr -d '\000-\010\013-\037\177' | sed 's/^"//; s/"$//; s/""/"/g' |
+  # (Nothing here may stop reading early: the broken pipe would end this script.)
+  sed -n "2,$(($3 + 1))p" "$1" | tr -d '\000-\010\013-\037\177' | sed 's/^"//; s/"$//; s/""/"/g' |
     awk -F '"\t"' -v column="$2" '{ print $NF "\t" $column }' |
     numfmt --delimiter=$'\t' --to=iec-i --suffix=B | awk -F '\t' '{ printf "  %10s  %s\n", $1, $2 }'
 }
