@@ -14,8 +14,9 @@ class Quickstart(unittest.TestCase):
         self.folder = Path(tempfile.mkdtemp(prefix='vorn-', dir='/var/tmp'))
         self.addCleanup(shutil.rmtree, self.folder)
         self.clone = self.folder / 'clone'
-        shutil.copytree(ROOT, self.clone, symlinks=True, ignore=shutil.ignore_patterns(
-            'build*', '.git', 'quickstart-report', '__pycache__', 'node_modules'))
+        made = ('build', 'build-', '.git', 'quickstart-report')
+        shutil.copytree(ROOT, self.clone, symlinks=True, ignore=lambda folder, names: [
+            name for name in names if Path(folder) == ROOT and name.startswith(made)])
 
     def quickstart(self, *folders):
         return subprocess.run([self.clone / 'quickstart.sh', *folders], cwd=self.folder, text=True,
