@@ -1,6 +1,7 @@
 """What the reports must hold, computed from a tree: for tests that compare to the byte."""
 import os
 import time
+import unittest
 
 from harness import csv_field
 
@@ -51,8 +52,9 @@ class Tree:
         self.files = []
         self._now = int(time.time())
 
-    def add(self, share, name, content=b'', owner=0, days=30.0, label='other'):
-        """`content` is the file's bytes or its size; the file is `days` old."""
+    def add(self, share, name, content=b'', owner=None, days=30.0, label='other'):
+        """`content` is the file's bytes or its size; the file is `days` old. Only root can name
+        an owner."""
         if share not in self.folders:
             self.folders[share] = self.machine.share(share)
         path = os.path.join(self.folders[share], name)
@@ -65,14 +67,21 @@ class Tree:
         # Each file has a time of its own, so that the order of times is clear.
         changed = self._now - int(days * DAY) - len(self.files)
         os.utime(path, (changed, changed))
-        os.chown(path, owner, -1)
+        if owner is not None:
+            os.chown(path, owner, -1)
         size = content if isinstance(content, int) else len(content)
-        self.files.append((share, path, size, changed, owner, 'reportUI_file_type_' + label))
+        self.files.append((share, path, size, changed, os.stat(path).st_uid,
+                           'reportUI_file_type_' + label))
 
     def share_paths(self):
         return (SCRIPT + b'var vornSharePath = {\n' + b',\n'.join(
             b'[' + quoted(share) + b'] : ' + quoted(folder)
             for share, folder in sorted(self.folders.items())) + b'\n};\n</script>\n')
+
+
+def needs_root(test):
+    """For tests of what a plain user's machine can't have; a server's, and the build's, must."""
+    return unittest.skipIf(os.geteuid(), 'only root can give files away and mount')(test)
 
 
 def totals(keys_and_sizes):

@@ -3,7 +3,7 @@ import re
 import time
 import unittest
 
-from expected import SCRIPT, Tree
+from expected import SCRIPT, Tree, needs_root
 from harness import ProductTest
 from test_page import section, show
 
@@ -33,6 +33,7 @@ def heading(document, report):
     return re.search(f'<section data-report="{report}">\n<h2>(.*?)</h2>', document)[1]
 
 
+@needs_root
 class PageOfAll(ProductTest):
     def setUp(self):
         super().setUp()

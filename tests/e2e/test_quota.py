@@ -5,7 +5,7 @@ import struct
 import subprocess
 import unittest
 
-from expected import SCRIPT, data_blocks
+from expected import SCRIPT, data_blocks, needs_root
 from harness import PROGRAM, ProductTest
 
 ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002, 'carl': 3003, 'john-doe': 3004}
@@ -78,11 +78,9 @@ class QuotaTest(ProductTest):
         return run, data_blocks(self.m.report_folders('q')[-1]), run.out.split('<<<\n')[1]
 
 
+@needs_root
 class RealTool(QuotaTest):
     def setUp(self):
-        # Everybody else's machine may lack what this needs; root's, and so every CI's, must not.
-        if os.geteuid() != 0:
-            self.skipTest('only root can mount a file system with quotas')
         super().setUp()
         self.volume = self.m.base / 'volume'
         self.volume.mkdir()

@@ -4,7 +4,8 @@ import re
 import unittest
 from pathlib import Path
 
-from expected import DAY, MARK, SCRIPT, Tree, block, csv, data_blocks, local_time, totals
+from expected import (DAY, MARK, SCRIPT, Tree, block, csv, data_blocks, local_time, needs_root,
+                      totals)
 from harness import ProductTest, page_rows
 
 ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002, 'john-doe': 3003, 'eve': 3004}
@@ -91,6 +92,7 @@ class ReportTest(ProductTest):
 
 
 class Reports(ReportTest):
+    @needs_root
     def test_every_report_of_one_run(self):
         add = self.tree.add
         for owner, name in enumerate(('IMG_1.JPG', "it's.JPG", 'Übergröße.JPG')):
@@ -161,7 +163,7 @@ class Reports(ReportTest):
     def test_page_limits(self):
         for i in range(250):
             for half in 'ab':
-                self.tree.add('many', f'{half}/{i:03}.txt', 9, 0, 100 if half == 'a' else 1)
+                self.tree.add('many', f'{half}/{i:03}.txt', 9, None, 100 if half == 'a' else 1)
         folder = self.report(report_list='duplicate_file,least_modify,most_modify',
                              duplicate_compare='false')
         rows = self.duplicates()
@@ -171,6 +173,7 @@ class Reports(ReportTest):
         self.assertByTime(folder, 'least_modify', 'vornLeastModifyData', by_time[:250])
         self.assertByTime(folder, 'most_modify', 'vornMostModifyData', by_time[:-251:-1])
 
+    @needs_root
     def test_a_hundred_group_rows_for_all_sections(self):
         # 90 rows for all files, 10 of ann's 18, none of bob's.
         for label, ending in LABELS.items():
