@@ -1,0 +1,268 @@
+#!/usr/bin/python3
+"""Measures all nine reports, and duplicates by content, against what does the same work.
+
+    bench/reports.py FOLDER [--files N] [--rounds N] [--build DIR] [--only PART,...]
+
+Makes trees in FOLDER once (and uses them again later) and prints a table. The parts:
+
+    all      nine reports in one run on a tree of N files, against find (its list kept in a file)
+             and against pipelines.sh, which makes the same file reports
+    scale    the same run on file indexes of N and 10 N rows: no tree, only rows
+    content  duplicates by content against fdupes, and the digest against openssl md5
+    buckets  duplicates by content among N files of one size: empty ones, and different ones
+
+Each number is the median of the rounds; a first round warms the cache and is not counted. Peers
+alternate within a round, so that whatever else the machine does meets them all.
+"""
+import argparse
+import os
+import random
+import shutil
+import sqlite3
+import statistics
+import subprocess
+import sys
+import tempfile
+import time
+from pathlib import Path
+
+from gather import EXTENSIONS, FIND, ROOT, WORDS
+
+SHARES = 8
+OWNERS = 5
+REPORTS = ('quota_usage,file_owner,volume_usage,share_list,file_group,duplicate_file,large_file,'
+           'least_modify,most_modify')
+# Peak memory not from getrusage: that counts this interpreter, which the program was forked from.
+WATCH = r'''
+import re, subprocess, sys, time
+begin = time.monotonic()
+process = subprocess.Popen(sys.argv[1:], stdout=subprocess.DEVNULL)
+peak = "0"
+while process.poll() is None:
+    with open(f"/proc/{process.pid}/status") as status:
+        peak = (re.findall(r"VmHWM:\s+(\d+)", status.read()) or [peak])[0]
+    time.sleep(0.01)
+print(time.monotonic() - begin, peak)
+'''
+
+
+def made(folder, what):
+    """Whether `folder` holds `what` already; clears it if not."""
+    done = folder / '.complete'
+    if done.exists() and done.read_text() == what:
+        return True
+    print(f'making {folder} ...', flush=True)
+    shutil.rmtree(folder, ignore_errors=True)
+    folder.mkdir(parents=True)
+    return False
+
+
+def facts(count):
+    """Folder, name, size, age in days and number of the owner of `count` files; about one in 50
+    has the name and size of an earlier one."""
+    choice = random.Random(1)
+    name, size = 'first.txt', 1
+    for i in range(count):
+        if i % 50:
+            name = f'{choice.choice(WORDS)}_{choice.choice(WORDS)}_{i}.{choice.choice(EXTENSIONS)}'
+            size = int(choice.lognormvariate(11, 2.5))
+        number = i // 16
+        yield (f'share{number % SHARES}/{number // 1024}/{number // SHARES % 128}', name, size,
+               choice.randrange(1500), choice.randrange(OWNERS))
+
+
+def make_tree(folder, count):
+    if made(folder, str(count)):
+        return
+    now, last = time.time(), None
+    for place, name, size, age, owner in facts(count):
+        if place != last:
+            os.makedirs(folder / place, exist_ok=True)
+            last = place
+        path = f'{folder}/{place}/{name}'
+        with open(path, 'wb') as file:
+            file.truncate(size)
+        os.utime(path, (now - age * 86400,) * 2)
+        if os.geteuid() == 0:
+            os.chown(path, owner, owner)
+    (folder / '.complete').write_text(str(count))
+
+
+def make_index(folder, rows, what):
+    """A share's file index of (path, name, size, age in days, extension)."""
+    if made(folder, what):
+        return
+    now = int(time.time())
+    with sqlite3.connect(folder / 'index.db') as db:
+        db.execute('CREATE TABLE file_info (owner_name TEXT, time_modify TEXT, size TEXT, '
+                   'path TEXT, name TEXT, file_ext TEXT, is_dir INTEGER)')
+        db.executemany('INSERT INTO file_info VALUES (?, ?, ?, ?, ?, ?, 0)', (
+            ('root', now - age * 86400, size, path, name, name.rpartition('.')[2])
+            for path, name, size, age in rows))
+    (folder / '.complete').write_text(what)
+
+
+def make_equal_size(folder, count):
+    """Files of eight bytes, all different."""
+    if made(folder, str(count)):
+        return
+    for i in range(count):
+        if i % 1000 == 0:
+            (folder / str(i // 1000)).mkdir()
+        (folder / str(i // 1000) / str(i)).write_bytes(b'%08d' % i)
+    (folder / '.complete').write_text(str(count))
+
+
+def make_duplicates(folder, groups=5000):
+    """Groups of four files: three equal ones and one that differs in its last byte."""
+    if made(folder, str(groups)):
+        return
+    for i in range(groups):
+        place = folder / str(i // 100)
+        place.mkdir(exist_ok=True)
+        content = os.urandom(random.Random(i).randrange(4096, 1 << 17))
+        for j in range(4):
+            (place / f'{i}-{j}').write_bytes(content if j else content[:-1] + b'x')
+    (folder / '.complete').write_text(str(groups))
+
+
+class Bench:
+    def __init__(self, arguments, work):
+        self.base = arguments.folder.resolve() / 'vornreport-bench-reports'
+        self.files, self.rounds = arguments.files, arguments.rounds
+        self.work = Path(work).resolve()
+        self.stage = self.work / 'stage'
+        subprocess.run(['cmake', '--install', str(arguments.build)], check=True,
+                       stdout=subprocess.DEVNULL, env=os.environ | {'DESTDIR': str(self.stage)})
+        self.config = self.stage / 'usr/vorn/etc/vornreport.conf'
+        self.shipped = self.config.read_text()
+
+    def report(self, shares, reports='duplicate_file', **keys):
+        """Seconds and peak KiB of one run; `shares` is (name, folder, file index or None)."""
+        (self.stage / 'usr/vorn/etc/share.conf').write_text(''.join(
+            f'[{name}]\npath = {folder}\n' + (f'file_index = {index}\n' if index else '')
+            for name, folder, index in shares))
+        self.config.write_text(self.shipped + f'\n[bench]\nreport_list = {reports}\n' + ''.join(
+            f'{key} = {value}\n' for key, value in keys.items()))
+        result = subprocess.run(
+            [ROOT / 'tools/sandbox.sh', '--stage', self.stage, '--', sys.executable, '-c', WATCH,
+             '/usr/vorn/bin/vornreport', '--report', 'bench'], stdout=subprocess.PIPE, check=True,
+            stderr=subprocess.DEVNULL).stdout.split()
+        status = (self.stage / 'usr/vorn/var/status/bench').read_text().strip()
+        if status != 'success':
+            raise SystemExit(f'the report ended with the status "{status}"')
+        shutil.rmtree(self.stage / 'usr/vorn/var/reports/bench')
+        return float(result[0]), int(result[1]) / 1024
+
+    def timed(self, *command, output='list'):
+        start = time.monotonic()
+        with open(self.work / output, 'wb') as file:
+            subprocess.run(list(map(str, command)), stdout=file, check=True)
+        return time.monotonic() - start, 0
+
+    def compare(self, *runs):
+        """[(median seconds, greatest peak)] of the runs, taken in turns."""
+        results = [[] for _ in runs]
+        for number in range(self.rounds + 1):
+            for series, run in zip(results, runs):
+                series.append(run())
+            print('   ', ' '.join(f'{series[-1][0]:.2f}' for series in results), flush=True)
+        return [(statistics.median(seconds for seconds, _ in series[1:]),
+                 max(peak for _, peak in series)) for series in results]
+
+    def all(self):
+        tree = self.base / 'tree'
+        make_tree(tree, self.files)
+        pipes = self.work / 'pipes'
+        pipes.mkdir()
+        shares = [(f'share{i}', tree / f'share{i}', None) for i in range(SHARES)]
+        command = [str(tree) if part is None else part for part in FIND]
+        script = ROOT / 'bench/pipelines.sh'
+        (find, _), (shell, _), (once, _), (report, peak) = self.compare(
+            lambda: self.timed(*command), lambda: self.timed(script, tree, pipes),
+            lambda: self.timed(script, tree, pipes, 'once'), lambda: self.report(shares, REPORTS))
+        yield f'find, {self.files} files', f'{find:.2f} s', ''
+        yield 'pipelines.sh', f'{shell:.2f} s', f'{shell / find:.2f} x find'
+        yield 'pipelines.sh, one list for all', f'{once:.2f} s', f'{once / find:.2f} x find'
+        yield ('all nine reports', f'{report:.2f} s, {peak:.0f} MiB',
+               f'{report / find:.2f} x find, {report / shell:.2f} and {report / once:.2f} x '
+               'pipelines.sh')
+
+    def scale(self):
+        runs = []
+        for count in (self.files, 10 * self.files):
+            folder = self.base / f'index{count}'
+            make_index(folder, ((f'{place}/{name}', name, size, age)
+                                for place, name, size, age, _ in facts(count)), str(count))
+            runs.append(lambda folder=folder: self.report(
+                [('rows', folder, folder / 'index.db')], REPORTS))
+        (one, peak_one), (ten, peak_ten) = self.compare(*runs)
+        yield f'all nine reports, {self.files} rows', f'{one:.2f} s, {peak_one:.0f} MiB', ''
+        yield ('ten times the rows', f'{ten:.2f} s, {peak_ten:.0f} MiB',
+               f'{ten / one:.1f} x the time')
+
+    def content(self):
+        tree, large, empty = (self.base / name for name in ('duplicates', 'large', 'empty'))
+        make_duplicates(tree)
+        size = 1 << 29
+        if not made(large, 'two'):
+            for name in 'ab':
+                with open(large / name, 'wb') as file:
+                    for i in range(size >> 20):
+                        file.write(i.to_bytes(4, 'little') * (1 << 18))
+            (large / '.complete').write_text('two')
+        empty.mkdir(exist_ok=True)
+
+        def by_content(folder):
+            return lambda: self.report([('share', folder, None)], duplicate_compare='true')
+        (fdupes, _), (report, peak), (openssl, _), (digest, _), (idle, _) = self.compare(
+            lambda: self.timed('fdupes', '-r', '-q', tree), by_content(tree),
+            lambda: self.timed('openssl', 'md5', large / 'a', large / 'b'), by_content(large),
+            by_content(empty))
+        digest -= idle
+        yield 'fdupes, 20000 files, three in four equal', f'{fdupes:.2f} s', ''
+        yield ('duplicates by content', f'{report:.2f} s, {peak:.0f} MiB',
+               f'{fdupes / report:.2f} x the speed of fdupes')
+        yield 'openssl md5, 1 GiB', f'{1024 / openssl:.0f} MiB/s', ''
+        yield ('the digest', f'{1024 / digest:.0f} MiB/s',
+               f'{openssl / digest:.2f} x the speed of openssl')
+
+    def buckets(self):
+        tree = self.base / 'equal'
+        make_equal_size(tree, self.files)
+        runs = []
+        for count in (self.files // 4, self.files):
+            for size, name in ((0, 'none'), (8, 'equal')):
+                folder = self.base / f'{name}{count}'
+                make_index(folder, ((f'{i // 1000}/{i}', str(i), size, 9) for i in range(count)),
+                           str(count))
+                runs.append(lambda folder=folder: self.report(
+                    [('share', tree, folder / 'index.db')], duplicate_compare='true'))
+        results = self.compare(*runs)
+        for (quarter, _), (whole, peak), what in zip(
+                results[:2], results[2:], ('empty files', 'files of 8 bytes, all different')):
+            yield (f'{self.files} {what}', f'{whole:.2f} s, {peak:.0f} MiB',
+                   f'{whole / quarter:.1f} x the time of a quarter of them')
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument('folder', type=Path)
+    parser.add_argument('--files', type=int, default=1_000_000)
+    parser.add_argument('--rounds', type=int, default=5)
+    parser.add_argument('--build', type=Path, default=ROOT / 'build')
+    parser.add_argument('--only', default='all,scale,content,buckets')
+    arguments = parser.parse_args()
+    rows = []
+    with tempfile.TemporaryDirectory(dir=arguments.folder) as work:
+        bench = Bench(arguments, work)
+        for part in arguments.only.split(','):
+            print(part, flush=True)
+            rows += getattr(bench, part)()
+    print('| work | result | ratio |\n|---|---|---|')
+    for row in rows:
+        print('| ' + ' | '.join(row) + ' |')
+
+
+if __name__ == '__main__':
+    main()
