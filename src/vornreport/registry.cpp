@@ -40,7 +40,7 @@ constexpr bool names_stand_apart() {
   for (const ReportEntry& outer : kRegistry) {
     for (const ReportEntry& inner : kRegistry) {
       const std::string_view name(inner.name);
-      if (name.empty() || inner.report == nullptr ||
+      if (name.empty() ||
           (&outer != &inner && std::string_view(outer.name).find(name) != std::string_view::npos)) {
         return false;
       }

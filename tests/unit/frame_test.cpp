@@ -37,12 +37,6 @@ TEST_F(FrameTest, TwoReportsAppendTheirBlocksInOrder) {
   EXPECT_EQ(platform.calls, finished);
 }
 
-TEST_F(FrameTest, NoRowsLeaveALoneClosingTagAndTheHeader) {
-  EXPECT_EQ(run(share_list_db), 0);
-  EXPECT_EQ(data(), "</script>\n");
-  EXPECT_EQ(csv("share_list"), "Share\tSize\n");
-}
-
 TEST_F(FrameTest, LimitsCutThePageAndTheCsv) {
   {
     const SqliteHandle db = VORNReportDBInit(profile_.get());

@@ -72,15 +72,6 @@ class GatheringTest : public UnitTest {
   SqliteHandle db_;
 };
 
-TEST_F(GatheringTest, OpeningTwiceKeepsRows) {
-  struct stat status {};
-  const FileInfo info{"s", "/s/a", "a", nullptr, &status};
-  ASSERT_EQ(ReportDBAddFile(db_.get(), &info), 0);
-  db_ = VORNReportDBInit(profile_.get());
-  EXPECT_EQ(rows(db_.get(), "select share, path, filename, ext, typeof(ext) from file_stat"),
-            "s|/s/a|a||text\n");
-}
-
 TEST_F(GatheringTest, StoresWholeNumbersAndHostileTexts) {
   struct stat status {};
   status.st_uid = 4294967294U;
@@ -196,16 +187,6 @@ TEST_F(GatheringTest, WalkJudgesEveryFileSystemByItsKind) {
   rows(db_.get(), "delete from file_stat");
   EXPECT_EQ(walk("/dev"), 0);
   EXPECT_EQ(rows(db_.get(), "select count(*) from file_stat where path like '/dev/shm/%'"), "0\n");
-}
-
-TEST_F(GatheringTest, WalkFailsForABadTopFolder) {
-  const std::string file = folder_.path("file");
-  write_file(file, "");
-  for (const std::string& top : {folder_.path("missing"), file}) {
-    EXPECT_EQ(walk(top), -1);
-    const std::string text = support::syslog_text();
-    EXPECT_NE(text.find(")Failed to stat [" + top + "].\n\n"), std::string::npos) << text;
-  }
 }
 
 // As deep as a path can be: the files above the cut are found, the rest is logged and skipped, and

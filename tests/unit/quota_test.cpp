@@ -87,24 +87,6 @@ TEST_F(QuotaTest, KeepsTheHundredUsersOfSmallestUsage) {
   EXPECT_EQ(quota_volume_of(list_)->maxUserUsed, 2000U);
 }
 
-TEST_F(QuotaTest, WritesBothBlocks) {
-  set(users_, "ann", "1");
-  set(users_, "bob", "1");
-  parse(std::string(kHead) + "ann -- 30 40 0 0\nbob -- 60 0 0 0\n", "/srv/a-rather-long-path");
-  parse(std::string(kHead) + "ann -- 0 7 0 0\n", "/b");
-  platform.volume_ids = {{"/srv/a-rather-l", "A"}, {"/b", "B"}};
-  printed([&] { EXPECT_EQ(QuotaUsageWrite("p1", profile_.get(), list_, users_.get()), 0); });
-  EXPECT_EQ(data(),
-            "<script type='text/javascript'>\nvar vornQuotaUsageData = {\n'A' : {\n"
-            "\tmaxQuota : '5000',\n\tmaxUserUsed: 60,\n\tdata: [],\n\traw : [\n"
-            "[[0, 0, 50.000000]],\n[[0, 1, 100.000000]]\n],\n\tlabels : [\n\t\t'ann'\n\t\t,\n"
-            "\t\t'bob'\n\t]\n} , \n'B' : {\n\tmaxQuota : '7',\n\tmaxUserUsed: 0,\n\tdata: [],\n"
-            "\traw : [\n[[0, 0, -nan]]\n],\n\tlabels : [\n\t\t'ann'\n\t]\n}}\n</script>\n"
-            "<script type='text/javascript'>\nvar vornQuotaUsageTable = {\n'A' : [\n"
-            "['ann', 40960, 30720, 75.0],\n['bob', 0, 61440, -1.0]] , \n'B' : [\n"
-            "['ann', 7168, 0, 0.0]]}\n</script>\n");
-}
-
 TEST_F(QuotaTest, EndsACommandAtItsLimits) {
   const CommandLimits limits{.seconds = 1, .bytes = 1000};
   const auto all = [](const FileHandle& stream) {

@@ -6,8 +6,6 @@
 #include "rep_duplicate_file/content_groups.hpp"
 #include "rep_duplicate_file/duplicate_file.hpp"
 #include "rep_file_group.hpp"
-#include "rep_file_owner.hpp"
-#include "rep_modify_time.hpp"
 #include "report_fixture.hpp"
 
 namespace vornreport {
@@ -35,65 +33,6 @@ class ReportsTest : public ReportTest {
   }
 };
 
-TEST_F(ReportsTest, ModificationTimesHaveStrictBoundsAndOneImport) {
-  constexpr time_t kDay = 86400;
-  const time_t now = time(nullptr);
-  fill([&](sqlite3* db) {
-    for (const int days : {1, 6, 8, 89, 91, 400}) {
-      add(db, "s", "d" + std::to_string(days), 1, 0, now - days * kDay);
-    }
-  });
-  const auto seconds = [&](int days) { return std::to_string(now - days * kDay); };
-  EXPECT_EQ(run(least_modify_db), 0);
-  EXPECT_EQ(data(), std::string(kScript) +
-                        "var vornLeastModifyData = [\n[ 's', 'esc(/s/d400)'', "
-                        "'1', '" +
-                        seconds(400) + "' ],\n[ 's', 'esc(/s/d91)'', '1', '" + seconds(91) +
-                        "' ]\n];\n</script>\n");
-  EXPECT_EQ(csv("least_modify"),
-            "Share\tFile\tSize(Byte)\tModify Time\n\"s\"\t\"csv(/s/d400)\"\t\"csv(1)\"\t\"time(" +
-                seconds(400) + ")\"\n\"s\"\t\"csv(/s/d91)\"\t\"csv(1)\"\t\"time(" + seconds(91) +
-                ")\"\n");
-  unlink(data_.c_str());
-  platform.failing = {"TimeConvert"};
-  EXPECT_EQ(run(most_modify_db), 0);
-  EXPECT_EQ(data(), std::string("<import>") + kScript +
-                        "var vornMostModifyData = [\n[ 's', 'esc(/s/d1)'', '1', '" + seconds(1) +
-                        "' ]<import>,\n[ 's', 'esc(/s/d6)'', '1', '" + seconds(6) +
-                        "' ]\n];\n</script>\n");
-  EXPECT_NE(csv("most_modify").find("\t\"\"\n"), std::string::npos);
-  EXPECT_NE(support::syslog_text().find("translate time format error, time=" + seconds(1) + "\n"),
-            std::string::npos);
-}
-
-TEST_F(ReportsTest, OwnersAreNamedFilteredAndOrdered) {
-  platform.users = {{"ann", 10}, {"bob", 20}, {"eve", 30}};
-  set(users_, "ann", "1");
-  set(users_, "bob", "1");
-  fill([&](sqlite3* db) {
-    add(db, "small", "a", 5, 10);
-    add(db, "big", "a", 9, 10);
-    add(db, "many", "a", 4, 10);
-    add(db, "many", "b", 1, 10);
-    add(db, "small", "x", 1, 20);
-    add(db, "small", "e", 1, 30);   // outside the filter: silent
-    add(db, "small", "g", 1, 999);  // no account: logged
-  });
-  EXPECT_EQ(run(file_owner_db), 0);
-  EXPECT_EQ(data(), std::string(kScript) +
-                        "var vornFileOwnerData = [\n[ 'ann', 'big', '1', '9' ],\n"
-                        "[ 'ann', 'many', '2', '5' ],\n[ 'ann', 'small', '1', '5' ],\n"
-                        "[ 'bob', 'small', '1', '1' ]\n];\n</script>\n");
-  EXPECT_EQ(csv("file_owner")
-                .rfind("Owner\tShare\tFile Count\tSize(Byte)\n\"ann\"\t\"csv(big)\"\t"
-                       "\"csv(1)\"\t\"csv(9)\"\n",
-                       0),
-            0U);
-  const std::string log = support::syslog_text();
-  EXPECT_NE(log.find("get user name failed"), std::string::npos);
-  EXPECT_EQ(log.find("get user name failed"), log.rfind("get user name failed"));
-}
-
 TEST_F(ReportsTest, FileGroupSectionsShareTheirLimit) {
   platform.users = {{"ann", 10}, {"bob", 20}};
   EXPECT_EQ(outcome(file_group_db, "file_group"), "\n}</script>\n|Group, Share, Size\n");
@@ -117,42 +56,6 @@ TEST_F(ReportsTest, FileGroupSectionsShareTheirLimit) {
   EXPECT_EQ(std::count(full.begin(), full.end(), '['), 101);
   EXPECT_EQ(full.find("ann"), std::string::npos);
   EXPECT_NE(full.find("]]\n\n]\n\n]\n\n}</script>\n"), std::string::npos);
-}
-
-TEST_F(ReportsTest, DuplicatesByNameAndSizeAreNumberedInOrder) {
-  fill([&](sqlite3* db) {
-    add(db, "s", "x/a.txt", 10, 0, 1);
-    add(db, "s", "y/a.txt", 10, 0, 2);
-    add(db, "s", "z/a.txt", 11);
-    add(db, "s", "x/b", 10);
-    add(db, "s", "x/big", 900);
-    add(db, "s", "y/big", 900);
-  });
-  const std::string text = outcome(duplicate_file, "duplicate_file");
-  EXPECT_EQ(text.rfind("<import>" + std::string(kScript) +
-                           "var vornDuplicateHashMatch = 0;\nvar vornDuplicateFileData = [\n"
-                           "[ '1', 's', 'esc(/s/x/big)'', '900', '0' ]",
-                       0),
-            0U)
-      << text;
-  EXPECT_NE(text.find("[ '2', 's', 'esc(/s/y/a.txt)'', '10', '2' ]\n];\n</script>\n|Duplicate "
-                      "Group\tShare\tFile\tSize(Byte)\tModify Time\n\"1\"\t\"csv(s)\""),
-            std::string::npos)
-      << text;
-  EXPECT_EQ(text.find("z/a.txt"), std::string::npos);
-  EXPECT_EQ(text.find("/b"), text.find("/big"));
-}
-
-TEST_F(ReportsTest, DuplicatesBeyondGroup200AreForTheCsvOnly) {
-  fill([&](sqlite3* db) {
-    for (int i = 0; i < 500; ++i) {
-      add(db, "s", std::to_string(i % 2) + "/f" + std::to_string(i / 2), 1000 - i / 2);
-    }
-  });
-  const std::string text = outcome(duplicate_file, "duplicate_file");
-  EXPECT_NE(text.find("[ '200', 's'"), std::string::npos);
-  EXPECT_EQ(text.find("[ '201', 's'"), std::string::npos);
-  EXPECT_NE(text.find("\"250\"\t"), std::string::npos);
 }
 
 // What the pairwise walk over a bucket gives, computed the plain way.

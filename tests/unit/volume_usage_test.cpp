@@ -111,31 +111,6 @@ TEST_F(VolumeUsageTest, HistoryIsChainedNewestFirstAndNamesNoLostVolume) {
   EXPECT_NE(output.find("===========>fetch row i=3, volume="), std::string::npos);
 }
 
-TEST_F(VolumeUsageTest, WritersLeaveOutVolumesWithoutIdentifier) {
-  add_volume("/v", sample("1200", "9", "2", sample("1000", "5", "6")), 12);
-  add_volume("", sample("900", "1", "1"), -1);
-  add_volume("/w", sample("1200", "0", "0"), -1);
-  platform.volume_ids = {{"/v", "vol-v"}, {"/w", "vol-w"}};
-  printed([&] {
-    EXPECT_EQ(VolumeUsageWriteCurrent("p1", profile_.get(), list_), 2);
-    EXPECT_EQ(VolumeUsageWriteHistory("p1", profile_.get(), list_), 2);
-    EXPECT_EQ(VolumeUsageWriteCsv("p1", profile_.get(), list_), 0);
-  });
-  EXPECT_EQ(data(),
-            "<script type='text/javascript'>\nvar vornVolumeUsageData = [\n"
-            "[ 'vol-v', 9 , 2, '50.0000%', '12' ],\n[ 'vol-w', 0 , 0, '50.0000%', '-' ]\n];\n"
-            "</script>\n<script type='text/javascript'>\nvar vornVolumeUsageDataHistory = {\n"
-            "'vol-v' : [\n[ '1200', 50.0000 ],\n[ '1000', 50.0000 ]\n],\n"
-            "'vol-w' : [\n[ '1200', 50.0000 ]\n]\n};\n</script>\n");
-  EXPECT_EQ(csv("volume_usage"),
-            "Volume, Size, Used, Daty to Full\n\"/v\", \"11\" ,\"50.0000%\", \"12\"\n"
-            "\"\", \"2\" ,\"50.0000%\", \"-\"\n\"/w\", \"0\" ,\"50.0000%\", \"-\"\n");
-  platform.volume_ids.clear();
-  unlink(data_.c_str());
-  printed([&] { EXPECT_EQ(VolumeUsageWriteCurrent("p1", profile_.get(), list_), 0); });
-  EXPECT_EQ(data(), "");
-}
-
 TEST_F(VolumeUsageTest, CollectingStoresOneDateForAllVolumes) {
   platform.mounted = {{"/srv/with a rather long mount path", 25, 100}, {"/b", 0, 0}};
   printed([&] { EXPECT_EQ(volume_usage_collect_data("p1", profile_.get()), 0); });
