@@ -2,6 +2,7 @@
 
 #include <curl/curl.h>
 #include <sys/random.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -175,6 +176,16 @@ class Delivery {
   }
   Delivery(const Delivery&) = delete;
   Delivery& operator=(const Delivery&) = delete;
+  // libcurl's clean-up says QUIT and would wait two minutes for the answer of a server that has
+  // gone silent, whatever the limits; with nothing more to read it waits for none.
+  ~Delivery() {
+    curl_socket_t open_socket = CURL_SOCKET_BAD;
+    if (curl_ != nullptr &&
+        curl_easy_getinfo(curl_.get(), CURLINFO_ACTIVESOCKET, &open_socket) == CURLE_OK &&
+        open_socket != CURL_SOCKET_BAD) {
+      shutdown(open_socket, SHUT_RD);
+    }
+  }
 
   enum class Result { sent, refused, unreachable };
 
@@ -289,11 +300,11 @@ class Delivery {
 int deliver_to_all(const char* profile, const MailText& text, const Server& server,
                    const MailLimits& limits) {
   const std::string message = mail_message(text);
-  Delivery delivery(server, text.from, message, limits);
+  auto delivery = std::make_unique<Delivery>(server, text.from, message, limits);
   int served = 0;
   int error = 0;
   for (std::size_t i = 0; i < text.to.size(); ++i) {
-    const Delivery::Result result = delivery.send(text.to[i]);
+    const Delivery::Result result = delivery->send(text.to[i]);
     if (result == Delivery::Result::sent) {
       ++served;
       continue;
@@ -303,12 +314,13 @@ int deliver_to_all(const char* profile, const MailText& text, const Server& serv
       log_line(
           "profile \"%s\": mail server %s can't be used (%s), %zu recipients not served; "
           "check smtp_url in %s",
-          profile, server.url.c_str(), delivery.reason(), text.to.size() - i, VORN_PATH_CONFIG);
+          profile, server.url.c_str(), delivery->reason(), text.to.size() - i, VORN_PATH_CONFIG);
       break;
     }
     log_line("profile \"%s\": mail server %s refused the mail to %s: %s", profile,
-             server.url.c_str(), text.to[i].c_str(), delivery.reason());
+             server.url.c_str(), text.to[i].c_str(), delivery->reason());
   }
+  delivery.reset();  // which has an errno of its own
   errno = error;
   return served > 0 ? 0 : -1;
 }

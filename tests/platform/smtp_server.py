@@ -26,6 +26,7 @@ class Recorder:
         return "250 OK"
 
     async def handle_DATA(self, server, session, envelope):
+        await asyncio.sleep(self.options.wait)
         self.count += 1
         head = (
             f"X-Test-From: {envelope.mail_from}\r\n"
@@ -66,5 +67,6 @@ if __name__ == "__main__":
     parser.add_argument("--refuse", help="a recipient, or * for all")
     parser.add_argument("--login", help="USER:PASSWORD that must be given")
     parser.add_argument("--certificate", help="PEM file with key and certificate, for STARTTLS")
+    parser.add_argument("--wait", type=int, default=0, help="seconds before a message is stored")
     parser.add_argument("--smtps", action="store_true", help="TLS from the start")
     asyncio.run(serve(parser.parse_args()))
