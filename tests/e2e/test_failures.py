@@ -100,23 +100,18 @@ class Survived(ProductTest):
         good = self.m.share('good')
         make_files(good, {'a.jpg': 10})
         with self.m.shares.open('a') as file:
-            for name, path in (('007', good), ('-1e5', good), ('a,b', good), ("it's", good),
-                               ('=sum', good), ('x' * 65, good), ('relative', 'a/b'),
-                               ('quote', "/it's"), ('gone', self.m.base / 'gone'),
-                               ('file', '/etc/hostname'), ('remote', '/proc')):
+            for name, path in (('007', good), ("it's", good), ('relative', 'a/b'),
+                               ('gone', self.m.base / 'gone'), ('file', '/etc/hostname'),
+                               ('remote', '/proc')):
                 file.write(f'[{name}]\npath = {path}\n')
-            file.write('[pathless]\n')
         self.m.profile('weekly', report_list=REPORTS)
         run = self.m.run('--report', 'weekly')
         self.assertEqual(self.m.status('weekly'), 'success')
         page = self.m.report_folders('weekly')[0] / 'report.html'
         self.assertEqual([row[0] for row in page_rows(page, 'vornShareListData')], [b'good'])
         log = '\n'.join(run.log_lines)
-        for line in ('"007" is left out: it is a number', '"-1e5" is left out', '"a,b" is left out',
-                     '"it\'s" is left out', '"=sum" is left out', '"xxx.* is left out',
+        for line in ('"007" is left out: it is a number', '"it\'s" is left out',
                      '"relative" can\'t be read: its path is not absolute',
-                     '"quote" can\'t be read: its path holds a single quote',
-                     '"pathless" can\'t be read: it has no path',
                      r'Failed to stat \[.*/gone\]', r'Failed to stat \[/etc/hostname\]'):
             self.assertRegex(log, line)
 

@@ -114,25 +114,6 @@ class Report(ProductTest):
                 folder = self.assertSucceeded(self.m.run('--report', 'weekly'), 'weekly')
                 self.assertReportRight(folder)
 
-    def test_killed_while_it_walks(self):
-        many = self.m.share('many')
-        make_files(many, {'file': 1})
-        for folder in range(100):
-            os.mkdir(many / str(folder))
-            for name in range(200):
-                os.link(many / 'file', many / str(folder) / str(name))
-        run = self.m.start('--report', 'weekly')
-        run.read_until(b'stat share=many')
-        run.signal(signal.SIGKILL)
-        self.assertNotIn('stat complete', run.finish().out)
-        folder = self.assertSucceeded(self.m.run('--report', 'weekly'), 'weekly')
-        self.assertIn([b'many', b'20001'],
-                      [[row[0], row[2]] for row in page_rows(folder / 'report.html',
-                                                             'vornShareListData')])
-        # The page keeps its limit, the CSV file its own.
-        self.assertEqual(len(page_rows(folder / 'report.html', 'vornLargeFileData')), 200)
-        self.assertEqual((folder / 'csv/large_file.csv').read_bytes().count(b'\n'), 10001)
-
     def test_only_selected_shares_and_reports(self):
         make_files(self.m.share('empty'), {})
         self.m.profile('some', report_list='large_file_db', share_list='empty, photos')

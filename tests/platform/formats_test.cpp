@@ -8,7 +8,6 @@
 #include <ctime>
 
 #include "support.hpp"
-#include "text_containers.hpp"
 #include "vorn/report.h"
 
 using support::make_hash;
@@ -132,16 +131,6 @@ TEST(SharePaths, AreOneBlockSortedAndQuoted) {
         read_file(folder.path("data")));
   }
   std::fclose(data);
-}
-
-TEST(FileTypes, IgnoreCaseAndHoldNoExtensionTwice) {
-  const support::Hash hash = make_hash();
-  VLIBCSzHash* filled = hash.get();
-  const int count = VornQazInitFileTypeHash(&filled);
-  EXPECT_EQ(static_cast<int>(hash->sorted().size()), count);
-  EXPECT_STREQ("reportUI_file_type_image", VLIBCSzHashGetValue(filled, "JPG"));
-  EXPECT_STREQ("reportUI_file_type_document", VLIBCSzHashGetValue(filled, "Docx"));
-  EXPECT_EQ(nullptr, VLIBCSzHashGetValue(filled, ""));
 }
 
 TEST(Language, IsAPlainCodeOrEnglish) {
