@@ -11,12 +11,14 @@ Makes trees in FOLDER once (and uses them again later) and prints a table. The p
     content  duplicates by content against fdupes, and the digest against openssl md5
     buckets  duplicates by content among N files of one size: empty ones, and different ones
 
-Each number is the median of the rounds; a first round warms the cache and is not counted. Peers
-alternate within a round, so that whatever else the machine does meets them all.
+Each number is the median of the rounds (peak memory: the greatest); a first round warms the cache
+and is not counted. Peers alternate within a round, so that whatever else the machine does meets
+them all; the CPU time, in brackets, tells how busy a machine was when it is far from the other.
 """
 import argparse
 import os
 import random
+import resource
 import shutil
 import sqlite3
 import statistics
@@ -34,7 +36,7 @@ REPORTS = ('quota_usage,file_owner,volume_usage,share_list,file_group,duplicate_
            'least_modify,most_modify')
 # Peak memory not from getrusage: that counts this interpreter, which the program was forked from.
 WATCH = r'''
-import re, subprocess, sys, time
+import re, resource, subprocess, sys, time
 begin = time.monotonic()
 process = subprocess.Popen(sys.argv[1:], stdout=subprocess.DEVNULL)
 peak = "0"
@@ -42,7 +44,8 @@ while process.poll() is None:
     with open(f"/proc/{process.pid}/status") as status:
         peak = (re.findall(r"VmHWM:\s+(\d+)", status.read()) or [peak])[0]
     time.sleep(0.01)
-print(time.monotonic() - begin, peak)
+used = resource.getrusage(resource.RUSAGE_CHILDREN)
+print(time.monotonic() - begin, used.ru_utime + used.ru_stime, int(peak) / 1024)
 '''
 
 
@@ -126,6 +129,20 @@ def make_duplicates(folder, groups=5000):
     (folder / '.complete').write_text(str(groups))
 
 
+class Result:
+    def __init__(self, rounds):
+        self.seconds = statistics.median(run[0] for run in rounds[1:])
+        self.cpu = statistics.median(run[1] for run in rounds[1:])
+        self.peak = max(run[2] for run in rounds)
+
+    def __truediv__(self, other):
+        return self.seconds / other.seconds
+
+    def __str__(self):
+        memory = f', {self.peak:.0f} MiB' if self.peak else ''
+        return f'{self.seconds:.2f} s ({self.cpu:.2f} s){memory}'
+
+
 class Bench:
     def __init__(self, arguments, work):
         self.base = arguments.folder.resolve() / 'vornreport-bench-reports'
@@ -138,7 +155,7 @@ class Bench:
         self.shipped = self.config.read_text()
 
     def report(self, shares, reports='duplicate_file', **keys):
-        """Seconds and peak KiB of one run; `shares` is (name, folder, file index or None)."""
+        """Seconds, CPU seconds and peak MiB; `shares` is (name, folder, index or None)."""
         (self.stage / 'usr/vorn/etc/share.conf').write_text(''.join(
             f'[{name}]\npath = {folder}\n' + (f'file_index = {index}\n' if index else '')
             for name, folder, index in shares))
@@ -152,23 +169,25 @@ class Bench:
         if status != 'success':
             raise SystemExit(f'the report ended with the status "{status}"')
         shutil.rmtree(self.stage / 'usr/vorn/var/reports/bench')
-        return float(result[0]), int(result[1]) / 1024
+        return tuple(map(float, result))
 
     def timed(self, *command, output='list'):
-        start = time.monotonic()
+        def cpu():
+            used = resource.getrusage(resource.RUSAGE_CHILDREN)
+            return used.ru_utime + used.ru_stime
+        start, before = time.monotonic(), cpu()
         with open(self.work / output, 'wb') as file:
             subprocess.run(list(map(str, command)), stdout=file, check=True)
-        return time.monotonic() - start, 0
+        return time.monotonic() - start, cpu() - before, 0
 
     def compare(self, *runs):
-        """[(median seconds, greatest peak)] of the runs, taken in turns."""
+        """The Result of each run, taken in turns."""
         results = [[] for _ in runs]
         for number in range(self.rounds + 1):
             for series, run in zip(results, runs):
                 series.append(run())
             print('   ', ' '.join(f'{series[-1][0]:.2f}' for series in results), flush=True)
-        return [(statistics.median(seconds for seconds, _ in series[1:]),
-                 max(peak for _, peak in series)) for series in results]
+        return [Result(series) for series in results]
 
     def all(self):
         tree = self.base / 'tree'
@@ -178,13 +197,13 @@ class Bench:
         shares = [(f'share{i}', tree / f'share{i}', None) for i in range(SHARES)]
         command = [str(tree) if part is None else part for part in FIND]
         script = ROOT / 'bench/pipelines.sh'
-        (find, _), (shell, _), (once, _), (report, peak) = self.compare(
+        find, shell, once, report = self.compare(
             lambda: self.timed(*command), lambda: self.timed(script, tree, pipes),
             lambda: self.timed(script, tree, pipes, 'once'), lambda: self.report(shares, REPORTS))
-        yield f'find, {self.files} files', f'{find:.2f} s', ''
-        yield 'pipelines.sh', f'{shell:.2f} s', f'{shell / find:.2f} x find'
-        yield 'pipelines.sh, one list for all', f'{once:.2f} s', f'{once / find:.2f} x find'
-        yield ('all nine reports', f'{report:.2f} s, {peak:.0f} MiB',
+        yield f'find, {self.files} files', find, ''
+        yield 'pipelines.sh', shell, f'{shell / find:.2f} x find'
+        yield 'pipelines.sh, one list for all', once, f'{once / find:.2f} x find'
+        yield ('all nine reports', report,
                f'{report / find:.2f} x find, {report / shell:.2f} and {report / once:.2f} x '
                'pipelines.sh')
 
@@ -196,10 +215,10 @@ class Bench:
                                 for place, name, size, age, _ in facts(count)), str(count))
             runs.append(lambda folder=folder: self.report(
                 [('rows', folder, folder / 'index.db')], REPORTS))
-        (one, peak_one), (ten, peak_ten) = self.compare(*runs)
-        yield f'all nine reports, {self.files} rows', f'{one:.2f} s, {peak_one:.0f} MiB', ''
-        yield ('ten times the rows', f'{ten:.2f} s, {peak_ten:.0f} MiB',
-               f'{ten / one:.1f} x the time')
+        one, ten = self.compare(*runs)
+        yield f'all nine reports, {self.files} rows', one, ''
+        yield ('ten times the rows', ten,
+               f'{ten / one:.1f} x the time, {ten.cpu / one.cpu:.1f} x the CPU time')
 
     def content(self):
         tree, large, empty = (self.base / name for name in ('duplicates', 'large', 'empty'))
@@ -215,16 +234,15 @@ class Bench:
 
         def by_content(folder):
             return lambda: self.report([('share', folder, None)], duplicate_compare='true')
-        (fdupes, _), (report, peak), (openssl, _), (digest, _), (idle, _) = self.compare(
+        fdupes, report, openssl, digest, idle = self.compare(
             lambda: self.timed('fdupes', '-r', '-q', tree), by_content(tree),
             lambda: self.timed('openssl', 'md5', large / 'a', large / 'b'), by_content(large),
             by_content(empty))
-        digest -= idle
-        yield 'fdupes, 20000 files, three in four equal', f'{fdupes:.2f} s', ''
-        yield ('duplicates by content', f'{report:.2f} s, {peak:.0f} MiB',
-               f'{fdupes / report:.2f} x the speed of fdupes')
-        yield 'openssl md5, 1 GiB', f'{1024 / openssl:.0f} MiB/s', ''
-        yield ('the digest', f'{1024 / digest:.0f} MiB/s',
+        digest.seconds -= idle.seconds
+        yield 'fdupes, 20000 files, three in four equal', fdupes, ''
+        yield 'duplicates by content', report, f'{fdupes / report:.2f} x the speed of fdupes'
+        yield 'openssl md5, 1 GiB', openssl, f'{1024 / openssl.seconds:.0f} MiB/s'
+        yield ('the digest', digest, f'{1024 / digest.seconds:.0f} MiB/s, '
                f'{openssl / digest:.2f} x the speed of openssl')
 
     def buckets(self):
@@ -239,9 +257,9 @@ class Bench:
                 runs.append(lambda folder=folder: self.report(
                     [('share', tree, folder / 'index.db')], duplicate_compare='true'))
         results = self.compare(*runs)
-        for (quarter, _), (whole, peak), what in zip(
+        for quarter, whole, what in zip(
                 results[:2], results[2:], ('empty files', 'files of 8 bytes, all different')):
-            yield (f'{self.files} {what}', f'{whole:.2f} s, {peak:.0f} MiB',
+            yield (f'{self.files} {what}', whole,
                    f'{whole / quarter:.1f} x the time of a quarter of them')
 
 
@@ -261,7 +279,7 @@ def main():
             rows += getattr(bench, part)()
     print('| work | result | ratio |\n|---|---|---|')
     for row in rows:
-        print('| ' + ' | '.join(row) + ' |')
+        print('| ' + ' | '.join(map(str, row)) + ' |')
 
 
 if __name__ == '__main__':
