@@ -1,9 +1,10 @@
 #!/bin/sh
 # Builds the frame of the report page around the data blocks that the reports append.
 #
-# The page stands alone: style, dictionary and script are put into it. A sub-command that fails
-# writes no more of its part, and `tail` ends only a body file whose parts are all there: the last
-# line of the page, </html>, stands for a complete page.
+# The page stands alone: style, dictionary and script are put into it. A page is complete when it
+# begins with <!DOCTYPE html> and ends with </html>. So that a page that lost a part in between, on a
+# disk that was full for a moment, never is: a sub-command that can't write its part of the page
+# empties the page, and `tail` ends only a body file whose parts are all there.
 set -eu
 
 here=${0%/*}/template
@@ -24,6 +25,16 @@ USAGE
 fail() {
   echo "build-template.sh: $1" >&2
   exit 1
+}
+
+# Writes a part of the page in one piece, behind what is there.
+add_to_page() { # FILE TEXT
+  printf '%s\n' "$2" >>"$1" || spoil "$1" "it can't be written to"
+}
+
+spoil() { # FILE REASON
+  : >"$1"
+  fail "$1 is no page any more: $2"
 }
 
 require_part() { # FILE LAST-LINE...
@@ -135,16 +146,20 @@ esac
 
 case $command$# in
   header2)
-    start_page >"$file"
+    text=$(start_page)
+    : >"$file"
+    add_to_page "$file" "$text"
     ;;
   lang3)
-    require_part "$file" '</style>'
-    language "$word" >>"$file"
+    text=$(language "$word")
+    [ -f "$file" ] || fail "$file is missing; start it with: header $file"
+    [ "$(tail -n 1 -- "$file")" = '</style>' ] || spoil "$file" "its beginning is not whole"
+    add_to_page "$file" "$text"
     ;;
   header3)
     [ -f "$file" ] || fail "$file is missing; start it with: header $file"
-    end=$(end_head "$file")
-    printf '%s\n' "$end" >>"$file"
+    text=$(end_head "$file")
+    add_to_page "$file" "$text"
     ;;
   body2)
     start_body >"$file"

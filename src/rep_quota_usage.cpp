@@ -186,15 +186,24 @@ void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSz
     return;
   }
   report_trace(kModule, __LINE__, "run cmd=%s\n\n", command.c_str());
-  const FileHandle output = open_limited(kModule, command.c_str(), kToolLimits);
+  FileHandle output = open_limited(kModule, command.c_str(), kToolLimits);
   if (!output) {
     REPORT_LOG_ERR(kModule, __LINE__, "run cmd failed, cmd=%s\n", command.c_str());
     return;
   }
   constexpr unsigned kKiBShift = 10;
-  if (QuotaUsageParse(output.get(), list, record.path, record.total_size >> kKiBShift, user_hash) <
-      0) {
+  QAZLLNode* volume = nullptr;
+  const int32_t reached = QuotaUsageParse(output.get(), &volume, record.path,
+                                          record.total_size >> kKiBShift, user_hash);
+  if (reached < 0) {
     REPORT_LOG_ERR(kModule, __LINE__, "parsing command failed\n");
+  }
+  // Half a table, of a tool that was ended at its limits, is not shown as a whole one.
+  const bool is_whole = std::fclose(output.release()) == 0;
+  if (is_whole && volume != nullptr && QAZLLadd(list, volume->data, nullptr) == 0) {
+    QAZLLfree(&volume, [](void* /*data*/) {});
+  } else {
+    QAZLLfree(&volume, QuotaFreeVolume);
   }
 }
 

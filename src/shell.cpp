@@ -187,7 +187,7 @@ ssize_t read_cookie(void* cookie, char* buffer, size_t size) {
 int close_cookie(void* cookie) {
   const std::unique_ptr<ReadCommand> command(static_cast<ReadCommand*>(cookie));
   command->finish();
-  return 0;
+  return command->ended ? EOF : 0;
 }
 
 }  // namespace

@@ -26,8 +26,8 @@ struct CommandLimits {
 int run_limited(const char* module, const char* command, const CommandLimits& limits);
 
 // Starts a command and gives its standard output to read, as popen(3) does. The stream ends early,
-// logged, when a limit is reached; closing it ends and awaits the command. Null when it could not
-// be started.
+// logged, when a limit is reached, and fclose then fails; closing it awaits the command. Null when
+// it could not be started.
 FileHandle open_limited(const char* module, const char* command, const CommandLimits& limits);
 
 // Ends the command that is being waited for, if any, with everything it started, and waits for its

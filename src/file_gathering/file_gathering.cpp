@@ -11,6 +11,7 @@
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
 #include "vornreport/handles.hpp"
+#include "vornreport/report_data.hpp"
 #include "vornreport/statistics_db.hpp"
 
 namespace vornreport {
@@ -89,15 +90,17 @@ int file_gathering(const char* profile, const VLIBCSzHash* profile_hash) {
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Bad Parameter");
     return -1;
   }
+  forget_gathered();
   Gathering gathering;
   if (!prepare(gathering, profile_hash)) {
     return -1;
   }
+  remember_gathered(profile_hash);
   report_trace(kGatheringModule, __LINE__, "stat start\n\n");
   std::fflush(nullptr);
   int walked = 0;
   const int count = VLIBCSzListCount(gathering.shares.get());
-  for (int i = 0; i < count; ++i) {
+  for (int i = 0; i < count && !report_data_lost(); ++i) {
     if (gather_share(gathering, VLIBCSzListGet(gathering.shares.get(), i), profile_hash)) {
       ++walked;
     }

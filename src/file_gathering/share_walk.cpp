@@ -19,6 +19,7 @@
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
 #include "vornreport/handles.hpp"
+#include "vornreport/report_data.hpp"
 #include "vornreport/statistics_db.hpp"
 
 namespace vornreport {
@@ -92,7 +93,11 @@ class Walk {
     }
     struct stat opened {};
     // Replaced between the look and the open: its kind was not the one that was judged.
-    if (fstat(fd, &opened) != 0 || opened.st_dev != device) {
+    if (fstat(fd, &opened) != 0) {
+      return stat_failed();
+    }
+    if (opened.st_dev != device) {
+      errno = ESTALE;
       return stat_failed();
     }
     int error = 0;
@@ -100,6 +105,11 @@ class Walk {
       add_entry(fd, *entry, length, device);
       path_.data()[length] = '\0';
       cut_ = false;
+      // On a full disk every further insert would fail, each with its own fsync; the run has
+      // failed.
+      if (report_data_lost()) {
+        return 0;
+      }
     }
     return error == 0 ? 0 : open_failed();
   }
@@ -140,7 +150,12 @@ class Walk {
       stat_failed();
       return;
     }
-    if (fstatat(parent, name.data(), &status, kNoFollow) != 0 || !S_ISREG(status.st_mode)) {
+    if (fstatat(parent, name.data(), &status, kNoFollow) != 0) {
+      stat_failed();
+      return;
+    }
+    if (!S_ISREG(status.st_mode)) {
+      errno = ESTALE;
       stat_failed();
       return;
     }

@@ -4,9 +4,11 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <charconv>
 #include <cstdint>
 #include <cstring>
+#include <string>
 #include <string_view>
 
 #include "module.hpp"
@@ -20,6 +22,14 @@ namespace {
 constexpr char kCreateTable[] =
     "CREATE TABLE if not exists file_stat (id INTEGER PRIMARY KEY ASC, owner INTEGER, mtime "
     "INTEGER, size INTEGER, share STRING, path STRING, filename STRING, ext STRING);";
+
+// The database that the run's gathering has filled.
+struct GatheredDatabase {
+  std::string path;
+  dev_t device;
+  ino_t inode;
+};
+GatheredDatabase g_gathered;
 
 constexpr size_t kQuotedSize = 4096;
 constexpr size_t kStatementSize = 8192;
@@ -104,6 +114,27 @@ const char* missing_argument(const sqlite3* db, const FileInfo* info) {
   return nullptr;
 }
 
+void make_if_missing(const char* path) {
+  const int before = errno;
+  if (access(path, F_OK) != 0) {
+    errno = before;
+    VLIBCFileTouch(path);
+  }
+}
+
+// A database that was removed and made anew in the middle of a run (a clean of all profiles does
+// that) has lost its rows, and reports over it would look like those of empty shares.
+void check_gathered_database(const char* path) {
+  struct stat status {};
+  if (g_gathered.path != path || stat(path, &status) != 0) {
+    return;
+  }
+  if (g_gathered.device != status.st_dev || g_gathered.inode != status.st_ino) {
+    REPORT_LOG_ERR(kGatheringModule, __LINE__, "database=%s was removed during the run\n", path);
+    mark_report_data_lost();
+  }
+}
+
 void log_exec_failure(const char* sql, const char* message) {
   REPORT_LOG_ERR(kGatheringModule, __LINE__, "Exec sql:[%s] error: %s\n\n", sql,
                  message != nullptr ? message : "");
@@ -121,9 +152,7 @@ SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash) {
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "get stat db path failed");
     return nullptr;
   }
-  if (access(path, F_OK) != 0) {
-    VLIBCFileTouch(path);
-  }
+  make_if_missing(path);
   VornQazSetEnv();
   sqlite3* raw = nullptr;
   const int opened = sqlite3_open(path, &raw);
@@ -131,8 +160,12 @@ SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash) {
   if (opened != SQLITE_OK) {
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Can't open database: %s\n",
                           sqlite3_errmsg(raw));
+    if (is_storage_failure(opened)) {
+      mark_report_data_lost();
+    }
     return nullptr;
   }
+  check_gathered_database(path);
   VornQazSetEnv();
   char* message = nullptr;
   if (const int made = sqlite3_exec(raw, kCreateTable, nullptr, nullptr, &message);
@@ -145,6 +178,18 @@ SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash) {
     return nullptr;
   }
   return db;
+}
+
+void forget_gathered() {
+  g_gathered = {};
+}
+
+void remember_gathered(const VLIBCSzHash* profile_hash) {
+  const char* path = set_value(profile_hash, "real_path_stat_db");
+  struct stat status {};
+  if (path != nullptr && stat(path, &status) == 0) {
+    g_gathered = {path, status.st_dev, status.st_ino};
+  }
 }
 
 int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo) {

@@ -52,8 +52,8 @@ const char* interned(const char* text) {
   return texts.emplace(cut(text)).first->c_str();
 }
 
-// Opens a gathered file as the walk found it: below its share's folder and through no link, so that
-// a user who has put a link in its way since can't have another file read. Doesn't wait for the
+// Opens a gathered file as the walk found it: below its share's folder and through no link, which a
+// user may have put in its way since. Doesn't wait for the
 // writer of a fifo. Errors as open().
 int open_gathered(const dup_file_node& file) {
   constexpr uint64_t kFlags = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
@@ -70,7 +70,12 @@ int open_gathered(const dup_file_node& file) {
   while (*below == '/') {
     ++below;
   }
-  return static_cast<int>(syscall(SYS_openat2, top.get(), below, &how, sizeof how));
+  const auto opened = static_cast<int>(syscall(SYS_openat2, top.get(), below, &how, sizeof how));
+  if (opened < 0 && (errno == ENOSYS || errno == EPERM)) {
+    // A container that knows no openat2: only a link in the last place is refused then.
+    return openat(top.get(), below, static_cast<int>(kFlags));
+  }
+  return opened;
 }
 
 void log_open_failure(const dup_file_node& file) {
@@ -95,6 +100,7 @@ void read_sample(const dup_file_node& file, std::array<char, kSampleSize>& sampl
     return;
   }
   struct stat status {};
+  errno = ESTALE;  // for what is no regular file any more
   if (fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
       pread(opened.get(), sample.data(), length, static_cast<off_t>(offset)) < 0) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__,

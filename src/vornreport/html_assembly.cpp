@@ -1,6 +1,8 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
+
 #include "actions.hpp"
 #include "module.hpp"
 #include "shell.hpp"
@@ -13,8 +15,11 @@ namespace vornreport {
 namespace {
 
 bool is_link(const char* path) {
+  const int before = errno;
   struct stat status {};
-  return lstat(path, &status) == 0 && S_ISLNK(status.st_mode);
+  const bool result = lstat(path, &status) == 0 && S_ISLNK(status.st_mode);
+  errno = before;
+  return result;
 }
 
 // Sections stand in registry order, whatever the order in the list. Their number.

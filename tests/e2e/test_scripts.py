@@ -93,9 +93,11 @@ class Template(unittest.TestCase):
                 self.assertEqual(self.call(command, self.file, *word).returncode, 1)
                 self.assertFalse(os.path.exists(self.file))
         Path(self.file).write_text('<main>\ncut sho')
-        for command, *word in (('lang', 'en'), ('body', 'x'), ('tail',)):
+        # The page itself is emptied: what is added to a damaged one must never make it look whole.
+        for command, word, left in (('body', ['x'], '<main>\ncut sho'),
+                                    ('tail', [], '<main>\ncut sho'), ('lang', ['en'], '')):
             self.assertEqual(self.call(command, self.file, *word).returncode, 1)
-        self.assertEqual(Path(self.file).read_text(), '<main>\ncut sho')
+            self.assertEqual(Path(self.file).read_text(), left)
 
     def test_links_are_not_followed(self):
         os.symlink(self.file + '2', self.file)

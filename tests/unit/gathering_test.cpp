@@ -330,6 +330,24 @@ TEST_F(GatheringTest, FailedImportIsWalkedAndItsRowsStandTwice) {
   EXPECT_EQ(output.find("share=left"), std::string::npos);
 }
 
+// A clean of all profiles removes databases of running reports too.
+TEST_F(GatheringTest, ADatabaseRemovedInTheRunIsLostData) {
+  platform.shares = {{"s", folder_.path("none")}};
+  const std::string log = in_child([&] {
+    printed([&] {
+      file_gathering("p1", profile_.get());
+      VORNReportDBInit(profile_.get());
+    });
+    const bool kept = !report_data_lost();
+    // Another file keeps the number of the removed one from being used again.
+    unlink(folder_.path("stat.db").c_str());
+    support::write_file(folder_.path("taken"), "");
+    printed([&] { VORNReportDBInit(profile_.get()); });
+    return std::string(kept && report_data_lost() ? "lost only then" : "");
+  });
+  EXPECT_EQ(log, "lost only then");
+}
+
 TEST_F(GatheringTest, GatheringDoesNotStartWithoutItsParts) {
   platform.shares = {{"s", folder_.path()}};
   const struct {
