@@ -45,17 +45,5 @@ TEST_F(ErrorLogTest, KeepsLongAndPercentTextsWhole) {
   EXPECT_EQ(support::syslog_text(), "src/x:1 [" + name + "]\n");
 }
 
-TEST_F(ErrorLogTest, TraceIsForStandardOutputOnly) {
-  EXPECT_EQ(printed([] { report_trace("src/x", 3, "run %d\n\n", 5); }), "(src/x:3)run 5\n\n");
-  EXPECT_EQ(support::syslog_text(), "");
-}
-
-TEST_F(ErrorLogTest, InvalidArgumentIsForSyslogOnly) {
-  VLIBCErrSetEx(0, "", 0);
-  EXPECT_EQ(printed([] { report_invalid_argument("src/x", 9, "NULL != p"); }), "");
-  EXPECT_EQ(support::syslog_text(), "src/x:9 Invaild Argument (NULL != p)=[0]\n");
-  EXPECT_EQ(VLIBCErrGet(), 0x0D00);
-}
-
 }  // namespace
 }  // namespace vornreport

@@ -13,30 +13,6 @@ namespace {
 
 using FrameTest = ReportTest;
 
-TEST_F(FrameTest, TwoReportsAppendTheirBlocksInOrder) {
-  add("photo", "b", 7);
-  add("video", "it's", 900);
-  set(volumes_, "photo", "/srv");
-  set(volumes_, "video", "/srv");
-  platform.volume_ids["/srv"] = "srv";
-  EXPECT_EQ(run(share_list_db), 0);
-  EXPECT_EQ(run(large_file_db), 0);
-  EXPECT_EQ(data(),
-            "<script type='text/javascript'>\nvar vornShareListData = [\n"
-            "[ 'video', 'srv', '900' ],\n[ 'photo', 'srv', '7' ]\n];\n</script>\n"
-            "<import><script type='text/javascript'>\nvar vornLargeFileData = [\n"
-            "[ 'video', 'esc(/video/it's)'', '900' ]<import>,\n"
-            "[ 'photo', 'esc(/photo/b)'', '7' ]\n];\n</script>\n");
-  EXPECT_EQ(csv("share_list"),
-            "Share\tSize\n\"video\"\t\"srv\"\t\"csv(900)\"\n\"photo\"\t\"srv\"\t\"csv(7)\"\n");
-  EXPECT_EQ(csv("large_file"),
-            "Share\tFile\tSize(Byte)\n\"video\"\t\"csv(/video/it's)\"\t\"csv(900)\"\n"
-            "\"photo\"\t\"csv(/photo/b)\"\t\"csv(7)\"\n");
-  const std::vector<std::string> finished = {"CsvFile " + folder_.path("share_list.csv"),
-                                             "CsvFile " + folder_.path("large_file.csv")};
-  EXPECT_EQ(platform.calls, finished);
-}
-
 TEST_F(FrameTest, LimitsCutThePageAndTheCsv) {
   {
     const SqliteHandle db = VORNReportDBInit(profile_.get());
@@ -75,14 +51,6 @@ TEST_F(FrameTest, FailedFormatsKeepTheRow) {
   EXPECT_NE(data().find("[ 's', '', '1' ]"), std::string::npos);
   EXPECT_EQ(csv("large_file"), "Share\tFile\tSize(Byte)\n\"s\"\t\"/s/a\"\t\"1\"\n");
   EXPECT_NE(support::syslog_text().find("escape file failed, file=half\n"), std::string::npos);
-}
-
-TEST_F(FrameTest, EmbeddedLeavesHeaderTagAndFinishToTheCaller) {
-  add("s", "a", 1);
-  EXPECT_EQ(run(large_file_db, 1), 0);
-  EXPECT_EQ(csv("large_file"), "\"s\"\t\"csv(/s/a)\"\t\"csv(1)\"\n");
-  EXPECT_EQ(data().find("</script>"), std::string::npos);
-  EXPECT_TRUE(platform.calls.empty());
 }
 
 TEST_F(FrameTest, MissingPiecesFailTheReport) {

@@ -72,17 +72,6 @@ class GatheringTest : public UnitTest {
   SqliteHandle db_;
 };
 
-TEST_F(GatheringTest, StoresWholeNumbersAndHostileTexts) {
-  struct stat status {};
-  status.st_uid = 4294967294U;
-  status.st_mtime = 4294967296L + 5;  // kept to 32 bits
-  status.st_size = 5368709120L;
-  const FileInfo info{"s", "/s/it's", "'); drop table file_stat; --", "x'y", &status};
-  ASSERT_EQ(ReportDBAddFile(db_.get(), &info), 0);
-  EXPECT_EQ(rows(db_.get(), "select owner, mtime, size, path, filename, ext from file_stat"),
-            "4294967294|5|5368709120|/s/it's|'); drop table file_stat; --|x'y\n");
-}
-
 // A text whose quotes don't fit the buffer once doubled is refused whole, wherever the cut would
 // have fallen: cut inside a doubled quote it would have ended its literal.
 TEST_F(GatheringTest, RefusesTextsWhoseQuotesDoNotFit) {
@@ -131,38 +120,6 @@ TEST_F(GatheringTest, AddFileNamesTheMissingArgument) {
               std::string::npos)
         << text;
   }
-}
-
-TEST_F(GatheringTest, WalkTakesRegularFilesOnly) {
-  const std::string top = folder_.path("top");
-  types_.reset(VLIBCSzHashAlloc(8));
-  VLIBCSzHash* types = types_.release();
-  VLIBCSzHashSetValue(&types, "gz", "archive");
-  VLIBCSzHashSetValue(&types, "profile", "dot");
-  VLIBCSzHashSetValue(&types, "", "empty");
-  types_.reset(types);
-  for (const char* name : {"a.tar.gz", ".profile", "ends.", "plain", "@eaDir/x", "in/@eaDir/y",
-                           "in/.hidden/z.GZ", "other/fs", "new\nline"}) {
-    write_file(top + "/" + name, "12345");
-  }
-  ASSERT_EQ(symlink("plain", (top + "/link").c_str()), 0);
-  ASSERT_EQ(symlink("/etc", (top + "/in/etc").c_str()), 0);
-  ASSERT_EQ(link((top + "/plain").c_str(), (top + "/in/hard").c_str()), 0);
-  ASSERT_EQ(mkfifo((top + "/fifo").c_str(), 0600), 0);
-  write_file(top + "/in/@eaDir.txt", "");
-  EXPECT_EQ(walk(top), 0);
-  EXPECT_EQ(rows(db_.get(), "select substr(path," + std::to_string(top.size() + 2) +
-                                "), filename, ext, size from file_stat order by path"),
-            ".profile|.profile|dot|5\n"
-            "a.tar.gz|a.tar.gz|archive|5\n"
-            "ends.|ends.|empty|5\n"
-            "in/.hidden/z.GZ|z.GZ|reportUI_file_type_other|5\n"
-            "in/@eaDir.txt|@eaDir.txt|reportUI_file_type_other|0\n"
-            "in/hard|hard|reportUI_file_type_other|5\n"
-            "new\nline|new\nline|reportUI_file_type_other|5\n"
-            "other/fs|fs|reportUI_file_type_other|5\n"
-            "plain|plain|reportUI_file_type_other|5\n");
-  EXPECT_EQ(support::syslog_text(), "");
 }
 
 TEST_F(GatheringTest, WalkJudgesEveryFileSystemByItsKind) {

@@ -74,19 +74,6 @@ TEST_F(QuotaTest, ReadsTheUserTableInAllItsForms) {
   EXPECT_EQ(kept(), "ann 1 2\n");
 }
 
-TEST_F(QuotaTest, KeepsTheHundredUsersOfSmallestUsage) {
-  std::string lines;
-  for (int i = 0; i < 1000; ++i) {
-    const std::string name = "u" + std::to_string(i);
-    set(users_, name, "1");
-    lines += name + " -- " + std::to_string(2000 - i) + " 0 0\n";
-  }
-  parse(kHead + lines);
-  EXPECT_EQ(quota_volume_of(list_)->users.size(), 100U);
-  EXPECT_EQ(kept().rfind("u999 1001 0\nu998 1002 0\n", 0), 0U);
-  EXPECT_EQ(quota_volume_of(list_)->maxUserUsed, 2000U);
-}
-
 TEST_F(QuotaTest, EndsACommandAtItsLimits) {
   const CommandLimits limits{.seconds = 1, .bytes = 1000};
   const auto all = [](const FileHandle& stream) {

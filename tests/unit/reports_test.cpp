@@ -147,24 +147,6 @@ TEST_F(ReportsTest, ContentGroupsAreThoseOfThePairwiseWalk) {
   }
 }
 
-TEST_F(ReportsTest, ContentModeClosesItsBlockItself) {
-  set_profile("duplicate_compare", "TRUE");
-  EXPECT_EQ(outcome(duplicate_file, "duplicate_file"), "</script>\n|");
-  fill([&](sqlite3* db) {
-    for (const char* name : {"t/e1", "t/e2"}) {
-      add(db, "s", name, 0);  // empty: equal without being opened
-    }
-    add(db, "s", "t/x", 7);
-    add(db, "s", "t/gone", 7);  // neither exists
-  });
-  const std::string text = outcome(duplicate_file, "duplicate_file");
-  EXPECT_EQ(text, "<import><import><import><import>" + std::string(kScript) +
-                      "var vornDuplicateHashMatch = 1;\nvar vornDuplicateFileData = [\n"
-                      "[ '1', 's', 'esc(/s/t/e2)'', 0, 0 ],\n[ '1', 's', 'esc(/s/t/e1)'', 0, 0 ]\n"
-                      "];\n</script>\n|Duplicate Group\tShare\tFile\tSize(Byte)\tModify Time\n"
-                      "1\ts\tcsv(/s/t/e2)\t0\ttime(0)\n1\ts\tcsv(/s/t/e1)\t0\ttime(0)\n");
-}
-
 // A link that was put in a folder's place since the gathering is not followed to the file behind
 // it.
 TEST_F(ReportsTest, SamplesAreNotReadThroughLinks) {

@@ -1,25 +1,13 @@
-// Volume usage: the estimate, the chains, the writers; the history is a real database.
-#include <sys/stat.h>
-
-#include "rep_volume_usage.hpp"
-#include "report_fixture.hpp"
-#include "vorn/paths.h"
+// The estimate of the days until a volume is full.
+#include "db_volume_usage.hpp"
+#include "fixture.hpp"
 
 namespace vornreport {
 namespace {
 
-class VolumeUsageTest : public ReportTest {
+class VolumeUsageTest : public UnitTest {
  protected:
-  VolumeUsageTest() {
-    support::write_file(VORN_PATH_HISTORY_SCHEMA,
-                        support::read_file(VORN_TEST_SOURCE_DIR "/sql/vornreport.sql"));
-    unlink(VORN_PATH_HISTORY_DB);
-    mkdir("/usr/vorn/etc", 0755);
-  }
-  ~VolumeUsageTest() override {
-    QAZLLfree(&list_, VolumeUsageFreeNode);
-    unlink(VORN_PATH_HISTORY_DB);
-  }
+  ~VolumeUsageTest() override { QAZLLfree(&list_, VolumeUsageFreeNode); }
 
   static VolumeUsageSample* sample(const char* date, const char* used, const char* free,
                                    VolumeUsageSample* next = nullptr) {
@@ -83,58 +71,6 @@ TEST_F(VolumeUsageTest, EstimatesTheDaysUntilFull) {
     EXPECT_EQ(volume_of(list_)->days, c.days);
     QAZLLfree(&list_, VolumeUsageFreeNode);
   }
-}
-
-TEST_F(VolumeUsageTest, HistoryIsChainedNewestFirstAndNamesNoLostVolume) {
-  printed([] {
-    for (const char* date : {"1000", "1100"}) {
-      for (const char* volume : {"/v", "/gone"}) {
-        EXPECT_EQ(VornQazDBVolumeUsageInsert("global", volume, "5", "6", "45.4545", date), 0);
-      }
-    }
-  });
-  printed([&] { VornQazDBVolumeUsageInsert("p1", "/v", "5", "6", "45", "1050"); });
-  add_volume("/v", sample("1200", "9", "2"));
-  const std::string output =
-      printed([&] { EXPECT_EQ(VornQazDBVolumeUsageSelect("p1", &list_), 0); });
-  const VolumeUsageSample* chain = volume_of(list_)->samples;
-  EXPECT_STREQ(chain->sampleDate.c_str(), "1200");
-  EXPECT_STREQ(chain->next->sampleDate.c_str(), "1100");
-  EXPECT_STREQ(chain->next->next->sampleDate.c_str(), "1000");
-  EXPECT_EQ(chain->next->next->next, nullptr);
-  const QAZLLNode* lost = list_->next;
-  ASSERT_NE(lost, nullptr);
-  EXPECT_TRUE(volume_of(lost)->name.empty());
-  EXPECT_EQ(volume_of(lost)->days, -1);
-  ASSERT_NE(lost->next, nullptr);
-  EXPECT_EQ(lost->next->next, nullptr);
-  EXPECT_NE(output.find("===========>fetch row i=3, volume="), std::string::npos);
-}
-
-TEST_F(VolumeUsageTest, CollectingStoresOneDateForAllVolumes) {
-  platform.mounted = {{"/srv/with a rather long mount path", 25, 100}, {"/b", 0, 0}};
-  printed([&] { EXPECT_EQ(volume_usage_collect_data("p1", profile_.get()), 0); });
-  sqlite3* raw = nullptr;
-  ASSERT_EQ(sqlite3_open(VORN_PATH_HISTORY_DB, &raw), SQLITE_OK);
-  const SqliteHandle db(raw);
-  std::string rows;
-  sqlite3_exec(
-      raw,
-      "select profile||'|'||volume||'|'||sizeUse||'|'||sizeFree||'|'||percent||'|'||sampleDate "
-      "from VolumeUsage order by rowid",
-      [](void* out, int, char** values, char**) {
-        static_cast<std::string*>(out)->append(values[0]).append("\n");
-        return 0;
-      },
-      &rows, nullptr);
-  EXPECT_EQ(rows,
-            "p1|/srv/with a rather long mount p|75|25|75.0000|1700000000\n"
-            "p1|/b|0|0|-nan|1700000000\n");
-  platform.mounted.clear();
-  printed([&] { EXPECT_EQ(volume_usage_collect_data("p1", profile_.get()), -1); });
-  const std::string log = support::syslog_text();
-  EXPECT_NE(log.find("no mounted volume\n"), std::string::npos);
-  EXPECT_NE(log.find("volume usage get data failed, profile=p1\n"), std::string::npos);
 }
 
 }  // namespace
