@@ -42,6 +42,7 @@ struct UserLine {
 // A field that holds the line's end, or running out of fields, ends the line early.
 UserLine split_user_line(std::string_view line) {
   UserLine result;
+  line = line.substr(0, line.find('\0'));
   for (int field = kName; field <= kQuota; ++field) {
     result.reached = field;
     line.remove_prefix(std::min(line.find_first_not_of(' '), line.size()));
@@ -83,16 +84,20 @@ void add_user_line(const UserLine& line, QuotaVolume& volume, const char* path,
                print_u64(user.used), print_u64(user.quota));
 }
 
-// The next line in `buffer`, its end included; what is longer than the buffer is cut and skipped.
-bool read_line(FILE* stream, std::array<char, 4096>& buffer) {
-  if (std::fgets(buffer.data(), static_cast<int>(buffer.size()), stream) == nullptr) {
-    return false;
-  }
-  if (std::strchr(buffer.data(), '\n') == nullptr) {
-    for (int c = std::fgetc(stream); c != EOF && c != '\n'; c = std::fgetc(stream)) {
+// The next line with its end, cut at 4095 bytes; any bytes may stand in it.
+bool read_line(FILE* stream, std::string& line) {
+  constexpr size_t kLongestLine = 4095;
+  line.clear();
+  int c = 0;
+  while ((c = getc_unlocked(stream)) != EOF) {
+    if (line.size() < kLongestLine) {
+      line += static_cast<char>(c);
+    }
+    if (c == '\n') {
+      break;
     }
   }
-  return true;
+  return !line.empty();
 }
 
 // --- The page's blocks --------------------------------------------------------------------------
@@ -235,15 +240,15 @@ int32_t QuotaUsageParse(FILE* stream, QAZLLNode** list, const char* volumePath, 
   volume->name.format("%s", volumePath);
   volume->totalKiB = totalKiB;
   report_trace(kModule, __LINE__, "total size=%llu\n\n", print_u64(totalKiB));
-  std::array<char, 4096> line{};
+  std::string line;
   bool in_table = false;
   int32_t reached = -1;
   while (read_line(stream, line)) {
     if (!in_table) {
-      in_table = line[0] == '-';  // the line of dashes under the headings
+      in_table = line.front() == '-';  // the line of dashes under the headings
       continue;
     }
-    const UserLine user = split_user_line(line.data());
+    const UserLine user = split_user_line(line);
     reached = user.reached;
     if (user.reached == kQuota) {
       add_user_line(user, *volume, volumePath, userHash);

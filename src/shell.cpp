@@ -8,6 +8,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
@@ -45,9 +46,8 @@ class SigtermBlocked {
   sigset_t before_{};
 };
 
-// Where a command's standard output goes.
+// Standard output of a command: a descriptor, or this process's own.
 constexpr int kInherited = -1;
-constexpr int kDropped = -2;
 
 // The child gets a process group of its own, so that one kill reaches all that it starts, and the
 // signal settings that a shell expects. 0 or an errno value.
@@ -66,9 +66,7 @@ int spawn_shell(const char* command, int output, const sigset_t* mask, pid_t* ch
   posix_spawnattr_setsigmask(&attributes, mask);
   posix_spawnattr_setsigdefault(&attributes, &defaults);
   int error = 0;
-  if (output == kDropped) {
-    error = posix_spawn_file_actions_addopen(&files, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
-  } else if (output != kInherited) {
+  if (output != kInherited) {
     error = posix_spawn_file_actions_adddup2(&files, output, STDOUT_FILENO);
   }
   if (error == 0) {
@@ -166,8 +164,9 @@ struct ReadCommand {
     return got;
   }
 
-  // Returns when the command has ended, by itself or at its deadline.
-  void finish() {
+  // Returns when the command has ended, by itself or at its deadline: its exit status, or -1 when
+  // it was ended at a limit.
+  int finish() {
     close(fd);
     const int process = open_process(child);
     if (!ended && process >= 0 && !wait_for(process, deadline)) {
@@ -176,9 +175,34 @@ struct ReadCommand {
     if (process >= 0) {
       close(process);
     }
-    await_command(child);
+    const int status = await_command(child);
+    return ended ? -1 : status;
   }
 };
+
+// Null, logged, when the command could not be started.
+std::unique_ptr<ReadCommand> start_reading(const char* module, const char* command,
+                                           const CommandLimits& limits) {
+  int ends[2];
+  if (pipe2(ends, O_CLOEXEC) != 0) {
+    REPORT_LOG_ERR(module, __LINE__, "cannot make a pipe, cmd=%s\n", command);
+    return nullptr;
+  }
+  const pid_t child = start_command(module, command, ends[1]);
+  close(ends[1]);
+  if (child < 0) {
+    close(ends[0]);
+    return nullptr;
+  }
+  auto started = std::make_unique<ReadCommand>();
+  started->module = module;
+  started->command = command;
+  started->child = child;
+  started->fd = ends[0];
+  started->deadline = Clock::now() + std::chrono::seconds(limits.seconds);
+  started->bytes_left = limits.bytes;
+  return started;
+}
 
 ssize_t read_cookie(void* cookie, char* buffer, size_t size) {
   return static_cast<ReadCommand*>(cookie)->read_some(buffer, size);
@@ -186,8 +210,7 @@ ssize_t read_cookie(void* cookie, char* buffer, size_t size) {
 
 int close_cookie(void* cookie) {
   const std::unique_ptr<ReadCommand> command(static_cast<ReadCommand*>(cookie));
-  command->finish();
-  return command->ended ? EOF : 0;
+  return command->finish() == -1 ? EOF : 0;
 }
 
 }  // namespace
@@ -206,50 +229,29 @@ void run_command(const char* module, int line, const char* format, ...) {
 }
 
 int run_limited(const char* module, const char* command, const CommandLimits& limits) {
-  const pid_t child = start_command(module, command, kDropped);
-  if (child < 0) {
+  const std::unique_ptr<ReadCommand> running = start_reading(module, command, limits);
+  if (!running) {
     return -1;
   }
-  const Clock::time_point deadline = Clock::now() + std::chrono::seconds(limits.seconds);
-  const int process = open_process(child);
-  const bool in_time = process < 0 || wait_for(process, deadline);
-  if (!in_time) {
-    REPORT_LOG_ERR(module, __LINE__, "command took too long, ended cmd=%s\n", command);
-    kill(-child, SIGKILL);
+  std::array<char, 65536> unread{};
+  while (running->read_some(unread.data(), unread.size()) > 0) {
   }
-  if (process >= 0) {
-    close(process);
-  }
-  const int status = await_command(child);
-  return in_time ? status : -1;
+  return running->finish();
 }
 
 FileHandle open_limited(const char* module, const char* command, const CommandLimits& limits) {
-  int ends[2];
-  if (pipe2(ends, O_CLOEXEC) != 0) {
+  std::unique_ptr<ReadCommand> running = start_reading(module, command, limits);
+  if (!running) {
     return nullptr;
   }
-  const pid_t child = start_command(module, command, ends[1]);
-  close(ends[1]);
-  if (child < 0) {
-    close(ends[0]);
-    return nullptr;
-  }
-  auto cookie = std::make_unique<ReadCommand>();
-  cookie->module = module;
-  cookie->command = command;
-  cookie->child = child;
-  cookie->fd = ends[0];
-  cookie->deadline = Clock::now() + std::chrono::seconds(limits.seconds);
-  cookie->bytes_left = limits.bytes;
   const cookie_io_functions_t functions{read_cookie, nullptr, nullptr, close_cookie};
-  FileHandle stream(fopencookie(cookie.get(), "r", functions));
+  FileHandle stream(fopencookie(running.get(), "r", functions));
   if (!stream) {
-    kill(-child, SIGKILL);
-    cookie->finish();
+    running->end_early("no memory to read a command");
+    running->finish();
     return nullptr;
   }
-  static_cast<void>(cookie.release());
+  static_cast<void>(running.release());
   return stream;
 }
 

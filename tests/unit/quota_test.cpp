@@ -57,6 +57,8 @@ TEST_F(QuotaTest, ReadsTheUserTableInAllItsForms) {
       {"short lines are dropped, one of four fields stays without quota",
        "ann\nbob --\neve -- 7\nx -- 8 300\n", 3, "x 8 0\n", 0, 0},
       {"numbers that are none", "ann -- many none 0\n", 3, "ann 0 0\n", 5000, 0},
+      {"a byte of zero", std::string("ann -- 5 10 0\nx\0y -- 1 1 1\nbob -- 7 20 0\n", 41), 3,
+       "ann 5 10\nbob 7 20\n", 20, 7},
       {"no user line", "", -1, "", 0, 0},
   };
   for (const auto& c : cases) {
@@ -85,10 +87,11 @@ TEST_F(QuotaTest, EndsACommandAtItsLimits) {
   };
   printed([&] {
     EXPECT_EQ(run_limited("src/x", "exit 3", limits), 3);
-    EXPECT_EQ(run_limited("src/x", "yes | head -c 100000; exit 0", limits), 0);
+    EXPECT_EQ(run_limited("src/x", "yes | head -c 900; exit 0", limits), 0);
     EXPECT_EQ(all(open_limited("src/x", "echo one; echo two", limits)), "one\ntwo\n");
     EXPECT_EQ(support::syslog_text(), "");
     EXPECT_EQ(run_limited("src/x", "sleep 600", limits), -1);
+    EXPECT_EQ(run_limited("src/x", "exec yes no", limits), -1);
     EXPECT_EQ(all(open_limited("src/x", "echo one; sleep 600 | cat", limits)), "one\n");
     EXPECT_LE(all(open_limited("src/x", "yes", limits)).size(), 1000U);
   });
@@ -96,6 +99,7 @@ TEST_F(QuotaTest, EndsACommandAtItsLimits) {
   EXPECT_NE(log.find("command took too long, ended cmd=sleep 600\n"), std::string::npos) << log;
   EXPECT_NE(log.find("command took too long, ended cmd=echo one; sleep 600 | cat\n"),
             std::string::npos);
+  EXPECT_NE(log.find("command printed too much, ended cmd=exec yes no\n"), std::string::npos);
   EXPECT_NE(log.find("command printed too much, ended cmd=yes\n"), std::string::npos);
 }
 
