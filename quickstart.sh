@@ -38,6 +38,10 @@ find_folders() { # FOLDER...
     [[ -n $folder && -e $folder ]] || fail "no such folder: $folder"
     [[ -d $folder ]] || fail "not a folder: $folder"
     folder=$(realpath -- "$folder")
+    case $folder/ in
+      /dev/* | /proc/* | /sys/* | /usr/vorn/* | /etc/cron.d/*)
+        fail "$folder holds nobody's files; name another folder" ;;
+    esac
     check_path "$folder" "the folder"
     folders+=("$folder")
   done
@@ -156,6 +160,9 @@ if [[ $(head -n 1 "$stage/usr/vorn/var/status/$profile" 2>/dev/null) == success 
 fi
 [[ -n $page ]] || fail "the report failed; its log stands above, all its output in $stage/output"
 
+if [[ $(wc -l <"${page%/*}/csv/share_list.csv") -lt 2 ]]; then
+  echo "There are no files in these folders." >&2
+fi
 echo "Shares:"
 show_rows "${page%/*}/csv/share_list.csv" 1 20
 echo "Largest files:"

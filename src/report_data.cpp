@@ -24,15 +24,12 @@ FileHandle open_report_file(const char* path, const char* mode, const char* modu
                             LogForm form) {
   FileHandle file(std::fopen(path, mode));
   if (!file) {
-    const bool no_room = errno == ENOSPC || errno == EDQUOT || errno == EIO || errno == EROFS;
     if (form == LogForm::kNested) {
       REPORT_LOG_ERR_NESTED(module, line, "open file=%s failed", path);
     } else {
       REPORT_LOG_ERR(module, line, "open file=%s failed\n", path);
     }
-    if (no_room) {
-      mark_report_data_lost();
-    }
+    mark_report_data_lost();
   }
   return file;
 }
@@ -66,7 +63,8 @@ bool report_data_lost() {
 bool is_storage_failure(int result) {
   const int primary = result & 0xFF;
   return primary == SQLITE_FULL || primary == SQLITE_IOERR || primary == SQLITE_CORRUPT ||
-         primary == SQLITE_READONLY || primary == SQLITE_CANTOPEN;
+         primary == SQLITE_READONLY || primary == SQLITE_CANTOPEN || primary == SQLITE_NOTADB ||
+         primary == SQLITE_NOMEM;
 }
 
 }  // namespace vornreport

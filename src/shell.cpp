@@ -60,6 +60,7 @@ int spawn_shell(const char* command, int output, const sigset_t* mask, pid_t* ch
   sigemptyset(&defaults);
   sigaddset(&defaults, SIGTERM);
   sigaddset(&defaults, SIGPIPE);
+  sigaddset(&defaults, SIGXFSZ);
   posix_spawnattr_setflags(&attributes,
                            POSIX_SPAWN_SETPGROUP | POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
   posix_spawnattr_setpgroup(&attributes, 0);

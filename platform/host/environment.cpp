@@ -77,15 +77,16 @@ bool prepared = false;
 
 [[gnu::noinline]] void prepare() {
   prepared = true;
-  const int saved_errno = errno;
   open_standard_descriptors();
   set_environment();
   umask(S_IWGRP | S_IRWXO);
   // Standard output may be a pipe whose reader has gone; that is no reason to lose a run.
   static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
+  // Nor is a limit on the size of files: the write fails, and that is told.
+  static_cast<void>(std::signal(SIGXFSZ, SIG_IGN));
   raise_file_limit();
   configure_sqlite();
-  errno = saved_errno;
+  errno = 0;  // what the start of the process has left there would stand in the first messages
 }
 
 }  // namespace

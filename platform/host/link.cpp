@@ -1,4 +1,8 @@
 // The link under which readers find a finished report.
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
@@ -7,6 +11,7 @@
 #include <string>
 #include <string_view>
 
+#include "file_io.hpp"
 #include "host_log.hpp"
 #include "page.hpp"
 #include "text_containers.hpp"
@@ -77,6 +82,23 @@ std::optional<std::string> below(const std::string& folder, const char* file) {
   return relative.string();
 }
 
+// The page was made for its owner alone, in /tmp. Whoever may enter its folder (a web server, say,
+// by a setgid report_dir) may read it from now on, as the CSV files beside it.
+void open_to_group(const std::string& page) {
+  const host::ErrnoKeeper keeper;
+  const std::string folder = page.substr(0, page.rfind('/'));
+  const host::Fd file(open(page.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+  struct stat status {};
+  if (file && stat(folder.c_str(), &status) == 0) {
+    constexpr mode_t kMode = 0640;
+    if (fchown(file.get(), static_cast<uid_t>(-1), status.st_gid) != 0 ||
+        fchmod(file.get(), kMode) != 0) {
+      host::log_line("report \"%s\" can't be opened to its group (%s)", page.c_str(),
+                     std::strerror(errno));
+    }
+  }
+}
+
 int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size_t size) {
   if (!host::page_is_complete(target_file)) {
     host::log_line("no link to \"%s\": it is no complete report page; see the errors of this run",
@@ -84,6 +106,7 @@ int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size
     errno = ENOENT;
     return -1;
   }
+  open_to_group(target_file);
   const char* configured = hash.find("report_dir");
   const std::string report_dir =
       configured == nullptr || *configured == '\0' ? VORN_PATH_REPORTS : configured;

@@ -157,6 +157,9 @@ std::optional<std::vector<Share>> load_shares(const char* file) {
     VLIBCSzHash* filled = &section;
     if (VLIBCFileGetSection(file, name.c_str(), &filled) >= 0) {
       shares.push_back(make_share(name, section));
+    } else {
+      log_line("share \"%s\" is left out of every report until its section in %s is corrected",
+               name.c_str(), file);
     }
   }
   return shares;
@@ -173,6 +176,10 @@ int VORNShareEnum(VLIBCSzList** list, int /*flags*/) try {
   const auto* shares = host::all_shares();
   if (list == nullptr || *list == nullptr || shares == nullptr) {
     return -1;
+  }
+  if (shares->empty()) {
+    host::log_line("no shares in %s; add a section [name] with path = /... for each",
+                   VORN_PATH_SHARES);
   }
   for (const host::Share& share : *shares) {
     (*list)->texts.push_back(share.name);

@@ -245,6 +245,11 @@ int VornQazGetVolumePathHash(VLIBCSzHash** hash) try {
     const host::Volume* volume = server.holding(share.path.c_str());
     if (volume != nullptr) {
       result->set(share.name, volume->path);
+    } else if (const host::Mount* mount = host::mount_holding(server.mounts, share.path.c_str());
+               mount != nullptr && !host::is_walked(mount->kind)) {
+      host::log_line(
+          "share \"%s\": %s is on a file system that is not walked (%s); it adds nothing",
+          share.name.c_str(), share.path.c_str(), mount->type.c_str());
     }
   }
   *hash = result.release();

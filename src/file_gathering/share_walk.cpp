@@ -186,6 +186,10 @@ class Walk {
   }
 
   int open_failed() {
+    // Not this folder's fault: what is missing now is missing for want of handles or memory.
+    if (errno == EMFILE || errno == ENFILE || errno == ENOMEM) {
+      mark_report_data_lost();
+    }
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Failed to opendir [%s].", path_.c_str());
     return -1;
   }

@@ -1,8 +1,9 @@
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
-#include <cstring>
 #include <string>
+#include <string_view>
 
 #include "actions.hpp"
 #include "file_gathering/file_gathering.hpp"
@@ -33,6 +34,23 @@ void gather_when_needed(const char* profile, const VLIBCSzHash* profile_hash,
     if (entry.source == ReportSource::kStatistics && is_selected(entry, report_list)) {
       file_gathering(profile, profile_hash);
       return;
+    }
+  }
+}
+
+// One line for each word of the list that selects nothing: most likely a typing error.
+void log_unknown_reports(const char* report_list) {
+  constexpr std::string_view kSeparators = ", \t;";
+  std::string_view rest(report_list);
+  while (!rest.empty()) {
+    const std::string word(rest.substr(0, rest.find_first_of(kSeparators)));
+    rest.remove_prefix(std::min(word.size() + 1, rest.size()));
+    const auto entries = report_registry();
+    if (!word.empty() && std::none_of(entries.begin(), entries.end(), [&](const auto& entry) {
+          return is_selected(entry, word.c_str());
+        })) {
+      REPORT_LOG_ERR(kDriverModule, __LINE__, "report_list names no report with %s\n",
+                     word.c_str());
     }
   }
 }
@@ -115,6 +133,7 @@ int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, cha
     return -1;
   }
   report_trace(kDriverModule, 229, "report list=%s\n\n", report_list);
+  log_unknown_reports(report_list);
   LookUps look_ups;
   if (with_address(look_ups.users, VornQazInitFilterUser) < 0 || !look_ups.users) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 232, "init user failed");
