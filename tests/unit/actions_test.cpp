@@ -11,7 +11,6 @@
 #include "vornreport/global.hpp"
 #include "vornreport/profile.hpp"
 #include "vornreport/report_data.hpp"
-#include "vornreport/temp_files.hpp"
 
 namespace vornreport {
 namespace {
@@ -314,23 +313,6 @@ TEST_F(ActionsTest, CleanOfAllRemovesEveryStatisticsDatabase) {
   EXPECT_FALSE(support::exists(folder_.path("stat.db.b-journal")));
   EXPECT_TRUE(support::exists(folder_.path("stat.db")));
   EXPECT_TRUE(support::exists(folder_.path("keep")));
-}
-
-TEST_F(ActionsTest, CleanTempFilesNeedsItsPlaces) {
-  platform.locations.erase("real_path_stat_db");
-  support::write_file(data_, "");
-  output_ = printed([] { EXPECT_EQ(clean_temp_files(0), -1); });
-  expect_simple("src/vornreport:484", "get db path failed\n");
-  EXPECT_TRUE(support::exists(data_));
-  platform.failing = {"InitLocation"};
-  output_ = printed([] { EXPECT_EQ(clean_temp_files(0), -1); });
-  expect_simple("src/vornreport:472", "init location failed\n");
-  platform.failing.clear();
-  platform.locations["real_path_stat_db"] = folder_.path("stat.db");
-  support::write_file(folder_.path("stat.db-journal"), "");
-  EXPECT_EQ(clean_temp_files(0), 0);
-  EXPECT_FALSE(support::exists(data_));
-  EXPECT_FALSE(support::exists(folder_.path("stat.db-journal")));
 }
 
 }  // namespace

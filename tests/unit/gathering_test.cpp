@@ -99,29 +99,6 @@ TEST_F(GatheringTest, AStatementCutAtItsBufferIsRefused) {
   EXPECT_EQ(rows(db_.get(), "select length(path) from file_stat"), "4095\n");
 }
 
-TEST_F(GatheringTest, AddFileNamesTheMissingArgument) {
-  struct stat status {};
-  const FileInfo no_share{nullptr, "p", "n", "t", &status};
-  const FileInfo no_path{"s", nullptr, "n", "t", &status};
-  const FileInfo no_status{"s", "p", "n", "t", nullptr};
-  const struct {
-    sqlite3* db;
-    const FileInfo* info;
-    const char* condition;
-  } cases[] = {{nullptr, nullptr, "((void *)0) != db"},
-               {db_.get(), nullptr, "((void *)0) != pFileInfo"},
-               {db_.get(), &no_share, "((void *)0) != pFileInfo->szShare"},
-               {db_.get(), &no_path, "((void *)0) != pFileInfo->szPath"},
-               {db_.get(), &no_status, "NULL != pFileInfo->pst"}};
-  for (const auto& c : cases) {
-    EXPECT_EQ(ReportDBAddFile(c.db, c.info), -1);
-    const std::string text = support::syslog_text();
-    EXPECT_NE(text.find("Invaild Argument (" + std::string(c.condition) + ")=[0]\n"),
-              std::string::npos)
-        << text;
-  }
-}
-
 TEST_F(GatheringTest, WalkJudgesEveryFileSystemByItsKind) {
   const std::string top = folder_.path("top");
   write_file(top + "/here", "");
@@ -238,26 +215,6 @@ TEST_F(GatheringTest, ImportCopiesTheFilesOfTheIndex) {
   EXPECT_NE(sqlite3_get_autocommit(db_.get()), 0);
 }
 
-TEST_F(GatheringTest, ImportFailsWithItsOwnMessage) {
-  const std::string index = folder_.path("index.db");
-  const auto import = [&] {
-    return ReportFileIndexImport("share", "/srv/s", db_.get(), types_.get());
-  };
-  const auto expect_failure = [&](const char* message) {
-    printed([&] { EXPECT_EQ(import(), -1); });
-    EXPECT_NE(support::syslog_text().find(message), std::string::npos) << message;
-  };
-  platform.indexes["share"] = index;
-  platform.failing = {"FileIndexDBPathGet"};
-  expect_failure(")get file index path failed, share=share\n\n");
-  platform.failing.clear();
-  expect_failure(")access file index failed, share=share\n\n");
-  write_file(index, "this is no database, but it is long enough to be looked at as one");
-  expect_failure(
-      "Exec sql:[select owner_name, time_modify, size, '/srv/s/'||path, name, file_ext "
-      "from file_info where is_dir=0;] error: file is not a database\n\n");
-}
-
 // The rows read before an unknown owner stay in the open transaction, and the walk that follows
 // commits them with its own: they are there twice.
 TEST_F(GatheringTest, FailedImportIsWalkedAndItsRowsStandTwice) {
@@ -303,22 +260,6 @@ TEST_F(GatheringTest, ADatabaseRemovedInTheRunIsLostData) {
     return std::string(kept && report_data_lost() ? "lost only then" : "");
   });
   EXPECT_EQ(log, "lost only then");
-}
-
-TEST_F(GatheringTest, GatheringDoesNotStartWithoutItsParts) {
-  platform.shares = {{"s", folder_.path()}};
-  const struct {
-    const char* failing;
-    const char* message;
-  } cases[] = {{"InitFileTypeHash", ")init file type hash failed\n\n"},
-               {"ShareEnum", ")enum share failed\n\n"}};
-  for (const auto& c : cases) {
-    platform.failing = {c.failing};
-    printed([&] { EXPECT_EQ(file_gathering("p1", profile_.get()), -1); });
-    EXPECT_NE(support::syslog_text().find(c.message), std::string::npos);
-  }
-  printed([&] { EXPECT_EQ(file_gathering("", profile_.get()), -1); });
-  EXPECT_NE(support::syslog_text().find(")Bad Parameter\n\n"), std::string::npos);
 }
 
 }  // namespace
