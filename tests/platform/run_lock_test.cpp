@@ -75,14 +75,6 @@ TEST(Holding, NoChildOfTheHolderHoldsIt) {
   close(ends[1]);
 }
 
-TEST(Holding, NamesOfALiveProcessStay) {
-  // The id that the last holder left belongs to another program by now.
-  support::write_file(VORN_PATH_STATUS "/.alive.lock", "1\n");
-  support::write_file("/tmp/vornreport_data.1", "");
-  EXPECT_EQ(VornQazProfileRunning("alive"), 0);
-  EXPECT_TRUE(support::exists("/tmp/vornreport_data.1"));
-}
-
 TEST(Holding, AnUnworkableLockFailsTheStatusOnly) {
   std::filesystem::create_directories(VORN_PATH_STATUS "/.folder.lock");
   std::filesystem::create_symlink("/tmp/victim", VORN_PATH_STATUS "/.linked.lock");
