@@ -15,7 +15,8 @@ namespace vornreport {
 PathText report_data_path();
 
 // Opens a file for appending or writing and logs "open file=%s failed" at `module`
-// and `line` when that fails. The run's data counts as lost then: the run has made the file's folder itself.
+// and `line` when that fails. The run's data counts as lost then: the run has made the file's
+// folder itself.
 enum class LogForm : uint8_t { kSimple, kNested };
 FileHandle open_report_file(const char* path, const char* mode, const char* module, int line,
                             LogForm form = LogForm::kNested);
@@ -30,8 +31,8 @@ bool close_report_file(FileHandle file, const char* path, const char* module, in
 void mark_report_data_lost();
 bool report_data_lost();
 
-// Whether a failed SQLite call means that data was lost (full disk, I/O error, no memory), rather than that
-// one statement was wrong. `result` is the call's result code.
+// Whether a failed SQLite call means that data was lost (full disk, I/O error, no memory), rather
+// than that one statement was wrong. `result` is the call's result code.
 bool is_storage_failure(int result);
 
 }  // namespace vornreport

@@ -20,8 +20,8 @@ struct FileInfo {
 // failure, which is logged.
 SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash);
 
-// Remembers the database as the one that holds the run's rows. When another file stands in its place
-// later, VORNReportDBInit logs that and marks the run's data as lost.
+// Remembers the database as the one that holds the run's rows. When another file stands in its
+// place later, VORNReportDBInit logs that and marks the run's data as lost.
 void remember_gathered(const VLIBCSzHash* profile_hash);
 // Begins anew: any file may stand at the database's place.
 void forget_gathered();
