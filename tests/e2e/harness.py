@@ -66,8 +66,11 @@ class Run:
 
         def find():
             for pid in Path(path).read_text().split():
-                if os.readlink(f'/proc/{pid}/exe').endswith('/vornreport'):
-                    return int(pid)
+                try:
+                    if os.readlink(f'/proc/{pid}/exe').endswith('/vornreport'):
+                        return int(pid)
+                except FileNotFoundError:
+                    pass  # a short-lived child of the sandbox script
             return None
         return wait_for(find, 'the program')
 
