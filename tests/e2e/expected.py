@@ -1,35 +1,36 @@
 """What the reports must hold, computed from a tree: for tests that compare to the byte."""
 import os
+import re
 import time
-import unittest
-
-from harness import csv_field
 
 MARK = b'\xef\xbb\xbf'
 SCRIPT = b"<script type='text/javascript'>\n"
 DAY = 86400
 
 
-def text(value):
-    return value if isinstance(value, bytes) else str(value).encode()
-
-
 def quoted(value):
-    """A quoted JavaScript string, of a value that only needs its quotes escaped."""
-    return b"'" + text(value).replace(b"'", b"\\'") + b"'"
+    """A quoted JavaScript string. A byte that is no UTF-8 is a lone surrogate in it."""
+    def escape(match):
+        plain = {'\n': r'\n', '\t': r'\t', "'": r"\'", '\\': r'\\'}
+        return plain.get(match[0]) or f'\\u{ord(match[0]):04x}'
+    return "'" + re.sub('[\n\t\'\\\\<\u202e\udc80-\udcff]', escape, str(value)) + "'"
 
 
-def block(variable, rows, before=b''):
+def block(variable, rows, before=''):
     """The block of a report of quoted values."""
     if not rows:
         return b'</script>\n'
-    rows = b',\n'.join(b'[ ' + b', '.join(map(quoted, row)) + b' ]' for row in rows)
-    return SCRIPT + before + b'var ' + variable.encode() + b' = [\n' + rows + b'\n];\n</script>\n'
+    rows = ',\n'.join('[ ' + ', '.join(map(quoted, row)) + ' ]' for row in rows)
+    return SCRIPT + f'{before}var {variable} = [\n{rows}\n];\n</script>\n'.encode()
+
+
+def csv_line(row):
+    return b'\t'.join(b'"' + re.sub(rb'[\n\t]', b' ', os.fsencode(str(value))).replace(b'"', b'""')
+                      + b'"' for value in row)
 
 
 def csv(header, rows):
-    return MARK + header.encode() + b'\n' + b''.join(
-        b'\t'.join(csv_field(text(value)) for value in row) + b'\n' for row in rows)
+    return MARK + header.encode() + b'\n' + b''.join(csv_line(row) + b'\n' for row in rows)
 
 
 def local_time(seconds):
@@ -43,6 +44,12 @@ def data_blocks(folder):
     return page.split(b'<meta name="vorn-empty-reports"')[0]
 
 
+def data_rows(page, variable):
+    """The lines of a report's rows in a page, or what is left of it."""
+    found = re.search(f'\nvar {variable} = \\[\n(.*?)\n\\];\n', page, re.DOTALL)
+    return found[1].split('\n') if found else []
+
+
 class Tree:
     """Files with owners and ages, as (share, path, size, time, owner, label of the type)."""
 
@@ -50,9 +57,9 @@ class Tree:
         self.machine = machine
         self.folders = {}
         self.files = []
-        self._now = int(time.time())
+        self.now = int(time.time())
 
-    def add(self, share, name, content=b'', owner=None, days=30.0, label='other'):
+    def add(self, share, name, content=b'', label='other', owner=None, days=30.0):
         """`content` is the file's bytes or its size; the file is `days` old. Only root can name
         an owner."""
         if share not in self.folders:
@@ -65,7 +72,7 @@ class Tree:
             else:
                 file.write(content)
         # Each file has a time of its own, so that the order of times is clear.
-        changed = self._now - int(days * DAY) - len(self.files)
+        changed = self.now - int(days * DAY) - len(self.files)
         os.utime(path, (changed, changed))
         if owner is not None:
             os.chown(path, owner, -1)
@@ -74,14 +81,9 @@ class Tree:
                            'reportUI_file_type_' + label))
 
     def share_paths(self):
-        return (SCRIPT + b'var vornSharePath = {\n' + b',\n'.join(
-            b'[' + quoted(share) + b'] : ' + quoted(folder)
-            for share, folder in sorted(self.folders.items())) + b'\n};\n</script>\n')
-
-
-def needs_root(test):
-    """For tests of what a plain user's machine can't have; a server's, and the build's, must."""
-    return unittest.skipIf(os.geteuid(), 'only root can give files away and mount')(test)
+        return SCRIPT + ('var vornSharePath = {\n' + ',\n'.join(
+            f'[{quoted(share)}] : {quoted(folder)}'
+            for share, folder in sorted(self.folders.items())) + '\n};\n</script>\n').encode()
 
 
 def totals(keys_and_sizes):

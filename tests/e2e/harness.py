@@ -5,9 +5,7 @@ Nothing here uses the program's own code: outputs are read by small readers of t
 import os
 import re
 import shutil
-import signal
 import socket
-import stat
 import subprocess
 import tempfile
 import threading
@@ -36,11 +34,9 @@ class Log:
 
     def _collect(self):
         while (data := self._socket.recv(1 << 16)) != b'stop':
-            # "<11>Nov 21 02:04:26 vornreport: text"
-            head, text = re.fullmatch(rb'(<\d+>\w{3} [ \d]\d \d\d:\d\d:\d\d \w+): (.*)', data,
-                                      re.DOTALL).groups()
-            assert head.startswith(b'<11>') and head.endswith(b' vornreport'), data
-            self.lines.append(text.rstrip(b'\0').decode(errors='surrogateescape'))
+            text = re.fullmatch(rb'<11>\w{3} [ \d]\d \d\d:\d\d:\d\d vornreport: (.*?)\0*', data,
+                                re.DOTALL)
+            self.lines.append(text[1].decode(errors='surrogateescape') if text else repr(data))
 
     def close(self):
         """All that was sent before this call is in `lines` afterwards."""
@@ -73,18 +69,6 @@ class Run:
                     pass  # a short-lived child of the sandbox script
             return None
         return wait_for(find, 'the program')
-
-    def signal(self, signo):
-        os.kill(self.pid(), signo)
-
-    def read_until(self, text):
-        """Reads standard output up to a line that holds `text`."""
-        seen = b''
-        for line in self.process.stdout:
-            seen += line
-            if text in line:
-                return seen
-        raise AssertionError(f'{text} never came; the output was {seen}')
 
     def finish(self):
         """Waits until the program and whatever holds its output have ended."""
@@ -125,6 +109,13 @@ class Machine:
             file.write(f'\n[{name}]\n'.encode())
             for key, value in keys.items():
                 file.write(f'{key} = {value}\n'.encode(errors='surrogateescape'))
+
+    def accounts(self, accounts):
+        """Lets only these users, name to number, be known."""
+        for name, text in (('group', 'root:x:0:\n'), ('passwd', ''.join(
+                f'{user}:x:{uid}:0::/:/bin/sh\n' for user, uid in accounts.items()))):
+            (self.base / name).write_text(text)
+            self.options += ['--bind', self.base / name, f'/etc/{name}']
 
     def sandbox(self, log=None):
         options = ['--stage', self.stage, '--cron', self.cron, *self.options]
@@ -170,14 +161,8 @@ class Machine:
             script.write_text(f'''#!/bin/sh
 case "$1 $#" in
   "$(cat /tmp/stop 2>/dev/null || echo nowhere)"*)
-    echo $$ >/tmp/stopped.new
-    mv /tmp/stopped.new /tmp/stopped
-    rounds=0
-    while [ -e /tmp/stop ] && [ $rounds -lt 600 ]; do
-      rounds=$((rounds + 1))
-      sleep 0.05
-    done
-    ;;
+    echo $$ >/tmp/new && mv /tmp/new /tmp/stopped
+    for i in $(seq 600); do [ ! -e /tmp/stop ] || sleep 0.05; done ;;
 esac
 exec /{SCRIPTS}/original.sh "$@"
 ''')
@@ -248,53 +233,6 @@ def make_files(folder, files):
             file.truncate(size)
 
 
-def regular_files(folder):
-    """What a report must count: (path, size) of every regular file, as bytes and number."""
-    found = []
-    for where, folders, names in os.walk(os.fsencode(folder)):
-        folders[:] = [f for f in folders if f != b'@eaDir']
-        for name in names:
-            status = os.lstat(os.path.join(where, name))
-            if name != b'@eaDir' and stat.S_ISREG(status.st_mode):
-                found.append((os.path.join(where, name), status.st_size))
-    return found
-
-
-def unescape_js(text):
-    """The bytes that the inside of a single-quoted JavaScript string stands for in a page, where a
-    lone surrogate \\udcXX stands for the byte XX."""
-    plain = {'n': '\n', 't': '\t', 'r': '\r', 'b': '\b', 'f': '\f', 'v': '\v'}
-
-    def replace(match):
-        code = match[1] or match[2]
-        if code:
-            return chr(int(code, 16))
-        assert match[3] in plain or match[3] in '\'"\\/', match[0]
-        return plain.get(match[3], match[3])
-    text = re.sub(r'\\(?:u([0-9a-f]{4})|x([0-9a-f]{2})|(.))', replace, text, flags=re.IGNORECASE)
-    return text.encode('utf-8', 'surrogateescape')
-
-
-def page_rows(page, variable):
-    """The rows of a report's block, as lists of bytes; None without the block. The block's frame
-    must be exact to the byte."""
-    page = Path(page).read_bytes().decode()
-    opening = f"<script type='text/javascript'>\nvar {variable} = [\n"
-    if opening not in page:
-        return None
-    block = page.split(opening)[1].split('\n];\n</script>\n')[0]
-    rows = []
-    for row in block.split(',\n'):
-        match = re.fullmatch(r"\[ ('(?:[^'\\\n<]|\\.)*'(?:, '(?:[^'\\\n<]|\\.)*')*) \]", row)
-        assert match, row
-        rows.append([unescape_js(cell) for cell in re.findall(r"'((?:[^'\\]|\\.)*)'", match[1])])
-    return rows
-
-
-def csv_field(value):
-    return b'"' + re.sub(rb'[\n\r\t\v\f]', b' ', value).replace(b'"', b'""') + b'"'
-
-
-__all__ = ['BUILD', 'LIMIT', 'PROGRAM', 'ROOT', 'SCRIPTS', 'Log', 'Machine', 'ProductTest',
-           'csv_field', 'is_alive', 'make_files', 'page_rows', 'regular_files', 'signal',
-           'unescape_js', 'wait_for']
+def needs_root(test):
+    """For tests of what a plain user's machine can't have; a server's, and the build's, must."""
+    return unittest.skipIf(os.geteuid(), 'only root can give files away and mount')(test)

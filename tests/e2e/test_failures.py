@@ -1,24 +1,19 @@
 """What must not end in a report, and what a report must survive."""
-import unittest
 
-from harness import PROGRAM, SCRIPTS, ProductTest, make_files, page_rows
+from expected import data_rows
+from harness import PROGRAM, SCRIPTS, ProductTest, make_files
 
 PAGE = 4096  # file systems in memory grow by pages
 REPORTS = 'share_list,large_file'
 
 
-class Refused(ProductTest):
-    def assertFailed(self, run, lines):
-        """No report, no word of success, and each of `lines` in the log."""
-        self.assertEqual(run.status, 0)
-        log = '\n'.join(run.log_lines)
-        for line in lines:
-            self.assertRegex(log, line)
-        self.assertNotEqual(self.m.status('weekly'), 'success')
-        self.assertEqual(self.m.report_folders('weekly'), [])
-        self.assertEqual(self.m.leftovers(), [])
+class Settings(ProductTest):
+    def new_machine(self):
+        machine = super().new_machine()
+        make_files(machine.share('good'), {'a.jpg': 10})
+        return machine
 
-    def test_settings(self):
+    def test_no_report(self):
         config, script = 'etc/vornreport.conf', f'../../{SCRIPTS}/build-template.sh'
         for name, keys, damage, lines in (
                 ('quote', {'report_dir': "/var/tmp/it's"}, None,
@@ -31,10 +26,11 @@ class Refused(ProductTest):
                  [r'vornreport\.conf:3: malformed line', 'section=weekly']),
                 ('no shares', {}, ('etc/share.conf', None), [r'share\.conf can\'t be read']),
                 ('no script', {}, (script, None), ['page .* is missing or cut', 'no link to']),
-                ('bad script', {}, (script, '#!/bin/sh\nexit 1\n'), ['page .* is missing or cut'])):
+                ('bad script', {}, (script, '#!/bin/sh\nexit 1\n'), ['page .* is missing or cut']),
+                ('no profile', {}, None, ['section=unheard', 'init profile failed']),
+                ('no name', {}, None, [r'"\.\./x" is no profile name', 'init profile failed'])):
             with self.subTest(name):
                 self.m = self.new_machine()
-                make_files(self.m.share('photos'), {'a.jpg': 10})
                 self.m.profile('weekly', **{'report_list': REPORTS} | keys)
                 if damage:
                     path = self.m.vorn / damage[0]
@@ -42,17 +38,39 @@ class Refused(ProductTest):
                     if damage[1]:
                         path.write_text(damage[1])
                         path.chmod(0o755)
-                self.assertFailed(self.m.run('--report', 'weekly'), lines)
+                profile = {'no profile': 'unheard', 'no name': '../x'}.get(name, 'weekly')
+                run = self.m.run('--report', profile)
+                self.assertEqual(run.status, 0)
+                for line in lines:
+                    self.assertRegex('\n'.join(run.log_lines), line)
+                if profile == 'weekly':
+                    self.assertNotEqual(self.m.status('weekly'), 'success')
+                self.assertEqual((self.m.report_folders('weekly'), self.m.leftovers()), ([], []))
 
-    def test_names_of_profiles(self):
-        for name, first, count in (('unheard', 'section=unheard', 2),
-                                   ('../x', '"../x" is no profile name', 3)):
+    def test_a_report_all_the_same(self):
+        with self.m.shares.open('a') as file:
+            for name, path in (('007', '/'), ("it's", '/'), ('relative', 'a/b'), ('gone', '/gone'),
+                               ('file', '/etc/hostname'), ('remote', '/proc')):
+                file.write(f'[{name}]\npath = {path}\n')
+        for name, keys, lines in (
+                ('shares', {}, [
+                    '"007" is left out: it is a number', '"it\'s" is left out',
+                    '"relative" can\'t be read: its path is not absolute',
+                    'Failed to stat [/gone]', 'Failed to stat [/etc/hostname]']),
+                ('lang', {'language': '../../x'}, ['language "../../x" is no code']),
+                ('typo', {'share_list': 'good,god'}, ['share_list names "god"']),
+                ('mail', {'mail_to': 'a@b.c', 'smtp_url': 'smtp://127.0.0.1:1'},
+                 ['send mail failed, profile=mail'])):
             with self.subTest(name):
+                self.m.profile(name, **{'report_list': REPORTS} | keys)
                 run = self.m.run('--report', name)
-                self.assertEqual((run.status, len(run.log_lines)), (0, count))
-                self.assertIn(first, run.log_lines[0])
-                self.assertIn('init profile failed', run.log_lines[-1])
-                self.assertEqual(list(self.m.reports.iterdir()), [])
+                for line in lines:
+                    self.assertIn(line, '\n'.join(run.log_lines))
+                self.assertEqual(self.m.status(name), 'success')
+                page = (self.m.report_folders(name)[0] / 'report.html').read_text()
+                self.assertIn("\n  lang: 'en',\n", page)
+                row, = data_rows(page, 'vornShareListData')
+                self.assertRegex(row, "^\\[ 'good', '[^']+', '10' \\]$")
 
 
 class FullDisks(ProductTest):
@@ -69,14 +87,11 @@ class FullDisks(ProductTest):
         run = self.m.shell(f'{PROGRAM} --report weekly; echo "== $?"; '
                            'head -n 1 /usr/vorn/var/status/weekly; '
                            f'find {self.m.reports}/weekly -name report.html -exec cat {{}} +')
-        result = run.out.split('\n== 0\n')[1].split('\n', 1)
-        word, page = result[0], result[1] if len(result) > 1 else ''
+        word, _, page = run.out.split('\n== 0\n')[1].partition('\n')
         if page:
-            page_file = self.m.base / 'page'
-            page_file.write_text(page)
             self.assertTrue(page.endswith('\n</html>\n'))
-            self.assertEqual(len(page_rows(page_file, 'vornShareListData')), 1)
-            self.assertEqual(len(page_rows(page_file, 'vornLargeFileData')), 200)
+            self.assertEqual([len(data_rows(page, f'vorn{report}Data'))
+                              for report in ('ShareList', 'LargeFile')], [1, 200])
         # The last word may find no room itself; nothing else may differ from what is there.
         self.assertIn(word, ('success', 'collect_data') if page else ('', 'collect_data', 'fail'))
         self.assertEqual(run.log_lines == [], word == 'success')
@@ -93,43 +108,3 @@ class FullDisks(ProductTest):
             # From some size on all is well.
             self.assertEqual(words, sorted(words), place)
             self.assertEqual((words[0] != 'success', words[-1]), (True, 'success'), place)
-
-
-class Survived(ProductTest):
-    def test_shares_that_cannot_be_read(self):
-        good = self.m.share('good')
-        make_files(good, {'a.jpg': 10})
-        with self.m.shares.open('a') as file:
-            for name, path in (('007', good), ("it's", good), ('relative', 'a/b'),
-                               ('gone', self.m.base / 'gone'), ('file', '/etc/hostname'),
-                               ('remote', '/proc')):
-                file.write(f'[{name}]\npath = {path}\n')
-        self.m.profile('weekly', report_list=REPORTS)
-        run = self.m.run('--report', 'weekly')
-        self.assertEqual(self.m.status('weekly'), 'success')
-        page = self.m.report_folders('weekly')[0] / 'report.html'
-        self.assertEqual([row[0] for row in page_rows(page, 'vornShareListData')], [b'good'])
-        log = '\n'.join(run.log_lines)
-        for line in ('"007" is left out: it is a number', '"it\'s" is left out',
-                     '"relative" can\'t be read: its path is not absolute',
-                     r'Failed to stat \[.*/gone\]', r'Failed to stat \[/etc/hostname\]'):
-            self.assertRegex(log, line)
-
-    def test_other_settings(self):
-        make_files(self.m.share('good'), {'a.jpg': 10})
-        for name, keys, line, lang in (
-                ('lang', {'language': '../../x'}, 'language "../../x" is no code', 'en'),
-                ('typo', {'share_list': 'good,god'}, 'share_list names "god"', 'en'),
-                ('mail', {'mail_to': 'a@b.c', 'smtp_url': 'smtp://127.0.0.1:1'},
-                 'send mail failed, profile=mail', 'en')):
-            with self.subTest(name):
-                self.m.profile(name, **{'report_list': REPORTS} | keys)
-                run = self.m.run('--report', name)
-                self.assertIn(line, '\n'.join(run.log_lines))
-                self.assertEqual(self.m.status(name), 'success')
-                page = (self.m.report_folders(name)[0] / 'report.html').read_text()
-                self.assertIn(f"\n  lang: '{lang}',\n", page)
-
-
-if __name__ == '__main__':
-    unittest.main()

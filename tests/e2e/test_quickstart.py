@@ -1,5 +1,4 @@
 """The one-command start on a copy of the sources, as a newcomer would use it."""
-
 import shutil
 import subprocess
 import tempfile
@@ -32,6 +31,11 @@ class Quickstart(unittest.TestCase):
                 path.write_bytes(b'x' * (number % 7))
             with (share / 'largest of all').open('wb') as file:
                 file.truncate(5 << 30)
+        (self.folder / "it's").mkdir()
+        for name, message in (('gone', 'no such folder'), ("it's", 'single quote')):
+            done = self.quickstart(name)
+            self.assertEqual((done.returncode, done.stdout), (1, ''))
+            self.assertRegex(done.stderr, f'^quickstart.sh: .*{message}.*\n$')
         pages = set()
         for _ in range(2):
             done = self.quickstart('Büro & Fotos', shares[1])
@@ -44,7 +48,3 @@ class Quickstart(unittest.TestCase):
             for share in shares:
                 self.assertIn(f"'{share}/largest of all', '5368709120' ]", text)
         self.assertEqual(len(pages), 2)
-
-
-if __name__ == '__main__':
-    unittest.main()
