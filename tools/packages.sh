@@ -5,11 +5,12 @@
 build_packages=(
   g++ cmake ninja-build pkg-config
   libsqlite3-dev libcurl4-openssl-dev libmount-dev libssl-dev libxxhash-dev
+  libcli11-dev nlohmann-json3-dev
   bubblewrap
 )
 # Besides those, to run all tests. (CMake looks for GoogleTest only when tests are built.)
 test_packages=(
-  libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota
+  libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota samba-common-bin
 )
 
 as_root() {

@@ -34,15 +34,6 @@ int fail(int code, int line) {
   return -1;
 }
 
-std::optional<std::string> read_config(const char* file) {
-  std::optional<std::string> text = read_file(file, kLargestFile);
-  if (!text) {
-    log_line("%s can't be read (%s); make it a regular file that this program may read", file,
-             std::strerror(errno));
-  }
-  return text;
-}
-
 int find_failure(FindResult result, int line) {
   errno = result == FindResult::malformed ? EINVAL : errno;
   return fail(result == FindResult::missing ? VLIBC_ERR_NO_SECTION : VLIBC_ERR_MALFORMED_FILE,
@@ -178,6 +169,15 @@ bool replace(const std::string& file, std::string_view text) {
 }
 
 }  // namespace
+
+std::optional<std::string> read_config(const char* file) {
+  std::optional<std::string> text = read_file(file, kLargestFile);
+  if (!text) {
+    log_line("%s can't be read (%s); make it a regular file that this program may read", file,
+             std::strerror(errno));
+  }
+  return text;
+}
 
 bool config_is_readable(const char* file) {
   return read_config(file).has_value();

@@ -3,12 +3,16 @@
 #define VORN_HOST_CONFIG_FILE_HPP
 
 #include <chrono>
+#include <optional>
+#include <string>
 #include <string_view>
 
 #include "vorn/config.h"
 
 namespace host {
 
+// The text of `file`; nothing, after one log line, when it can't be read.
+std::optional<std::string> read_config(const char* file);
 // Whether `file` can be read; one log line when it can't.
 bool config_is_readable(const char* file);
 

@@ -7,6 +7,15 @@
 #include <cstdio>
 
 namespace host {
+namespace {
+
+void to_syslog(const char* line) {
+  syslog(LOG_ERR, "%s", line);
+}
+
+void (*log_sink)(const char* line) = to_syslog;
+
+}  // namespace
 
 void log_line(const char* format, ...) {
   const int saved_errno = errno;
@@ -21,8 +30,12 @@ void log_line(const char* format, ...) {
       *c = '?';
     }
   }
-  syslog(LOG_ERR, "%s", line);
+  log_sink(line);
   errno = saved_errno;
+}
+
+void redirect_log(void (*sink)(const char* line)) {
+  log_sink = sink;
 }
 
 }  // namespace host

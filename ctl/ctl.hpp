@@ -1,0 +1,98 @@
+// What the commands of vornctl share. Each group of commands has a file of its own, which adds them
+// to the command line and runs them in their callbacks.
+//
+// Exit status: 0 when all went well, 1 when the command failed, 2 when the command line is wrong.
+// Results go to standard output, everything else to standard error.
+#ifndef VORN_CTL_CTL_HPP
+#define VORN_CTL_CTL_HPP
+
+#include <CLI/App.hpp>
+#include <cstddef>
+#include <nlohmann/json_fwd.hpp>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace ctl {
+
+inline constexpr int kFailed = 1;
+inline constexpr int kWrongUsage = 2;
+
+// Ends the command. The message is one line that says what is wrong and what to do; main prints it
+// after "vornctl: ". An empty one prints nothing, for a command that has said all.
+class Failure : public std::runtime_error {
+ public:
+  explicit Failure(const std::string& message, int exit_code = kFailed)
+      : std::runtime_error(message), exit_code_(exit_code) {}
+  int exit_code() const { return exit_code_; }
+
+ private:
+  int exit_code_;
+};
+
+// --- The commands -------------------------------------------------------------------------------
+
+void add_share_commands(CLI::App& app);
+void add_profile_commands(CLI::App& app);
+void add_run_command(CLI::App& app);
+void add_schedule_command(CLI::App& app);
+void add_status_command(CLI::App& app);
+void add_reports_command(CLI::App& app);
+void add_doctor_command(CLI::App& app);
+void add_completion_command(CLI::App& app);
+
+// Adds "test-mail" to the group `profile`.
+void add_test_mail_command(CLI::App& profile);
+
+// Arguments and options whose name or type is one of these are completed with what they stand for:
+// PROFILE, SHARE, SHARES, REPORTS, LANGUAGE, KEY, FOLDER, FILE.
+// The positional argument PROFILE, required. The profile need not exist.
+CLI::Option* add_profile_argument(CLI::App& command, std::string& profile);
+CLI::Option* add_json_flag(CLI::App& command, bool& json);
+
+// --- The platform's messages --------------------------------------------------------------------
+
+// What the platform would have logged since the last call; main prints what nobody took. It goes to
+// no system log: the administrator sits in front of it.
+std::vector<std::string> take_host_messages();
+// The last of them as a failure, those before it printed; `otherwise` when there is none.
+Failure host_failure(const std::string& otherwise);
+
+// --- Output -------------------------------------------------------------------------------------
+
+// `text` for one line of a terminal: control characters, what turns the direction of text, and
+// bytes that are no UTF-8 come out as \x1b, \u202e, \xff.
+std::string printable(std::string_view text);
+// The columns that a printable text takes.
+std::size_t display_width(std::string_view text);
+
+void print_line(std::string_view line);  // to standard output, made printable
+void warn(std::string_view line);        // to standard error, after "vornctl: "
+// Indented, with a line end. Bytes that are no UTF-8 come out as U+FFFD.
+void print_json(const nlohmann::ordered_json& json);
+
+// Columns aligned by display width, two spaces between them; cells are made printable.
+class Table {
+ public:
+  enum class Align { left, right };
+  struct Column {
+    std::string header;
+    Align align = Align::left;
+  };
+
+  explicit Table(std::vector<Column> columns) : columns_(std::move(columns)) {}
+  // As many cells as there are columns.
+  void add(std::vector<std::string> row);
+  bool empty() const { return rows_.empty(); }
+  std::string text() const;
+  void print() const;
+
+ private:
+  std::vector<Column> columns_;
+  std::vector<std::vector<std::string>> rows_;
+};
+
+}  // namespace ctl
+
+#endif

@@ -1,0 +1,63 @@
+// vornctl: administration of the reports on a host.
+#include <CLI/CLI.hpp>
+#include <clocale>
+#include <cstdio>
+#include <exception>
+
+#include "ctl.hpp"
+
+namespace {
+
+constexpr const char* kFooter =
+    "Exit status: 0 fine, 1 failed, 2 wrong usage. Every command is described in vornctl(8).";
+
+void run(int argc, char** argv) {
+  CLI::App app("Administration of vornreport: shares, profiles, runs and reports.", "vornctl");
+  app.footer(kFooter);
+  app.set_help_all_flag("--help-all", "Print the help of all commands and exit");
+  app.require_subcommand(1);
+  ctl::add_share_commands(app);
+  ctl::add_profile_commands(app);
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError& error) {
+    if (error.get_exit_code() == 0) {
+      app.exit(error);  // the help that was asked for
+    } else {
+      throw ctl::Failure(std::string(error.what()) + "; see vornctl --help", ctl::kWrongUsage);
+    }
+  }
+}
+
+// The exit status of a command that ran through, once all of its output is out.
+int finish() {
+  for (const std::string& message : ctl::take_host_messages()) {
+    ctl::warn(message);
+  }
+  if (std::fflush(stdout) != 0 || std::ferror(stdout) != 0) {
+    ctl::warn("standard output can't be written; its end is missing");
+    return ctl::kFailed;
+  }
+  return 0;
+}
+
+int fail(const char* message, int exit_code) {
+  finish();
+  if (*message != '\0') {
+    ctl::warn(message);
+  }
+  return exit_code;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) try {
+  std::setlocale(LC_CTYPE, "C.UTF-8");
+  ctl::take_host_messages();  // from here on they are collected
+  run(argc, argv);
+  return finish();
+} catch (const ctl::Failure& failure) {
+  return fail(failure.what(), failure.exit_code());
+} catch (const std::exception& error) {
+  return fail(error.what(), ctl::kFailed);
+}
