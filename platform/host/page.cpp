@@ -11,10 +11,14 @@
 namespace host {
 
 bool page_is_complete(const char* path) {
+  return page_is_complete_at(AT_FDCWD, path);
+}
+
+bool page_is_complete_at(int folder, const char* name) {
   constexpr std::string_view kBeginning = "<!DOCTYPE html>";
   constexpr std::string_view kLastLine = "\n</html>";
   const ErrnoKeeper keeper;
-  const Fd fd(open(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  const Fd fd(openat(folder, name, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
   struct stat status {};
   if (!fd || fstat(fd.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
     return false;

@@ -17,6 +17,7 @@
 #include "config_file.hpp"
 #include "file_io.hpp"
 #include "host_log.hpp"
+#include "old_reports.hpp"
 #include "profile.hpp"
 #include "run_lock.hpp"
 #include "run_temporary.hpp"
@@ -58,28 +59,6 @@ const char* report_dir_problem(std::string_view dir) {
 
 // --- The profile's own folder -------------------------------------------------------------------
 
-// Opens the folder of a profile's reports, if nobody but this user decides what stands in it;
-// a log line otherwise. An absent one is silent, with ENOENT.
-Fd open_report_folder(const std::string& folder) {
-  Fd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-  struct stat status {};
-  if (!opened || fstat(opened.get(), &status) != 0) {
-    if (errno != ENOENT) {
-      const bool replaced = errno == ELOOP || errno == ENOTDIR;
-      log_line("report folder %s can't be used (%s); move it away", folder.c_str(),
-               replaced ? "it is a link or a file" : std::strerror(errno));
-    }
-    return {};
-  }
-  if (status.st_uid != geteuid() || (status.st_mode & S_IWOTH) != 0) {
-    log_line("report folder %s belongs to another user or is writable by everyone; move it away",
-             folder.c_str());
-    errno = EPERM;
-    return {};
-  }
-  return opened;
-}
-
 bool make_report_folder(const std::string& dir, const std::string& folder) {
   const int saved_errno = errno;
   if (!make_folders(dir.empty() ? "/" : dir) ||
@@ -108,7 +87,7 @@ std::string local_time_name() {
 ReportRun run_named(const std::string& profile, const std::string& folder,
                     const std::string& name) {
   return {.profile = profile,
-          .unfinished = folder + "/." + name + std::string(kUnfinished),
+          .unfinished = folder + "/" + unfinished_name(name),
           .finished = folder + "/" + name,
           .page = folder + "/" + name + "/report.html"};
 }
@@ -189,6 +168,7 @@ std::optional<ReportRun> begin_report_run(const char* profile, const VLIBCSzHash
     return std::nullopt;
   }
   warn_of_unknown_shares(profile, hash);
+  run.keep = reports_to_keep(profile, hash);
   return run;
 }
 
@@ -220,6 +200,26 @@ int init_paths(const char* profile, VLIBCSzHash& hash, bool for_report) {
 
 }  // namespace
 
+Fd open_report_folder(const std::string& folder) {
+  Fd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  struct stat status {};
+  if (!opened || fstat(opened.get(), &status) != 0) {
+    if (errno != ENOENT) {
+      const bool replaced = errno == ELOOP || errno == ENOTDIR;
+      log_line("report folder %s can't be used (%s); move it away", folder.c_str(),
+               replaced ? "it is a link or a file" : std::strerror(errno));
+    }
+    return {};
+  }
+  if (status.st_uid != geteuid() || (status.st_mode & S_IWOTH) != 0) {
+    log_line("report folder %s belongs to another user or is writable by everyone; move it away",
+             folder.c_str());
+    errno = EPERM;
+    return {};
+  }
+  return opened;
+}
+
 std::optional<std::string> report_dir(const char* profile, const VLIBCSzHash& hash) {
   const char* value = hash.find("report_dir");
   std::string dir = value == nullptr || *value == '\0' ? VORN_PATH_REPORTS : value;
@@ -244,21 +244,36 @@ void remove_statistics(const std::string& profile) {
   unlink((path + "-journal").c_str());
 }
 
-std::optional<std::vector<std::string>> unfinished_reports(const std::string& folder) {
-  const int saved_errno = errno;
-  std::vector<std::string> found;
-  Fd opened = open_report_folder(folder);
-  if (!opened && errno != ENOENT) {
-    return std::nullopt;
-  }
-  const std::unique_ptr<DIR, CloseDir> dir(opened ? fdopendir(opened.get()) : nullptr);
+std::vector<std::string> entries_of(const Fd& folder) {
+  std::vector<std::string> names;
+  Fd own(folder ? openat(folder.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC) : -1);
+  const std::unique_ptr<DIR, CloseDir> dir(own ? fdopendir(own.get()) : nullptr);
   if (dir) {
-    opened.release();  // it belongs to `dir` now
+    own.release();  // it belongs to `dir` now
   }
   while (const dirent* entry = dir ? readdir(dir.get()) : nullptr) {
     const std::string_view name = entry->d_name;
+    if (name != "." && name != "..") {
+      names.emplace_back(name);
+    }
+  }
+  return names;
+}
+
+std::string unfinished_name(const std::string& name) {
+  return "." + name + std::string(kUnfinished);
+}
+
+std::optional<std::vector<std::string>> unfinished_reports(const std::string& folder) {
+  const int saved_errno = errno;
+  std::vector<std::string> found;
+  const Fd opened = open_report_folder(folder);
+  if (!opened && errno != ENOENT) {
+    return std::nullopt;
+  }
+  for (const std::string& name : entries_of(opened)) {
     if (name.size() > kUnfinished.size() && name.starts_with('.') && name.ends_with(kUnfinished)) {
-      found.push_back(folder + "/" + entry->d_name);
+      found.push_back(folder + "/" + name);
     }
   }
   errno = saved_errno;

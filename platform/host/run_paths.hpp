@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "file_io.hpp"
 #include "vorn/text.h"
 
 namespace host {
@@ -20,6 +21,14 @@ std::string statistics_path(const std::string& profile);
 // Removes it, with its journal.
 void remove_statistics(const std::string& profile);
 
+// Opens the folder of a profile's reports, if nobody but this user decides what stands in it; no
+// descriptor and a log line otherwise. An absent one is silent, with ENOENT.
+Fd open_report_folder(const std::string& folder);
+// The names in an open folder, "." and ".." left out; those up to where it couldn't be read on.
+std::vector<std::string> entries_of(const Fd& folder);
+// The name that a report has while it isn't finished, by the name that it gets.
+std::string unfinished_name(const std::string& name);
+
 // The unfinished reports in `folder`, which belongs to one profile. Nothing, after one log line,
 // when `folder` is a link or not this user's; an absent one is an empty answer.
 std::optional<std::vector<std::string>> unfinished_reports(const std::string& folder);
@@ -30,6 +39,7 @@ struct ReportRun {
   std::string unfinished;  // real_path_date
   std::string finished;    // real_path_date_final
   std::string page;        // real_path_report_final
+  std::size_t keep = 0;    // reports that the profile keeps; 0: all
 };
 
 std::optional<ReportRun>& report_run();

@@ -6,12 +6,14 @@
 #include <cstdio>
 #include <cstring>
 #include <exception>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "file_io.hpp"
 #include "host_log.hpp"
+#include "old_reports.hpp"
 #include "page.hpp"
 #include "profile.hpp"
 #include "run_lock.hpp"
@@ -72,10 +74,17 @@ int update_status(const std::string& profile, std::string_view word) {
     take_back(*report_run());
     word = "fail";
   }
+  std::optional<ReportRun> ended;
   if (reporting && word != "collect_data") {
-    report_run().reset();
+    ended.swap(report_run());
   }
-  return store_status(profile, word);
+  const int result = store_status(profile, word);
+  if (ended && word == "success" && result == 0 && ended->keep > 0) {
+    const std::size_t slash = ended->finished.rfind('/');
+    remove_old_reports(ended->finished.substr(0, slash), ended->keep,
+                       std::string_view(ended->finished).substr(slash + 1));
+  }
+  return result;
 }
 
 // The order keeps this off a run that starts at the same time: what is there is noted first, then

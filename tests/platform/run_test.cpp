@@ -6,6 +6,7 @@
 #include <filesystem>
 #include <set>
 
+#include "old_reports.hpp"
 #include "support.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
@@ -195,4 +196,57 @@ TEST_F(Run, SuccessNeedsACompletePage) {
     EXPECT_FALSE(exists(path("real_path_date")));
     EXPECT_EQ(syslog_lines().size(), good ? 0U : 1U);
   }
+}
+
+TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
+  const std::string whole = "<!DOCTYPE html>\n</html>\n";
+  const std::string own = folder.path("keep");
+  const std::vector<std::string> old = {"1999-12-31_23-59-59", "2001-02-03_04-05-06",
+                                        "2001-02-03_04-05-06-2", "2001-02-03_04-05-06-10",
+                                        "2999-01-01_00-00-00"};
+  const std::vector<std::string> others = {"2000-01-01_00-00-00-x", "2000-01-01",
+                                           "2000-02-30_00-00-00", ".2000-01-01_00-00-00"};
+  const struct {
+    const char* value;
+    std::size_t stay;  // of the old ones
+    std::size_t lines;
+  } cases[] = {{"", 5, 0},  {"4", 3, 0},  {"2", 1, 0},     {"1", 0, 0},
+               {"0", 5, 1}, {"+1", 5, 1}, {"1 week", 5, 1}};
+  write_file(folder.path("elsewhere/report.html"), whole);
+  for (const auto& [value, stay, lines] : cases) {
+    SCOPED_TRACE(value);
+    fs::remove_all(own);
+    std::set<std::string> expected(others.begin(), others.end());
+    for (const std::string& name : old) {
+      write_file(own + "/" + name + "/report.html", whole);
+      fs::create_directory_symlink(folder.path("elsewhere"), own + "/" + name + "/csv");
+    }
+    for (const std::string& name : others) {
+      write_file(own + "/" + name + "/report.html", whole);
+    }
+    write_file(own + "/" + *expected.insert("2000-01-01_00-00-02").first + "/report.html", "cut");
+    fs::create_directory_symlink(folder.path("elsewhere"),
+                                 own + "/" + *expected.insert("2000-01-01_00-00-01").first);
+    expected.insert(old.end() - static_cast<std::ptrdiff_t>(stay), old.end());
+    hash = support::make_hash({{"report_dir", folder.path()}, {"keep_reports", value}});
+    ASSERT_EQ(begin("keep"), 0);
+    publish(whole);
+    expected.insert(fs::path(path("real_path_date_final")).filename());
+    EXPECT_EQ(VornQazStatusUpdate("keep", "success"), 0);
+    EXPECT_EQ(syslog_lines().size(), lines);
+    std::set<std::string> left;
+    for (const auto& entry : fs::directory_iterator(own)) {
+      left.insert(entry.path().filename());
+    }
+    EXPECT_EQ(left, expected);
+  }
+  EXPECT_EQ(read_file(folder.path("elsewhere/report.html")), whole);
+  for (const char* name : {"2000-01-01_00-00-01", "2000-01-01_00-00-02", "..", "elsewhere"}) {
+    EXPECT_FALSE(host::remove_report(own, name)) << name;
+    EXPECT_EQ(syslog_lines().size(), 1U);
+  }
+  const auto listed = host::stored_reports(own, host::ReportSize::measured);
+  ASSERT_EQ(listed.value().size(), 7U);
+  EXPECT_EQ((*listed)[1].name + ((*listed)[1].is_whole ? " whole" : ""), "2000-01-01_00-00-02");
+  EXPECT_GE((*listed)[1].size, 4096U);
 }
