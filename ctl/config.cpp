@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "config_edit.hpp"
 #include "config_file.hpp"
 #include "config_lines.hpp"
 #include "ctl.hpp"
@@ -39,6 +40,12 @@ bool has_section(const Lines& lines, std::string_view name) {
   return std::any_of(lines.begin(), lines.end(), [name](const host::ConfigLine& line) {
     return line.kind == host::LineKind::header && line.name == name;
   });
+}
+
+void edit(const char* file, const host::SectionEdit& edit) {
+  if (host::edit_section(file, edit) != 0) {
+    throw host_failure(std::string(file) + " can't be changed");
+  }
 }
 
 }  // namespace
@@ -108,6 +115,18 @@ std::vector<host::Share> read_shares() {
     throw host_failure(VORN_PATH_SHARES " can't be read");
   }
   return std::move(*shares);
+}
+
+void add_section(const char* file, const std::string& name, const Changes& entries) {
+  edit(file, {host::SectionEdit::Kind::add, name, entries});
+}
+
+void change_section(const char* file, const std::string& name, const Changes& changes) {
+  edit(file, {host::SectionEdit::Kind::change, name, changes});
+}
+
+void remove_section(const char* file, const std::string& name) {
+  edit(file, {host::SectionEdit::Kind::remove, name, {}});
 }
 
 }  // namespace ctl

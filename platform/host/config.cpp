@@ -1,19 +1,11 @@
 // Sectioned configuration files: reading, listing and rewriting.
 #include "vorn/config.h"
 
-#include <fcntl.h>
-#include <sys/file.h>
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <cerrno>
 #include <chrono>
-#include <climits>
-#include <cstdlib>
 #include <cstring>
 #include <exception>
-#include <memory>
-#include <thread>
 
 #include "config_file.hpp"
 #include "config_lines.hpp"
@@ -129,45 +121,6 @@ std::string rewritten(const std::vector<ConfigLine>& lines, const SectionRange& 
   return text;
 }
 
-// Taken beside the file, because the file itself is replaced; never removed, because a writer that
-// waits on a removed lock file would not keep out one that made it anew.
-Fd lock_beside(const std::string& file, std::chrono::milliseconds wait) {
-  constexpr std::chrono::milliseconds kPause{20};
-  const std::size_t slash = file.rfind('/') + 1;
-  const std::string path = file.substr(0, slash) + "." + file.substr(slash) + ".lock";
-  Fd lock(open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
-  if (!lock) {
-    log_line("lock file %s can't be opened (%s); %s is unchanged", path.c_str(),
-             std::strerror(errno), file.c_str());
-    fail(VLIBC_ERR_FILE_IO, __LINE__);
-    return lock;
-  }
-  const auto deadline = std::chrono::steady_clock::now() + wait;
-  while (flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
-    if (errno != EWOULDBLOCK || std::chrono::steady_clock::now() >= deadline) {
-      log_line("%s is being changed by another process (lock file %s); it is unchanged, try again",
-               file.c_str(), path.c_str());
-      fail(VLIBC_ERR_LOCK_BUSY, __LINE__);
-      return {};
-    }
-    std::this_thread::sleep_for(kPause);
-  }
-  return lock;
-}
-
-bool replace(const std::string& file, std::string_view text) {
-  struct stat before {};
-  AtomicFile target(file);
-  if (lstat(file.c_str(), &before) != 0 || target.fd() < 0 ||
-      fchown(target.fd(), before.st_uid, before.st_gid) != 0 ||
-      fchmod(target.fd(), before.st_mode & 07777U) != 0 || !write_all(target.fd(), text) ||
-      !target.commit()) {
-    log_line("%s can't be replaced (%s); it is unchanged", file.c_str(), std::strerror(errno));
-    return false;
-  }
-  return true;
-}
-
 }  // namespace
 
 std::optional<std::string> read_config(const char* file) {
@@ -185,7 +138,6 @@ bool config_is_readable(const char* file) {
 
 int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
                 std::string_view format, std::chrono::milliseconds lock_wait) {
-  const int saved_errno = errno;
   const Entries entries = hash.sorted();
   if (!valid_format(format)) {
     log_line("%s: not rewritten: the line format needs %%s twice and a line end", file);
@@ -194,33 +146,20 @@ int set_section(const char* file, std::string_view section, const VLIBCSzHash& h
   if (!entries_fit(file, format, entries)) {
     return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
-  // An administrator's link to the file stays; what it leads to is what gets replaced.
-  const std::unique_ptr<char, decltype(&std::free)> resolved(realpath(file, nullptr), &std::free);
-  const std::string target = resolved ? resolved.get() : file;
-  const Fd lock = lock_beside(target, lock_wait);
-  if (!lock) {
-    return -1;
-  }
-  const std::optional<std::string> text = read_config(target.c_str());
-  if (!text) {
-    return fail(VLIBC_ERR_FILE_IO, __LINE__);
-  }
-  const std::vector<ConfigLine> lines = parse_lines(*text);
-  SectionRange range;
-  const FindResult result = find_section(lines, file, section, range);
-  if (result == FindResult::missing) {
-    log_line("%s: section [%.*s] is missing, so it can't be rewritten", file,
-             static_cast<int>(std::min<std::size_t>(section.size(), 100)), section.data());
-  }
-  if (result != FindResult::found) {
-    return find_failure(result, __LINE__);
-  }
-  const std::string new_text = rewritten(lines, range, format, entries);
-  if (new_text != *text && !replace(target, new_text)) {
-    return fail(VLIBC_ERR_FILE_IO, __LINE__);
-  }
-  errno = saved_errno;  // waiting for the lock has left its own
-  return 0;
+  return rewrite_config(file, lock_wait, [&](std::string_view text) -> std::optional<std::string> {
+    const std::vector<ConfigLine> lines = parse_lines(text);
+    SectionRange range;
+    const FindResult result = find_section(lines, file, section, range);
+    if (result == FindResult::missing) {
+      log_line("%s: section [%.*s] is missing, so it can't be rewritten", file,
+               static_cast<int>(std::min<std::size_t>(section.size(), 100)), section.data());
+    }
+    if (result != FindResult::found) {
+      find_failure(result, __LINE__);
+      return std::nullopt;
+    }
+    return rewritten(lines, range, format, entries);
+  });
 }
 
 }  // namespace host

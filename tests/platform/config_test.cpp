@@ -9,6 +9,7 @@
 #include <cstring>
 #include <filesystem>
 
+#include "config_edit.hpp"
 #include "support.hpp"
 #include "text_containers.hpp"
 
@@ -136,4 +137,43 @@ TEST_F(Config, TwoWritersLoseNothing) {
   EXPECT_EQ(read_file(file), "[left]\n\tn = 1000\n# between\n[right]\n\tn = 1000\n");
   const auto names = std::filesystem::directory_iterator(folder.path());
   EXPECT_EQ(std::distance(begin(names), end(names)), 2);  // file and lock, nothing temporary
+}
+
+TEST_F(Config, EditsKeepWhatTheyAreNotAbout) {
+  using Kind = host::SectionEdit::Kind;
+  constexpr const char* kBoth = "# top\n\n# of a\n[a]\n x = 1\n# in a\ny=2\n\n# of b\n[b]\nz=3\n";
+  const struct {
+    const char* before;
+    host::SectionEdit edit;
+    std::string after;  // empty: it is refused, and nothing changes
+    const char* message = "";
+  } cases[] = {
+      {"", {Kind::add, "n", {{"k", "v"}, {"e", ""}}}, "[n]\nk = v\ne =\n"},
+      {"# c", {Kind::add, "n", {{"k", "v"}, {"u", std::nullopt}}}, "# c\n\n[n]\nk = v\n"},
+      {"[o]\r\nx=1\r\n", {Kind::add, "n", {{"k", "v"}}}, "[o]\r\nx=1\r\n\r\n[n]\r\nk = v\r\n"},
+      {kBoth,
+       {Kind::change, "a", {{"x", "9"}, {"y", std::nullopt}, {"n", "1"}, {"n", "2"}}},
+       "# top\n\n# of a\n[a]\n x = 9\n# in a\nn = 2\n\n# of b\n[b]\nz=3\n"},
+      {"[a]\r\nx=1", {Kind::change, "a", {{"x", "1"}, {"n", "#"}}}, "[a]\r\nx=1\nn = #\n"},
+      {"[a]", {Kind::change, "a", {{"n", "[b]"}}}, "[a]\nn = [b]\n"},
+      {kBoth, {Kind::remove, "a", {}}, "# top\n\n# of a\n\n# of b\n[b]\nz=3\n"},
+      {kBoth, {Kind::remove, "b", {}}, "# top\n\n# of a\n[a]\n x = 1\n# in a\ny=2\n\n# of b\n"},
+      {"\xEF\xBB\xBF[a]\nx=1\n\n\n[b]\n", {Kind::remove, "a", {}}, "\xEF\xBB\xBF[b]\n"},
+      {"[c\n[b]\n\n[a]\nx=1", {Kind::remove, "a", {}}, "[c\n[b]\n"},
+      {"[a]\n", {Kind::add, "a", {}}, "", "has a section [a] already"},
+      {"[a]\n", {Kind::change, "b", {}}, "", "has no section [b]"},
+      {"[a]\nx\n", {Kind::remove, "a", {}}, "", ":2: malformed line"},
+      {"[a]\n", {Kind::add, "b]", {}}, "", "would not read back"},
+      {"[a]\n", {Kind::add, " b", {}}, "", "would not read back"},
+      {"[a]\n", {Kind::add, "b\n[a]", {}}, "", "would not read back"},
+      {"[a]\n", {Kind::change, "a", {{"k", "1\nl = 2"}}}, "", "would not read back"},
+      {"[a]\n", {Kind::change, "a", {{"k", " 1"}}}, "", "would not read back"},
+      {"[a]\n", {Kind::change, "a", {{"#k", "1"}}}, "", "would not read back"}};
+  for (const auto& [before, edit, after, message] : cases) {
+    SCOPED_TRACE(before + edit.section);
+    write_file(file, before);
+    EXPECT_EQ(host::edit_section(file.c_str(), edit), after.empty() ? -1 : 0);
+    EXPECT_EQ(read_file(file), after.empty() ? before : after);
+    EXPECT_NE(support::syslog_text().find(message), std::string::npos);
+  }
 }
