@@ -2,6 +2,7 @@
 #include <CLI/CLI.hpp>
 #include <clocale>
 #include <cstdio>
+#include <cstdlib>
 #include <exception>
 
 #include "ctl.hpp"
@@ -18,6 +19,10 @@ void run(int argc, char** argv) {
   app.require_subcommand(1);
   ctl::add_share_commands(app);
   ctl::add_profile_commands(app);
+  ctl::add_run_command(app);
+  ctl::add_schedule_command(app);
+  ctl::add_status_command(app);
+  ctl::add_reports_command(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
@@ -53,6 +58,7 @@ int fail(const char* message, int exit_code) {
 
 int main(int argc, char** argv) try {
   std::setlocale(LC_CTYPE, "C.UTF-8");
+  unsetenv("TZ");  // runs and cron have the system's time zone, so times are told in it
   ctl::take_host_messages();  // from here on they are collected
   run(argc, argv);
   return finish();

@@ -1,0 +1,204 @@
+// vornctl reports: the finished reports of a profile.
+#include <spawn.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <chrono>
+#include <cstdlib>
+#include <memory>
+#include <nlohmann/json.hpp>
+
+#include "child.hpp"
+#include "ctl.hpp"
+#include "profile_state.hpp"
+#include "text_containers.hpp"
+#include "vorn/report.h"
+
+namespace ctl {
+namespace {
+
+using Reports = std::vector<host::StoredReport>;
+
+struct Options {
+  std::string profile;
+  std::string action = "list";
+  std::string argument;
+  std::string older_than;
+  bool dry_run = false;
+  bool json = false;
+};
+
+void list(const Options& options, const std::string& folder, const Reports& reports) {
+  if (options.json) {
+    auto array = nlohmann::ordered_json::array();
+    for (const host::StoredReport& report : reports) {
+      array.push_back({{"name", report.name},
+                       {"made", json_time(report.made)},
+                       {"bytes", report.size},
+                       {"complete", report.is_whole},
+                       {"path", folder + "/" + report.name + "/report.html"}});
+    }
+    print_json(array);
+    return;
+  }
+  Table table({{"DATE"}, {"SIZE", Table::Align::right}, {"COMPLETE"}, {"PATH"}});
+  for (const host::StoredReport& report : reports) {
+    table.add({report.name, size_text(report.size), report.is_whole ? "yes" : "no",
+               folder + "/" + report.name + "/report.html"});
+  }
+  if (table.empty()) {
+    print_line("profile " + options.profile + " has no reports in " + folder);
+  } else {
+    table.print();
+  }
+}
+
+// --- Opening ------------------------------------------------------------------------------------
+
+// The newest whole report whose name begins with `date`.
+const host::StoredReport& find_report(const Options& options, const Reports& reports) {
+  for (auto report = reports.rbegin(); report != reports.rend(); ++report) {
+    if (report->is_whole && report->name.starts_with(options.argument)) {
+      return *report;
+    }
+  }
+  throw Failure("profile " + options.profile + " has no complete report" +
+                (options.argument.empty() ? "" : " of " + options.argument) +
+                "; see vornctl reports " + options.profile);
+}
+
+// The link that the report's mail has; empty when it can't be made.
+std::string link_to(const Section& profile, const std::string& page) {
+  VLIBCSzHash hash(profile.entries.size());
+  for (const auto& [key, value] : profile.entries) {
+    hash.set(key, value);
+  }
+  std::array<char, 8192> link{};
+  return VornGetTargetLink(&hash, page.c_str(), link.data(), link.size()) < 0 ? "" : link.data();
+}
+
+void open_report(const Options& options, const std::string& folder, const Reports& reports) {
+  constexpr const char* kOpener = "/usr/bin/xdg-open";
+  const std::string page = folder + "/" + find_report(options, reports).name + "/report.html";
+  const bool has_display =
+      std::getenv("DISPLAY") != nullptr || std::getenv("WAYLAND_DISPLAY") != nullptr;
+  if (has_display && access(kOpener, X_OK) == 0) {
+    // A browser may stay in the foreground, so nobody waits for it.
+    std::array<char*, 3> argv{const_cast<char*>(kOpener), const_cast<char*>(page.c_str()), nullptr};
+    pid_t pid = 0;
+    if (posix_spawn(&pid, kOpener, nullptr, nullptr, argv.data(), environ) == 0) {
+      return;
+    }
+  }
+  print_line(page);
+  if (const std::string link = link_to(read_profile(options.profile), page); !link.empty()) {
+    print_line(link);
+  }
+}
+
+// --- Removing -----------------------------------------------------------------------------------
+
+// "90d", "12w" or "2y".
+std::chrono::hours parse_age(const std::string& text) {
+  constexpr int kMost = 36500;
+  constexpr std::chrono::hours kDay{24};
+  int count = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), count);
+  const std::string unit(end, text.data() + text.size());
+  const int days = unit == "d" ? 1 : unit == "w" ? 7 : unit == "y" ? 365 : 0;
+  if (error != std::errc{} || days == 0 || count < 1 || count > kMost) {
+    throw Failure("--older-than \"" + text + "\" is no age; write 90d, 12w or 2y", kWrongUsage);
+  }
+  return count * days * kDay;
+}
+
+std::size_t parse_count(const std::string& text) {
+  std::size_t count = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), count);
+  if (error != std::errc{} || end != text.data() + text.size() || count < 1) {
+    throw Failure("keep needs a number from 1 on: how many of the newest reports stay",
+                  kWrongUsage);
+  }
+  return count;
+}
+
+// The whole reports, oldest first, without the `keep` newest.
+Reports all_but_newest(Reports reports, std::size_t keep) {
+  std::erase_if(reports, [](const host::StoredReport& report) { return !report.is_whole; });
+  reports.resize(reports.size() - std::min(keep, reports.size()));
+  return reports;
+}
+
+Reports older_than(const Options& options, Reports reports) {
+  const std::time_t limit =
+      std::time(nullptr) - std::chrono::seconds(parse_age(options.older_than)).count();
+  // A run that is going on may be about to mail the link to the newest.
+  const bool running = run_state(options.profile) == RunState::running;
+  reports = all_but_newest(std::move(reports), running ? 1 : 0);
+  std::erase_if(reports,
+                [limit](const host::StoredReport& report) { return report.made >= limit; });
+  return reports;
+}
+
+void remove(const Options& options, const std::string& folder, const Reports& doomed) {
+  std::uint64_t bytes = 0;
+  std::size_t removed = 0;
+  for (const host::StoredReport& report : doomed) {
+    if (!options.dry_run && !host::remove_report(folder, report.name)) {
+      continue;  // a message says why
+    }
+    print_line((options.dry_run ? "would remove " : "removed ") + folder + "/" + report.name);
+    bytes += report.size;
+    ++removed;
+  }
+  print_line(std::to_string(removed) + (removed == 1 ? " report, " : " reports, ") +
+             size_text(bytes));
+  if (removed < doomed.size()) {
+    throw host_failure("not all of them could be removed");
+  }
+}
+
+void reports(const Options& options) {
+  if (options.json && options.action != "list") {
+    throw Failure("--json goes with the list only", kWrongUsage);
+  }
+  if (options.older_than.empty() != (options.action != "remove")) {
+    throw Failure("write remove --older-than AGE, for instance remove --older-than 90d",
+                  kWrongUsage);
+  }
+  const std::size_t keep = options.action == "keep" ? parse_count(options.argument) : 0;
+  const std::string folder = report_folder(read_profile(options.profile));
+  const Reports found = reports_in(
+      folder, options.action == "open" ? host::ReportSize::left_out : host::ReportSize::measured);
+  if (options.action == "open") {
+    open_report(options, folder, found);
+  } else if (options.action == "remove") {
+    remove(options, folder, older_than(options, found));
+  } else if (options.action == "keep") {
+    remove(options, folder, all_but_newest(found, keep));
+  } else {
+    list(options, folder, found);
+  }
+}
+
+}  // namespace
+
+void add_reports_command(CLI::App& app) {
+  auto options = std::make_shared<Options>();
+  CLI::App* command = app.add_subcommand("reports", "List, open and remove finished reports");
+  add_profile_argument(*command, options->profile);
+  command->add_option("ACTION", options->action, "list, open [DATE], remove or keep N")
+      ->type_name("")
+      ->check(CLI::IsMember({"list", "open", "remove", "keep"}));
+  command->add_option("ARGUMENT", options->argument, "For open and keep")->type_name("");
+  command->add_option("--older-than", options->older_than, "With remove: 90d, 12w or 2y")
+      ->type_name("AGE");
+  command->add_flag("--dry-run", options->dry_run, "Only say what would be removed");
+  add_json_flag(*command, options->json);
+  command->callback([options] { reports(*options); });
+}
+
+}  // namespace ctl

@@ -1,0 +1,95 @@
+#include "run_log.hpp"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <chrono>
+#include <string_view>
+#include <thread>
+
+#include "child.hpp"
+#include "file_io.hpp"
+
+namespace ctl {
+namespace {
+
+constexpr const char* kJournalctl = "/usr/bin/journalctl";
+constexpr std::array kLogFiles{"/var/log/syslog", "/var/log/messages"};
+constexpr std::string_view kTag = " vornreport: ";
+constexpr std::size_t kKept = 5;
+constexpr int kTries = 10;
+constexpr std::chrono::milliseconds kPause{100};
+
+std::vector<std::string> lines_of(std::string_view text) {
+  std::vector<std::string> lines;
+  for (std::size_t start = 0; start < text.size();) {
+    const std::size_t end = std::min(text.find('\n', start), text.size());
+    if (end > start) {
+      lines.emplace_back(text.substr(start, end - start));
+    }
+    start = end + 1;
+  }
+  return lines;
+}
+
+std::string journal_of(pid_t pid) {
+  constexpr std::chrono::seconds kLimit{5};
+  const Finished read = run_program({kJournalctl, "--quiet", "--no-pager", "--output=cat",
+                                     "--lines=5", "_PID=" + std::to_string(pid)},
+                                    kLimit);
+  return read.exit_status == 0 ? read.output : "";
+}
+
+std::string text_behind(const std::string& file, off_t start) {
+  constexpr std::size_t kLongest = 1U << 20U;
+  const host::Fd fd(open(file.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  std::string text(kLongest, '\0');
+  const ssize_t got = fd ? pread(fd.get(), text.data(), text.size(), start) : 0;
+  text.resize(static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
+  return text;
+}
+
+}  // namespace
+
+RunLog::RunLog()
+    : is_journal_(access("/run/systemd/journal/socket", F_OK) == 0 &&
+                  access(kJournalctl, X_OK) == 0) {
+  struct stat status {};
+  for (const char* file : kLogFiles) {
+    if (file_.empty() && stat(file, &status) == 0 && S_ISREG(status.st_mode)) {
+      file_ = file;
+      end_ = status.st_size;
+    }
+  }
+}
+
+std::vector<std::string> RunLog::messages(pid_t pid) const {
+  std::vector<std::string> found;
+  for (int i = 0; i < kTries && found.empty() && (is_journal_ || !file_.empty()); ++i) {
+    std::this_thread::sleep_for(kPause);
+    if (is_journal_) {
+      found = lines_of(journal_of(pid));
+      continue;
+    }
+    for (const std::string& line : lines_of(text_behind(file_, end_))) {
+      if (const std::size_t tag = line.find(kTag); tag != std::string::npos) {
+        found.push_back(line.substr(tag + kTag.size()));
+      }
+    }
+  }
+  found.erase(found.begin(), found.end() - static_cast<long>(std::min(found.size(), kKept)));
+  return found;
+}
+
+const char* RunLog::command() const {
+  if (is_journal_) {
+    return "journalctl -t vornreport";
+  }
+  return file_ == kLogFiles[1] ? "grep vornreport /var/log/messages"
+                               : "grep vornreport /var/log/syslog";
+}
+
+}  // namespace ctl

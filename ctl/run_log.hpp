@@ -1,0 +1,30 @@
+// What a run has said to the system log.
+#ifndef VORN_CTL_RUN_LOG_HPP
+#define VORN_CTL_RUN_LOG_HPP
+
+#include <sys/types.h>
+
+#include <string>
+#include <vector>
+
+namespace ctl {
+
+class RunLog {
+ public:
+  // Notes where the log ends now.
+  RunLog();
+  // The last messages of process `pid` since then; a log daemon gets a moment to write them. Empty
+  // when there are none or the log can't be read.
+  std::vector<std::string> messages(pid_t pid) const;
+  // The command that shows all of them.
+  const char* command() const;
+
+ private:
+  bool is_journal_ = false;
+  std::string file_;  // empty when there is none
+  off_t end_ = 0;
+};
+
+}  // namespace ctl
+
+#endif

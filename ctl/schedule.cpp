@@ -1,0 +1,184 @@
+// vornctl schedule: the cron file of a profile.
+//
+// The file and the profile's key are two things, so their order matters: the key is written first
+// and removed last. Whatever ends this in between, no job is left that the profile doesn't name,
+// and "vornreport --clean" removes what there is.
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <array>
+#include <cerrno>
+#include <cstdint>
+#include <cstdio>
+#include <cstring>
+
+#include "cron_times.hpp"
+#include "ctl.hpp"
+#include "file_io.hpp"
+#include "profile_state.hpp"
+#include "schedules.hpp"
+#include "vorn/paths.h"
+
+namespace ctl {
+namespace {
+
+struct Options {
+  std::string profile;
+  std::string report;
+  std::string data;
+  bool clean = false;
+};
+
+constexpr std::size_t kLongestId = 64;
+constexpr std::size_t kLargestCronFile = 1U << 20U;
+
+bool is_id(std::string_view id) {
+  return !id.empty() && id.size() <= kLongestId &&
+         id.find_first_not_of("ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789_-") ==
+             std::string_view::npos;
+}
+
+// An identifier that no other profile name gives. Cron leaves out files with a dot in their name,
+// so a name with dots gets a digest behind it.
+std::string id_for(const std::string& profile) {
+  if (is_id(profile)) {
+    return profile;
+  }
+  constexpr std::size_t kKept = 48;
+  std::uint32_t digest = 2166136261U;  // FNV-1a
+  std::string id;
+  for (const char c : profile) {
+    digest = (digest ^ static_cast<unsigned char>(c)) * 16777619U;
+    id += c == '.' ? '-' : c;
+  }
+  std::array<char, 16> suffix{};
+  std::snprintf(suffix.data(), suffix.size(), "-%08x", digest);
+  return id.substr(0, kKept) + suffix.data();
+}
+
+// The identifier that the profile has, unless it is of no use: then a new one.
+std::string schedule_id(const Section& profile) {
+  const std::string kept = profile.value(kScheduleKey);
+  if (!is_id(kept)) {
+    return id_for(profile.name);
+  }
+  for (const Section& other : read_profiles()) {
+    if (other.name != profile.name && other.value(kScheduleKey) == kept) {
+      throw Failure("profile " + other.name + " has the schedule " + kept + ", too; unset " +
+                    kScheduleKey + " of one of them");
+    }
+  }
+  return kept;
+}
+
+CronTimes parse_times(const std::string& option, const std::string& text) {
+  try {
+    return CronTimes(text);
+  } catch (const std::runtime_error& error) {
+    throw Failure(option + ": " + error.what(), kWrongUsage);
+  }
+}
+
+// Where cron mails what a job prints is left to the machine (MAILTO, else the owner, root). The
+// progress on standard output is dropped, so that a mail comes only when a command complained.
+std::string job_line(const std::string& profile, JobKind kind, const std::string& times) {
+  return times + " root " + kProgram + " " + option_of(kind) + " " + profile + " >/dev/null\n";
+}
+
+void write_cron_file(const std::string& path, const std::string& text) {
+  host::AtomicFile file(path);  // cron leaves the temporary one out: its name begins with a dot
+  constexpr mode_t kMode = 0644;
+  if (file.fd() < 0 || fchmod(file.fd(), kMode) != 0 || !host::write_all(file.fd(), text) ||
+      !file.commit()) {
+    throw Failure(path + " can't be written (" + std::strerror(errno) +
+                  "); run this as root and see that cron is installed");
+  }
+}
+
+void set_schedule(const Options& options) {
+  // Both are read before anything is written.
+  std::string report_times = options.report;
+  std::string data_times = options.data;
+  if (!report_times.empty()) {
+    report_times = parse_times("--report", report_times).text();
+  }
+  if (!data_times.empty()) {
+    data_times = parse_times("--data", data_times).text();
+  }
+  const Section profile = read_profile(options.profile);
+  const std::string id = schedule_id(profile);
+  const std::string path = cron_file(id);
+  const std::string before = host::read_file(path, kLargestCronFile).value_or("");
+  if (!only_runs(profile.name, before)) {
+    throw Failure(path + " holds other jobs than those of profile " + profile.name +
+                  "; move them to a file of their own");
+  }
+  for (const Job& job : jobs_in(path, before)) {  // a kind that isn't named keeps its times
+    std::string& times = job.kind == JobKind::report ? report_times : data_times;
+    times = times.empty() ? job.times : times;
+  }
+  std::string text = "# Written by vornctl; change it with vornctl schedule.\n";
+  text += report_times.empty() ? "" : job_line(profile.name, JobKind::report, report_times);
+  text += data_times.empty() ? "" : job_line(profile.name, JobKind::data, data_times);
+  change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, id}});
+  write_cron_file(path, text);
+  for (const Job& job : jobs_in(path, text)) {
+    const auto next = next_run(job, std::time(nullptr));
+    print_line(std::string(option_of(job.kind)) + " " + job.profile + ": " + job.times +
+               (next ? ", next at " + time_text(*next) : ""));
+  }
+}
+
+void clean_schedule(const Options& options) {
+  const Section profile = read_profile(options.profile);
+  const std::string id = profile.value(kScheduleKey);
+  if (id.empty()) {
+    print_line("profile " + profile.name + " has no schedule");
+    return;
+  }
+  if (!is_id(id)) {
+    throw Failure("profile " + profile.name + ": " + kScheduleKey + " = " + id +
+                  " is no schedule identifier; unset it with vornctl profile set");
+  }
+  const std::string path = cron_file(id);
+  const auto text = host::read_file(path, kLargestCronFile);
+  if (text && !only_runs(profile.name, *text)) {
+    throw Failure(path + " holds other jobs than those of profile " + profile.name +
+                  "; move them to a file of their own");
+  }
+  if (unlink(path.c_str()) != 0 && errno != ENOENT) {
+    throw Failure(path + " can't be removed (" + std::strerror(errno) + "); run this as root");
+  }
+  change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, std::nullopt}});
+  print_line("removed " + path);
+}
+
+void schedule(const Options& options) {
+  if (options.clean) {
+    clean_schedule(options);
+  } else if (options.report.empty() && options.data.empty()) {
+    throw Failure("say when: --report or --data with five cron fields, or --clean; see vornctl(8)",
+                  kWrongUsage);
+  } else {
+    set_schedule(options);
+  }
+}
+
+}  // namespace
+
+void add_schedule_command(CLI::App& app) {
+  auto options = std::make_shared<Options>();
+  CLI::App* command = app.add_subcommand("schedule", "Run a profile from cron");
+  add_profile_argument(*command, options->profile);
+  command
+      ->add_option("--report", options->report, "When to make a report: five cron fields or @daily")
+      ->type_name("TIMES");
+  command->add_option("--data", options->data, "When to only collect data")->type_name("TIMES");
+  command->add_flag("--clean", options->clean, "Remove the schedule")
+      ->excludes("--report")
+      ->excludes("--data");
+  command->callback([options] { schedule(*options); });
+}
+
+}  // namespace ctl
