@@ -1,4 +1,6 @@
 // The link under which readers find a finished report.
+#include "link.hpp"
+
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -37,30 +39,13 @@ std::string percent_encoded(std::string_view path) {
   return out;
 }
 
-// What is wrong with a link_base, or null. It stands in a mail and before a path, so it is a plain
-// URL: no query, no fragment, nothing that a mail program would end it at.
-const char* base_problem(std::string_view base) {
-  const bool is_file = base.starts_with("file:///");
-  if (!is_file && !base.starts_with("http://") && !base.starts_with("https://")) {
-    return "doesn't begin with http://, https:// or file:///";
-  }
-  const auto is_bad = [](unsigned char c) {
-    return c <= ' ' || c >= 0x7F || std::strchr("\"'<>\\^`{|}?#", c) != nullptr;
-  };
-  if (std::any_of(base.begin(), base.end(), is_bad)) {
-    return "holds a blank, quote, query or other character that must be percent-encoded";
-  }
-  const std::string_view authority = base.substr(base.find("//") + 2);
-  return !is_file && (authority.empty() || authority.front() == '/') ? "names no host" : nullptr;
-}
-
 // The URL that stands for the report folder, without a slash at its end; empty when refused.
 std::string base_of(const VLIBCSzHash& hash, const std::string& report_dir) {
   const char* configured = hash.find("link_base");
   std::string base = configured == nullptr || *configured == '\0'
                          ? "file://" + percent_encoded(report_dir)
                          : configured;
-  if (const char* problem = base_problem(base); problem != nullptr) {
+  if (const char* problem = host::link_base_error(base); problem != nullptr) {
     host::log_line("link_base \"%.1100s\" %s; write link_base = https://server/reports in %s",
                    base.c_str(), problem, VORN_PATH_CONFIG);
     return {};
@@ -133,6 +118,21 @@ int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size
 }
 
 }  // namespace
+
+const char* host::link_base_error(std::string_view base) {
+  const bool is_file = base.starts_with("file:///");
+  if (!is_file && !base.starts_with("http://") && !base.starts_with("https://")) {
+    return "doesn't begin with http://, https:// or file:///";
+  }
+  const auto is_bad = [](unsigned char c) {
+    return c <= ' ' || c >= 0x7F || std::strchr("\"'<>\\^`{|}?#", c) != nullptr;
+  };
+  if (std::any_of(base.begin(), base.end(), is_bad)) {
+    return "holds a blank, quote, query or other character that must be percent-encoded";
+  }
+  const std::string_view authority = base.substr(base.find("//") + 2);
+  return !is_file && (authority.empty() || authority.front() == '/') ? "names no host" : nullptr;
+}
 
 int VornGetTargetLink(const VLIBCSzHash* hash, const char* target_file, char* link,
                       size_t size) try {

@@ -86,20 +86,9 @@ bool is_loopback_host(const std::string& host) {
          (host.starts_with("127.") && host.find_first_not_of("0123456789.") == std::string::npos);
 }
 
-// Only what names a server: a user, a path or options in the URL would change what libcurl does.
 bool parse_server(const char* profile, const std::string& text, Server& server) {
-  const UrlPtr url(curl_url());
-  const bool parsed =
-      url != nullptr && curl_url_set(url.get(), CURLUPART_URL, text.c_str(), 0) == CURLUE_OK;
-  const std::string scheme = parsed ? url_part(url.get(), CURLUPART_SCHEME) : "";
-  const std::string host = parsed ? url_part(url.get(), CURLUPART_HOST) : "";
-  const std::string path = parsed ? url_part(url.get(), CURLUPART_PATH) : "";
-  bool has_more = path != "/" && !path.empty();
-  for (const CURLUPart part : {CURLUPART_USER, CURLUPART_PASSWORD, CURLUPART_OPTIONS,
-                               CURLUPART_QUERY, CURLUPART_FRAGMENT}) {
-    has_more = has_more || (parsed && !url_part(url.get(), part).empty());
-  }
-  if ((scheme != "smtp" && scheme != "smtps") || host.empty() || has_more) {
+  const std::string host = mail_host(text);
+  if (host.empty()) {
     log_line(
         "profile \"%s\": smtp_url \"%s\" is not smtp://host:port or smtps://host:port; "
         "correct it in %s (a user goes into smtp_user)",
@@ -109,25 +98,6 @@ bool parse_server(const char* profile, const std::string& text, Server& server) 
   server.url = text;
   server.is_loopback = is_loopback_host(host);
   return true;
-}
-
-// What keeps the password file from being used, or null with `password` filled.
-const char* password_problem(const std::string& path, std::string& password) {
-  struct stat status {};
-  if (!path.starts_with('/')) {
-    return "is not absolute; write smtp_password_file = /...";
-  }
-  if (stat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode)) {
-    return "is no readable file; make one with the password as its first line";
-  }
-  if ((status.st_mode & S_IRWXO) != 0) {
-    return "is open to every user; run chmod 600 on it";
-  }
-  constexpr std::size_t kLargestFile = 65536;
-  const std::optional<std::string> content = read_file(path, kLargestFile);
-  password = content.value_or("");
-  password.resize(std::min(password.find_first_of("\r\n"), password.size()));
-  return password.empty() ? "holds no password in its first line" : nullptr;
 }
 
 bool read_credentials(const char* profile, const VLIBCSzHash& hash, Server& server) {
@@ -337,6 +307,41 @@ std::string new_message_id(std::time_t now, const std::string& host) {
 }
 
 }  // namespace
+
+// Only what names a server: a user, a path or options in the URL would change what libcurl does.
+std::string mail_host(const std::string& smtp_url) {
+  const UrlPtr url(curl_url());
+  if (url == nullptr || curl_url_set(url.get(), CURLUPART_URL, smtp_url.c_str(), 0) != CURLUE_OK) {
+    return {};
+  }
+  const std::string scheme = url_part(url.get(), CURLUPART_SCHEME);
+  const std::string path = url_part(url.get(), CURLUPART_PATH);
+  bool has_more = path != "/" && !path.empty();
+  for (const CURLUPart part : {CURLUPART_USER, CURLUPART_PASSWORD, CURLUPART_OPTIONS,
+                               CURLUPART_QUERY, CURLUPART_FRAGMENT}) {
+    has_more = has_more || !url_part(url.get(), part).empty();
+  }
+  const bool is_mail = scheme == "smtp" || scheme == "smtps";
+  return is_mail && !has_more ? url_part(url.get(), CURLUPART_HOST) : "";
+}
+
+const char* password_problem(const std::string& path, std::string& password) {
+  struct stat status {};
+  if (!path.starts_with('/')) {
+    return "is not absolute; write smtp_password_file = /...";
+  }
+  if (stat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode)) {
+    return "is no readable file; make one with the password as its first line";
+  }
+  if ((status.st_mode & S_IRWXO) != 0) {
+    return "is open to every user; run chmod 600 on it";
+  }
+  constexpr std::size_t kLargestFile = 65536;
+  const std::optional<std::string> content = read_file(path, kLargestFile);
+  password = content.value_or("");
+  password.resize(std::min(password.find_first_of("\r\n"), password.size()));
+  return password.empty() ? "holds no password in its first line" : nullptr;
+}
 
 int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
                 const MailLimits& limits) {

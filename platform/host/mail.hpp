@@ -37,6 +37,13 @@ struct MailText {
 // most 254 bytes.
 bool valid_address(std::string_view address);
 
+// The host of an URL smtp://host:port or smtps://host:port; empty for any other text.
+std::string mail_host(const std::string& smtp_url);
+
+// What keeps the password file `path` from being used ("is open to every user; ..."), or null with
+// `password` filled.
+const char* password_problem(const std::string& path, std::string& password);
+
 // The message: header and a plain text body, lines ended by CR LF, nothing but ASCII.
 std::string mail_message(const MailText& text);
 

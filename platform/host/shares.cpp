@@ -51,31 +51,11 @@ bool is_number(std::string_view text) {
   return text.empty();
 }
 
-const char* path_error(std::string_view path) {
-  if (path.empty()) {
-    return "it has no path; write path = /...";
-  }
-  if (path.front() != '/') {
-    return "its path is not absolute; write path = /...";
-  }
-  if (path.size() > kLongestPath) {
-    return "its path is longer than 2048 bytes; give a shorter one, a bind mount for example";
-  }
-  if (path.find('\'') != std::string_view::npos) {
-    return "its path holds a single quote; rename the folder or bind-mount it elsewhere";
-  }
-  if (std::any_of(path.begin(), path.end(),
-                  [](unsigned char c) { return c < 0x20 || c == 0x7F; })) {
-    return "its path holds a control character; rename the folder or bind-mount it elsewhere";
-  }
-  return nullptr;
-}
-
 Share make_share(const std::string& name, const VLIBCSzHash& section) {
   Share share{name, {}, {}, {}};
   const char* path = section.find("path");
   std::string_view folder = path == nullptr ? "" : path;
-  if (const char* error = path_error(folder); error != nullptr) {
+  if (const char* error = share_path_error(folder); error != nullptr) {
     share.path_error = error;
   } else {
     while (folder.size() > 1 && folder.back() == '/') {
@@ -132,6 +112,26 @@ const char* share_name_error(std::string_view name) {
       return "it holds a quote, backslash, < > / or comma";
     }
     rest.remove_prefix(found.length);
+  }
+  return nullptr;
+}
+
+const char* share_path_error(std::string_view path) {
+  if (path.empty()) {
+    return "it has no path; write path = /...";
+  }
+  if (path.front() != '/') {
+    return "its path is not absolute; write path = /...";
+  }
+  if (path.size() > kLongestPath) {
+    return "its path is longer than 2048 bytes; give a shorter one, a bind mount for example";
+  }
+  if (path.find('\'') != std::string_view::npos) {
+    return "its path holds a single quote; rename the folder or bind-mount it elsewhere";
+  }
+  if (std::any_of(path.begin(), path.end(),
+                  [](unsigned char c) { return c < 0x20 || c == 0x7F; })) {
+    return "its path holds a control character; rename the folder or bind-mount it elsewhere";
   }
   return nullptr;
 }

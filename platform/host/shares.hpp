@@ -19,6 +19,9 @@ struct Share {
 // Why `name` can't be the name of a share ("it holds a comma"), or null.
 const char* share_name_error(std::string_view name);
 
+// Why `path` can't be the folder of a share, and what to do, or null.
+const char* share_path_error(std::string_view path);
+
 // The shares of `file` in its order. One log line for each that is left out (a bad name, a
 // malformed section). Nothing when the file can't be read (logged).
 std::optional<std::vector<Share>> load_shares(const char* file);
