@@ -1,4 +1,6 @@
 // The language of the page.
+#include "language.hpp"
+
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
@@ -8,14 +10,15 @@
 #include "vorn/paths.h"
 #include "vorn/report.h"
 
-namespace {
+namespace host {
 
-// The code becomes a word of a shell command.
-constexpr bool is_code_char(char c) {
-  return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '-';
+bool is_language_code(std::string_view code) {
+  return !code.empty() && code.front() != '-' && std::all_of(code.begin(), code.end(), [](char c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '-';
+  });
 }
 
-}  // namespace
+}  // namespace host
 
 int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size) {
   constexpr std::string_view kDefault = "en";
@@ -25,9 +28,7 @@ int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size) {
   }
   const char* value = VLIBCSzHashGetValue(hash, "language");
   std::string_view language = value == nullptr || *value == '\0' ? kDefault : value;
-  const bool begins_well = language.front() != '-';  // or it would read as an option
-  if (!begins_well || language.size() >= size ||
-      !std::all_of(language.begin(), language.end(), is_code_char)) {
+  if (!host::is_language_code(language) || language.size() >= size) {
     host::log_line(
         "language \"%.80s\" is no code of at most %zu letters, digits and '-', so the page is in "
         "English; write language = en, for example, in %s",
