@@ -1,33 +1,233 @@
 // vornctl share: the shares that reports cover.
+#include <sys/stat.h>
+
+#include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "checks.hpp"
 #include "config.hpp"
 #include "ctl.hpp"
+#include "samba.hpp"
+#include "vorn/paths.h"
+#include "vorn/share.h"
+#include "words.hpp"
 
 namespace ctl {
 namespace {
 
-void list_shares(bool json) {
-  const std::vector<host::Share> shares = read_shares();
-  nlohmann::ordered_json list = nlohmann::ordered_json::array();
-  Table table({{"SHARE"}, {"FOLDER"}, {"FILE INDEX"}});
-  for (const host::Share& share : shares) {
-    list.push_back({{"name", share.name}, {"path", share.path}, {"file_index", share.file_index}});
-    table.add({share.name, share.path, share.file_index});
-  }
-  json ? print_json(list) : table.print();
+// --- add ----------------------------------------------------------------------------------------
+
+struct NewShare {
+  std::string name;
+  std::string path;
+  std::string file_index;
+  bool network = false;
+};
+
+std::string titled(const std::string& name) {
+  return "share \"" + name + "\"";
 }
 
+void check_file_index(const NewShare& share) {
+  struct stat status {};
+  std::string problem = text_problem(share.file_index);
+  if (problem.empty() && !share.file_index.starts_with('/')) {
+    problem = "is not absolute";
+  }
+  if (problem.empty() &&
+      (stat(share.file_index.c_str(), &status) != 0 || !S_ISREG(status.st_mode))) {
+    problem = "is no file";
+  }
+  if (!problem.empty()) {
+    throw Failure(titled(share.name) + ": --file-index " + share.file_index + " " + problem +
+                  "; give the path of the share's database");
+  }
+}
+
+bool is_remote(const std::string& path) {
+  const bool remote = VORNGetFSType(path.c_str(), 0) == VORN_FS_REMOTE;
+  take_host_messages();  // a file system of unknown kind isn't worth a word here
+  return remote;
+}
+
+void add_share(NewShare share) {
+  while (share.path.size() > 1 && share.path.ends_with('/')) {
+    share.path.pop_back();
+  }
+  for (const std::string& problem :
+       {share_name_problem(share.name), share_path_problem(share.path)}) {
+    if (!problem.empty()) {
+      throw Failure(titled(share.name) + ": " + problem);
+    }
+  }
+  if (!share.file_index.empty()) {
+    check_file_index(share);
+  }
+  for (const host::Share& other : read_shares()) {
+    if (other.path == share.path && other.name != share.name) {
+      warn(titled(other.name) + " covers " + share.path + " as well; its files will count twice");
+    }
+  }
+  if (!share.network && is_remote(share.path)) {
+    warn(share.path + " is on another server, so reports leave it out without --network");
+  }
+  Changes entries{{"path", share.path}};
+  if (!share.file_index.empty()) {
+    entries.emplace_back("file_index", share.file_index);
+  }
+  if (share.network) {
+    entries.emplace_back("network", "yes");
+  }
+  add_section(VORN_PATH_SHARES, share.name, entries);
+}
+
+void describe_add(CLI::App& group) {
+  CLI::App& add = *group.add_subcommand("add", "Let reports cover a folder");
+  const auto share = std::make_shared<NewShare>();
+  add.add_option("NAME", share->name, "Name of the share in reports")->type_name("")->required();
+  add.add_option("FOLDER", share->path, "Its absolute path")->type_name("")->required();
+  add.add_option("--file-index", share->file_index, "Database that lists the files, not to walk")
+      ->type_name("FILE");
+  add.add_flag("--network", share->network, "Walk the folder though it is on another server");
+  add.callback([share] { add_share(std::move(*share)); });
+}
+
+// --- list ---------------------------------------------------------------------------------------
+
+std::string state_of(const host::Share& share) {
+  if (!share.path_error.empty()) {
+    return share.path_error;
+  }
+  const std::string problem = share_path_problem(share.path);
+  return problem.empty() ? "fine" : problem;
+}
+
+void list_shares(bool json) {
+  nlohmann::ordered_json list = nlohmann::ordered_json::array();
+  Table table({{"SHARE"}, {"FOLDER"}, {"FILE INDEX"}, {"STATE"}});
+  for (const host::Share& share : read_shares()) {
+    const std::string state = state_of(share);
+    list.push_back({{"name", share.name},
+                    {"path", share.path},
+                    {"file_index", share.file_index},
+                    {"state", state}});
+    table.add({share.name, share.path, share.file_index.empty() ? "-" : share.file_index, state});
+  }
+  if (json) {
+    print_json(list);
+  } else if (table.empty()) {
+    warn("there are no shares; add one with vornctl share add NAME FOLDER");
+  } else {
+    table.print();
+  }
+}
+
+void describe_list(CLI::App& group) {
+  CLI::App& list = *group.add_subcommand("list", "Print every share");
+  const auto json = std::make_shared<bool>();
+  add_json_flag(list, *json);
+  list.callback([json] { list_shares(*json); });
+}
+
+// --- remove -------------------------------------------------------------------------------------
+
+// The names of the profiles that select the share, with commas between them.
+std::string profiles_with(const std::string& share) {
+  std::string names;
+  for (const Section& profile : read_profiles()) {
+    const std::string list = profile.value("share_list");
+    const auto words = host::comma_words(list);
+    if (std::find(words.begin(), words.end(), share) != words.end()) {
+      names += (names.empty() ? "" : ", ") + profile.name;
+    }
+  }
+  return names;
+}
+
+void remove_share(const std::string& name, bool force) {
+  const std::string profiles = profiles_with(name);
+  if (!profiles.empty() && !force) {
+    throw Failure(titled(name) + " is named by the share_list of " + profiles +
+                  "; change it with vornctl profile set, or give --force");
+  }
+  remove_section(VORN_PATH_SHARES, name);
+  if (!profiles.empty()) {
+    warn("the share_list of " + profiles + " still names the share; reports leave it out");
+  }
+}
+
+void describe_remove(CLI::App& group) {
+  CLI::App& remove = *group.add_subcommand("remove", "Let reports cover a share no longer");
+  const auto name = std::make_shared<std::string>();
+  const auto force = std::make_shared<bool>();
+  remove.add_option("SHARE", *name, "Name of the share")->type_name("")->required();
+  remove.add_flag("--force", *force, "Also when a profile names the share");
+  remove.callback([name, force] { remove_share(*name, *force); });
+}
+
+// --- import-samba -------------------------------------------------------------------------------
+
+// Samba's names don't depend on case.
+std::string folded(std::string name) {
+  std::transform(name.begin(), name.end(), name.begin(),
+                 [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c | 0x20) : c; });
+  return name;
+}
+
+std::string import_problem(const SambaShare& share, const std::vector<std::string>& known) {
+  if (!share.skipped.empty()) {
+    return share.skipped;
+  }
+  if (std::find(known.begin(), known.end(), folded(share.name)) != known.end()) {
+    return "there is a share of this name already";
+  }
+  const std::string problem = share_name_problem(share.name);
+  return problem.empty() ? share_path_problem(share.path) : problem;
+}
+
+void import_samba(bool dry_run, UserShares user_shares) {
+  std::vector<std::string> known;
+  for (const host::Share& share : read_shares()) {
+    known.push_back(folded(share.name));
+  }
+  for (const SambaShare& share : samba_shares(user_shares)) {
+    const std::string problem = import_problem(share, known);
+    if (!problem.empty()) {
+      print_line("skipped " + share.name + ": " + problem);
+      continue;
+    }
+    if (!dry_run) {
+      add_section(VORN_PATH_SHARES, share.name, {{"path", share.path}});
+    }
+    known.push_back(folded(share.name));
+    print_line((dry_run ? "would import " : "imported ") + share.name + ": " + share.path +
+               (is_remote(share.path) ? " (on another server: left out of reports until its "
+                                        "section has network = yes)"
+                                      : ""));
+  }
+}
+
+void describe_import(CLI::App& group) {
+  CLI::App& import = *group.add_subcommand("import-samba", "Add the shares that Samba offers");
+  const auto dry_run = std::make_shared<bool>();
+  const auto no_users = std::make_shared<bool>();
+  import.add_flag("--dry-run", *dry_run, "Only print what would be done");
+  import.add_flag("--no-usershares", *no_users, "Leave out the shares that users have made");
+  import.callback([dry_run, no_users] {
+    import_samba(*dry_run, *no_users ? UserShares::left_out : UserShares::included);
+});
 }  // namespace
+
+}  // namespace ctl
 
 void add_share_commands(CLI::App& app) {
   CLI::App& group = *app.add_subcommand("share", "The shares that reports cover");
   group.require_subcommand(1);
-  const auto json = std::make_shared<bool>();
-  CLI::App& list = *group.add_subcommand("list", "Print every share");
-  add_json_flag(list, *json);
-  list.callback([json] { list_shares(*json); });
+  describe_add(group);
+  describe_list(group);
+  describe_remove(group);
+  describe_import(group);
 }
 
 }  // namespace ctl

@@ -1,7 +1,7 @@
 #!/bin/sh
 # Builds the frame of the report page around the data blocks that the reports append.
 #
-# The page stands alone: style, dictionary and script are put into it. A page is complete when it
+# The page stands alone: style, dictionaries and script are put into it. A page is complete when it
 # begins with <!DOCTYPE html> and ends with </html>. So that a page that lost a part in between, on a
 # disk that was full for a moment, never is: a sub-command that can't write its part of the page
 # empties the page, and `tail` ends only a body file whose parts are all there.
@@ -13,7 +13,7 @@ usage() {
   echo "build-template.sh: $1" >&2
   cat >&2 <<'USAGE'
 usage: build-template.sh header FILE          starts the page in FILE
-       build-template.sh lang FILE CODE       adds the dictionary of language CODE
+       build-template.sh lang FILE CODE       chooses the language CODE (en, de, ...)
        build-template.sh header FILE REPORT   ends the head, after the data blocks
        build-template.sh body FILE            starts the body in FILE
        build-template.sh body FILE REPORT     adds the section of REPORT
@@ -43,45 +43,52 @@ require_part() { # FILE LAST-LINE...
   last=$(tail -n 1 -- "$part")
   shift
   for line; do
-    [ "$last" != "$line" ] || return 0
+    case $last in
+      "$line"*) return 0 ;;
+    esac
   done
   fail "$part is incomplete; its last line is not $1"
 }
 
+# The text of a Content-Security-Policy that lets just this script and this style work.
+fingerprint() { # FILE
+  hex=$(sha256sum <"$1")
+  # printf understands octal numbers everywhere.
+  octal=$(printf '%s' "${hex%% *}" | awk '{
+    digits = "0123456789abcdef"
+    for (i = 1; i < length($0); i += 2)
+      printf "\\%03o", index(digits, substr($0, i, 1)) * 16 - 17 + index(digits, substr($0, i + 1, 1))
+  }')
+  # shellcheck disable=SC2059  # the escapes are the point
+  printf "'sha256-%s'" "$(printf "$octal" | base64)"
+}
+
+# The data blocks follow in a template element, whose content a browser neither runs nor shows: the
+# page reads them as text. So no file's name can become a script, whatever it holds.
 start_page() {
-  cat <<'HTML'
+  script=$(fingerprint "$here/report.js")
+  style=$(fingerprint "$here/report.css")
+  cat <<HTML
 <!DOCTYPE html>
 <html lang="en">
 <head>
 <meta charset="utf-8">
 <meta name="viewport" content="width=device-width, initial-scale=1">
-<meta http-equiv="Content-Security-Policy" content="default-src 'none'; style-src 'unsafe-inline'; script-src 'unsafe-inline'; base-uri 'none'; form-action 'none'">
+<meta http-equiv="Content-Security-Policy" content="default-src 'none'; script-src $script; style-src $style; base-uri 'none'; form-action 'none'">
+<meta name="referrer" content="no-referrer">
 <title>Storage report</title>
-<style>
 HTML
+  printf '<style>'
   cat "$here/report.css"
-  echo '</style>'
-}
-
-# The most exact dictionary there is: de-AT, else de, else English.
-dictionary() { # CODE
-  for name in "$1" "${1%%-*}" en; do
-    if [ -f "$here/lang/$name.js" ]; then
-      cat "$here/lang/$name.js"
-      return
-    fi
-  done
-  fail "the dictionary $here/lang/en.js is missing"
+  printf '</style>\n<template id="data">\n'
 }
 
 language() { # CODE
-  printf '<script>\nvar vornLang = '\''%s'\'';\n' "$1"
-  dictionary "$1"
-  printf 'document.documentElement.lang = vornText.lang;\n</script>\n'
+  printf '<script>\nvar vornLang = '\''%s'\'';\n</script>\n' "$1"
 }
 
-# A report without rows leaves an end tag that no start tag precedes (file types: after a brace). The
-# parser drops it, so the page is told their number: it tells "no rows" from "no data".
+# A report without rows leaves an end tag that no start tag precedes. The parser drops it, so the
+# page is told their number: it tells "no rows" from "no data".
 count_empty_blocks() { # FILE
   awk '/^<script/ { open = 1 }
        /<\/script>$/ { if (!open) empty++; open = 0 }
@@ -92,41 +99,60 @@ end_head() { # FILE
   empty=$(count_empty_blocks "$1")
   # A report that failed half-way leaves its block open, and the rest of the page inside it.
   case $(tail -n 1 -- "$1") in
-    *'</script>' | '</style>') ;;
+    *'</script>' | '<template id="data">') ;;
     *) printf '\n</script>\n' ;;
   esac
-  # A run that found its language setting bad adds none; the page speaks English then.
-  if ! grep -q '^var vornLang = ' <"$1"; then
-    language en
-  fi
-  printf '<meta name="vorn-empty-reports" content="%s">\n</head>\n<body>\n' "$empty"
+  printf '</template>\n</head>\n<body data-empty="%s">\n' "$empty"
+}
+
+time_zone() {
+  zone=$(readlink /etc/localtime || true)
+  case $zone in
+    */zoneinfo/*) zone=${zone##*/zoneinfo/} ;;
+    *) zone=$(head -n 1 /etc/timezone 2>/dev/null || true) ;;
+  esac
+  case $zone in
+    '' | *[!A-Za-z0-9/_+-]*) date '+%z' | sed 's/..$/:&/' ;;  # its distance from UTC, then
+    *) printf '%s' "$zone" ;;
+  esac
 }
 
 start_body() {
   host=$(uname -n | tr -cd 'A-Za-z0-9.-')
-  printf '<header>\n<h1 data-text="title">Storage report</h1>\n'
-  printf '<p><span id="host">%s</span> · <time>%s</time></p>\n' "$host" "$(date '+%Y-%m-%d %H:%M')"
-  printf '</header>\n<main>\n'
+  profile=$(printf '%s' "${VORN_PROFILE-}" | tr -cd 'A-Za-z0-9._-')
+  now=$(date '+%s')
+  printf '<a class="skip" href="#report">Skip to the report</a>\n<header>\n'
+  printf '<h1>Storage report %s</h1>\n<p>%s %s</p>\n' "$host" "$profile" \
+    "$(date -d "@$now" '+%Y-%m-%d %H:%M %Z')"
+  printf '<noscript><p>This page needs JavaScript to show the reports. '
+  printf 'Their rows stand in the CSV files that are linked below.</p></noscript>\n</header>\n'
+  printf '<main id="report" data-host="%s" data-profile="%s" data-time="%s" data-zone="%s">\n' \
+    "$host" "$profile" "$now" "$(time_zone)"
 }
 
 section() { # REPORT
   printf '<section data-report="%s">\n<h2>%s</h2>\n' "$1" "$(printf '%s' "$1" | tr _ ' ')"
   case $1 in
-    quota_usage | file_group) # whose rows are in no CSV file
-      echo '<table></table>'
-      echo '<noscript><p>This table needs JavaScript.</p></noscript>'
-      ;;
-    *)
-      printf '<p class="csv"><a href="csv/%s.csv" data-text="csv">CSV file</a></p>\n' "$1"
-      echo '<table></table>'
-      printf '<noscript><p>This table needs JavaScript. Its rows stand in csv/%s.csv.</p></noscript>\n' "$1"
-      ;;
+    quota_usage | file_group) ;;  # whose rows are in no CSV file
+    *) printf '<p><a href="csv/%s.csv">CSV file</a></p>\n' "$1" ;;
   esac
   echo '</section>'
 }
 
+# All dictionaries, so that a reader can switch. No text of theirs can end the element.
+dictionaries() {
+  for file in "$here"/lang/*.json; do
+    code=${file##*/}
+    printf '<script type="application/json" data-language="%s">' "${code%.json}"
+    sed 's/</\\u003c/g' "$file"
+    printf '</script>\n'
+  done
+}
+
 finish_page() {
-  printf '</main>\n<script>\n'
+  printf '</main>\n'
+  dictionaries
+  printf '<script>'
   cat "$here/report.js"
   printf '</script>\n</body>\n</html>\n'
 }
@@ -153,7 +179,8 @@ case $command$# in
   lang3)
     text=$(language "$word")
     [ -f "$file" ] || fail "$file is missing; start it with: header $file"
-    [ "$(tail -n 1 -- "$file")" = '</style>' ] || spoil "$file" "its beginning is not whole"
+    [ "$(tail -n 1 -- "$file")" = '<template id="data">' ] ||
+      spoil "$file" "its beginning is not whole"
     add_to_page "$file" "$text"
     ;;
   header3)
@@ -165,11 +192,11 @@ case $command$# in
     start_body >"$file"
     ;;
   body3)
-    require_part "$file" '</section>' '<main>'
+    require_part "$file" '</section>' '<main'
     section "$word" >>"$file"
     ;;
   tail2)
-    require_part "$file" '</section>' '<main>'
+    require_part "$file" '</section>' '<main'
     finish_page >>"$file"
     ;;
 esac

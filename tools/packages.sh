@@ -13,6 +13,11 @@ test_packages=(
   libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota samba-common-bin
 )
 
+# npm bundles the page. Where it came with another Node.js, Debian's stays away: they conflict.
+if ! command -v npm >/dev/null; then
+  build_packages+=(npm)
+fi
+
 as_root() {
   if [[ $EUID -eq 0 ]]; then
     "$@"

@@ -24,7 +24,7 @@ int fail(int code, int line) {
 }
 
 const char* remedy(int error) {
-  return error == EACCES || error == EPERM ? ", do this as root" : "";
+  return error == EACCES || error == EPERM ? "; do this as root" : "";
 }
 
 // Taken beside the file, because the file itself is replaced; never removed, because a writer that
@@ -35,8 +35,8 @@ Fd lock_beside(const std::string& file, std::chrono::milliseconds wait) {
   const std::string path = file.substr(0, slash) + "." + file.substr(slash) + ".lock";
   Fd lock(open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
   if (!lock) {
-    log_line("lock file %s can't be opened (%s); %s is unchanged%s", path.c_str(),
-             std::strerror(errno), file.c_str(), remedy(errno));
+    log_line("%s can't be changed: lock file %s can't be opened (%s)%s", file.c_str(), path.c_str(),
+             std::strerror(errno), remedy(errno));
     fail(VLIBC_ERR_FILE_IO, __LINE__);
     return lock;
   }
@@ -79,7 +79,7 @@ bool replace(const std::string& file, std::string_view text) {
       fchown(target.fd(), before.st_uid, before.st_gid) != 0 ||
       fchmod(target.fd(), before.st_mode & 07777U) != 0 || !write_all(target.fd(), text) ||
       !reads_back(target.fd(), text) || !target.commit()) {
-    log_line("%s can't be replaced (%s); it is unchanged%s", file.c_str(), std::strerror(errno),
+    log_line("%s is unchanged: it can't be replaced (%s)%s", file.c_str(), std::strerror(errno),
              remedy(errno));
     return false;
   }

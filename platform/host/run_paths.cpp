@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <ctime>
 #include <exception>
@@ -301,7 +302,11 @@ int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report)
     return -1;
   }
   try {
-    return host::init_paths(profile, **hash, for_report != 0);
+    const int result = host::init_paths(profile, **hash, for_report != 0);
+    if (result == 0 && for_report != 0) {
+      setenv("VORN_PROFILE", profile, 1);  // for the page's template script
+    }
+    return result;
   } catch (const std::exception&) {
     return -1;
   }

@@ -1,0 +1,344 @@
+#include "checks.hpp"
+
+#include <pwd.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <filesystem>
+#include <numeric>
+#include <set>
+
+#include "config.hpp"
+#include "ctl.hpp"
+#include "link.hpp"
+#include "mail.hpp"
+#include "old_reports.hpp"
+#include "run_paths.hpp"
+#include "text_containers.hpp"
+#include "utf8.hpp"
+#include "vorn/paths.h"
+#include "vornreport/registry.hpp"
+#include "words.hpp"
+
+namespace ctl {
+namespace {
+
+std::string in_quotes(std::string_view text) {
+  return '"' + std::string(text) + '"';
+}
+
+std::string joined(const std::vector<std::string>& texts, const char* separator) {
+  std::string all;
+  for (const std::string& text : texts) {
+    all += (all.empty() ? "" : separator) + text;
+  }
+  return all;
+}
+
+// The platform's own verdict on `value`: the message of `judge`, which gets a profile that holds
+// it.
+template <typename Judge>
+std::string platform_problem(const char* key, const std::string& value, Judge judge) {
+  VLIBCSzHash hash(1);
+  hash.set(key, value);
+  std::vector<std::string> earlier = take_host_messages();
+  judge(hash);
+  const std::vector<std::string> messages = take_host_messages();
+  for (const std::string& message : earlier) {
+    warn(message);
+  }
+  return joined(messages, "; ");
+}
+
+std::string report_list_problem(const std::string& value) {
+  const std::vector<std::string> names = report_names();
+  for (const std::string_view word : host::comma_words(value)) {
+    if (std::find(names.begin(), names.end(), word) == names.end()) {
+      const std::string near = suggestion(word, names);
+      return in_quotes(word) + " is no report" +
+             (near.empty() ? "; there are " + joined(names, ", ") : near);
+    }
+  }
+  return host::comma_words(value).empty() ? "names no report" : "";
+}
+
+std::string share_list_problem(const std::string& value) {
+  std::vector<std::string> names;
+  for (const host::Share& share : read_shares()) {
+    names.push_back(share.name);
+  }
+  for (const std::string_view word : host::comma_words(value)) {
+    if (std::find(names.begin(), names.end(), word) == names.end()) {
+      return in_quotes(word) + " is no share" + suggestion(word, names) +
+             "; add it with vornctl share add";
+    }
+  }
+  return "";
+}
+
+std::string users_problem(const std::string& value) {
+  for (const std::string_view word : host::comma_words(value)) {
+    // An account of a domain may be out of reach just now.
+    if (word.find('/') == std::string_view::npos &&
+        getpwnam(std::string(word).c_str()) == nullptr) {
+      return in_quotes(word) + " is no user of this machine; correct the name";
+    }
+  }
+  return "";
+}
+
+std::string truth_problem(const std::string& value) {
+  return value == "true" || value == "false" ? "" : "is neither true nor false";
+}
+
+std::string report_dir_problem(const std::string& value) {
+  const std::string problem = platform_problem(
+      "report_dir", value, [](const VLIBCSzHash& hash) { host::report_dir("(new)", hash); });
+  if (!problem.empty()) {
+    return problem;
+  }
+  // The run makes what is missing.
+  std::filesystem::path folder(value);
+  struct stat status {};
+  while (lstat(folder.c_str(), &status) != 0 && folder.has_relative_path()) {
+    folder = folder.parent_path();
+  }
+  if (stat(folder.c_str(), &status) == 0 && !S_ISDIR(status.st_mode)) {
+    return in_quotes(folder.string()) + " is no folder; name another";
+  }
+  if (access(folder.c_str(), W_OK | X_OK) != 0) {
+    return in_quotes(folder.string()) + " can't be written (" + std::strerror(errno) +
+           "); name a folder that can";
+  }
+  return "";
+}
+
+std::string language_problem(const std::string& value) {
+  constexpr std::size_t kLongestCode = 7;
+  const std::vector<std::string> languages = installed_languages();
+  const auto is_installed = [&](const std::string& code) {
+    return std::find(languages.begin(), languages.end(), code) != languages.end();
+  };
+  // A regional code falls back to its language.
+  const bool known = is_installed(value) || is_installed(value.substr(0, value.find('-')));
+  return known && value.size() <= kLongestCode
+             ? ""
+             : in_quotes(value) + " is not installed; there are " + joined(languages, ", ");
+}
+
+std::string link_base_problem(const std::string& value) {
+  const char* problem = host::link_base_error(value);
+  return problem == nullptr ? "" : std::string(problem) + "; write https://server/reports";
+}
+
+std::string recipients_problem(const std::string& value) {
+  for (const std::string_view word : host::comma_words(value)) {
+    if (!host::valid_address(word)) {
+      return in_quotes(word) + " is no mail address; write name@domain";
+    }
+  }
+  return "";
+}
+
+std::string sender_problem(const std::string& value) {
+  return host::valid_address(value) ? ""
+                                    : in_quotes(value) + " is no mail address; write name@domain";
+}
+
+std::string smtp_url_problem(const std::string& value) {
+  return !host::mail_host(value).empty()
+             ? ""
+             : "is not smtp://host:port or smtps://host:port (a user goes into smtp_user)";
+}
+
+std::string password_file_problem(const std::string& value) {
+  std::string password;
+  const char* problem = host::password_problem(value, password);
+  return problem == nullptr ? "" : problem;
+}
+
+std::string no_problem(const std::string& /*value*/) {
+  return "";
+}
+
+std::string schedule_problem(const std::string& value) {
+  constexpr std::size_t kLongest = 64;
+  const bool fits = value.size() <= kLongest && std::all_of(value.begin(), value.end(), [](char c) {
+                      return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
+                             (c >= '0' && c <= '9') || c == '_' || c == '-';
+                    });
+  return fits ? "" : "is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -)";
+}
+
+std::string keep_problem(const std::string& value) {
+  return platform_problem(
+             "keep_reports", value,
+             [](const VLIBCSzHash& hash) {
+               host::reports_to_keep("", hash);
+             }).empty()
+             ? ""
+             : "is no number from 1 on";
+}
+
+constexpr ProfileKey kKeys[] = {
+    {"report_list", "--reports", "REPORTS", "Reports to make (default: all)", true,
+     report_list_problem},
+    {"share_list", "--shares", "SHARES", "Shares to cover (default: all)", true,
+     share_list_problem},
+    {"language", "--language", "LANGUAGE", "Language of page and mail", false, language_problem},
+    {"report_dir", "--report-dir", "FOLDER", "Folder for the reports", false, report_dir_problem},
+    {"link_base", "--link-base", "URL", "URL that stands for the folder in links", false,
+     link_base_problem},
+    {"mail_to", "--mail-to", "ADDRESSES", "Recipients of the mail", true, recipients_problem},
+    {"mail_from", "--mail-from", "ADDRESS", "Sender of the mail", false, sender_problem},
+    {"smtp_url", "--smtp-url", "URL", "Mail server, smtp://host:port or smtps://host:port", false,
+     smtp_url_problem},
+    {"smtp_user", "--smtp-user", "NAME", "User at the mail server", false, no_problem},
+    {"smtp_password_file", "--smtp-password-file", "FILE", "File with that user's password", false,
+     password_file_problem},
+    {"limit_user", "--limit-user", "USERS", "Users shown one by one in file_group", true,
+     users_problem},
+    {"duplicate_compare", nullptr, "", "true compares contents of duplicates", false,
+     truth_problem},
+    {"volume_history", nullptr, "", "true shows history and forecast of volumes", false,
+     truth_problem},
+    {"keep_reports", "--keep-reports", "N", "Number of reports to keep (default: all)", false,
+     keep_problem},
+    {"schedule_collect_id", nullptr, "", "Identifier of the schedule", false, schedule_problem},
+};
+
+// How many characters must be put in, left out, replaced or swapped.
+std::size_t distance(std::string_view a, std::string_view b) {
+  std::vector<std::size_t> above(b.size() + 1);
+  std::vector<std::size_t> row(b.size() + 1);
+  std::iota(row.begin(), row.end(), 0U);
+  std::vector<std::size_t> two_above;
+  for (std::size_t i = 1; i <= a.size(); ++i) {
+    two_above = std::exchange(above, row);
+    row[0] = i;
+    for (std::size_t j = 1; j <= b.size(); ++j) {
+      row[j] = std::min({above[j] + 1, row[j - 1] + 1,
+                         above[j - 1] + static_cast<std::size_t>(a[i - 1] != b[j - 1])});
+      if (i > 1 && j > 1 && a[i - 1] == b[j - 2] && a[i - 2] == b[j - 1]) {
+        row[j] = std::min(row[j], two_above[j - 2] + 1);
+      }
+    }
+  }
+  return row[b.size()];
+}
+
+}  // namespace
+
+std::string text_problem(std::string_view text) {
+  if (text != host::trimmed(text)) {
+    return "begins or ends with a blank, which the file would not keep";
+  }
+  for (std::string_view rest = text; !rest.empty();) {
+    const host::Utf8Char found = host::utf8_at(rest);
+    if (found.length == 0) {
+      return "is not UTF-8";
+    }
+    if (host::is_control(found.code)) {
+      return "holds a line break or another control character";
+    }
+    rest.remove_prefix(found.length);
+  }
+  return "";
+}
+
+std::string share_name_problem(std::string_view name) {
+  if (const char* error = host::share_name_error(name); error != nullptr) {
+    return error;
+  }
+  if (name.find_first_of("[]") != std::string_view::npos) {
+    return "it holds a bracket";
+  }
+  if (name.front() == '#' || name.front() == ';') {
+    return "it begins with a comment sign";
+  }
+  const std::string problem = text_problem(name);
+  return problem.empty() ? "" : "it " + problem;
+}
+
+std::string share_path_problem(const std::string& path) {
+  if (const char* error = host::share_path_error(path); error != nullptr) {
+    return error;
+  }
+  if (const std::string problem = text_problem(path); !problem.empty()) {
+    return "its path " + problem + "; rename the folder or bind-mount it elsewhere";
+  }
+  struct stat status {};
+  if (stat(path.c_str(), &status) != 0) {
+    return "its path can't be found (" + std::string(std::strerror(errno)) + ")";
+  }
+  return S_ISDIR(status.st_mode) ? "" : "its path is no folder";
+}
+
+std::span<const ProfileKey> profile_keys() {
+  return kKeys;
+}
+
+const ProfileKey& profile_key(const std::string& name) {
+  std::vector<std::string> names;
+  for (const ProfileKey& key : kKeys) {
+    if (key.name == name) {
+      return key;
+    }
+    names.emplace_back(key.name);
+  }
+  const std::string near = suggestion(name, names);
+  throw Failure(in_quotes(name) + " is no key of a profile" +
+                (near.empty() ? "; see vornreport.conf(5)" : near));
+}
+
+std::string checked_value(const ProfileKey& key, const std::string& value) {
+  std::string problem = text_problem(value);
+  if (problem.empty() && !value.empty()) {
+    problem = key.problem(value);
+  }
+  if (!problem.empty()) {
+    throw Failure(std::string(key.name) + ' ' + in_quotes(value) + ": " + problem);
+  }
+  if (!key.is_list) {
+    return value;
+  }
+  const std::vector<std::string_view> words = host::comma_words(value);
+  return joined({words.begin(), words.end()}, ",");
+}
+
+std::vector<std::string> report_names() {
+  std::vector<std::string> names;
+  for (const vornreport::ReportEntry& entry : vornreport::report_registry()) {
+    names.emplace_back(entry.name);
+  }
+  return names;
+}
+
+std::vector<std::string> installed_languages() {
+  std::set<std::string> codes;
+  std::error_code error;
+  for (const auto& entry : std::filesystem::directory_iterator(VORN_PATH_TEMPLATE "/lang", error)) {
+    const std::filesystem::path& path = entry.path();
+    if (path.extension() == ".json" || path.extension() == ".js") {
+      codes.insert(path.stem().string());
+    }
+  }
+  return {codes.begin(), codes.end()};
+}
+
+std::string suggestion(std::string_view name, const std::vector<std::string>& names) {
+  const std::string* nearest = nullptr;
+  std::size_t least = std::max<std::size_t>(name.size() / 3, 1) + 1;
+  for (const std::string& candidate : names) {
+    if (const std::size_t steps = distance(name, candidate); steps < least) {
+      least = steps;
+      nearest = &candidate;
+    }
+  }
+  return nearest == nullptr ? "" : "; did you mean \"" + *nearest + "\"?";
+}
+
+}  // namespace ctl

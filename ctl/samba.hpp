@@ -1,0 +1,24 @@
+// The shares that Samba offers.
+#ifndef VORN_CTL_SAMBA_HPP
+#define VORN_CTL_SAMBA_HPP
+
+#include <string>
+#include <vector>
+
+namespace ctl {
+
+struct SambaShare {
+  std::string name;
+  std::string path;
+  std::string skipped;  // why it is none to report on ("it is a printer"); empty when it is one
+};
+
+enum class UserShares { included, left_out };
+
+// The shares of smb.conf as testparm reads it, then those that users have made, in Samba's order
+// and without [global]. Throws a Failure when Samba's configuration can't be read.
+std::vector<SambaShare> samba_shares(UserShares user_shares);
+
+}  // namespace ctl
+
+#endif

@@ -1,0 +1,138 @@
+// Texts, numbers, sizes and times in the chosen language and the server's time zone.
+
+export const UNKNOWN = '–';
+const UNITS = ['B', 'KiB', 'MiB', 'GiB', 'TiB', 'PiB', 'EiB'];
+const MOST_DAYS = 730;  // beyond that, years
+
+const dictionaries = new Map();
+const formatters = new Map();  // making one takes longer than using it a hundred times
+let language = 'en';
+let zone = 'UTC';
+
+function dateFormat(options, code = language) {
+  const key = JSON.stringify([code, options]);
+  if (!formatters.has(key)) {
+    formatters.set(key, new Intl.DateTimeFormat(code, options));
+  }
+  return formatters.get(key);
+}
+
+// The dictionaries stand in the page as JSON; one that a slip of the pen broke is left out.
+export function loadDictionaries(root) {
+  for (const element of root.querySelectorAll('script[data-language]')) {
+    try {
+      dictionaries.set(element.dataset.language, JSON.parse(element.textContent));
+    } catch (error) {
+      console.warn(`dictionary ${element.dataset.language}: ${error.message}`);
+    }
+  }
+}
+
+export const languages = () => [...dictionaries].map(([code, {name}]) => [code, name ?? code]);
+export const currentLanguage = () => language;
+
+// Takes the nearest language there is: de-AT, else de, else English.
+export function chooseLanguage(code) {
+  const nearest = [code, code.split('-')[0]].find(known => dictionaries.has(known));
+  language = nearest ?? 'en';
+}
+
+export function chooseZone(name) {
+  try {
+    new Intl.DateTimeFormat('en', {timeZone: name});
+    zone = name;
+  } catch {
+    zone = 'UTC';
+  }
+}
+export const currentZone = () => zone;
+
+function find(group, key) {
+  return dictionaries.get(language)?.[group]?.[key] ?? dictionaries.get('en')?.[group]?.[key];
+}
+
+// The text `key` of the page with {placeholders} filled in.
+export function say(key, values = {}) {
+  return (find('page', key) ?? key).replace(/\{(\w+)\}/g, (all, name) => values[name] ?? all);
+}
+export const nameOf = (group, key) => find(group, key) ?? key.replaceAll('_', ' ');
+
+// Like say(), but as text and nodes, for values that are elements.
+export function sayNodes(key, values) {
+  return (find('page', key) ?? key).split(/\{(\w+)\}/).map(
+    (piece, index) => index % 2 ? values[piece] ?? piece : piece);
+}
+
+export const isNumber = text => /^[0-9]+$/.test(text);
+
+export function number(value, options) {
+  return Number.isFinite(Number(value)) ? Number(value).toLocaleString(language, options) : UNKNOWN;
+}
+
+export function size(value) {
+  let count = Number(value);
+  if (!Number.isFinite(count) || count < 0) {
+    return UNKNOWN;
+  }
+  let unit = 0;
+  while (count >= 1023.95 && unit < UNITS.length - 1) {
+    count /= 1024;
+    ++unit;
+  }
+  return `${number(count, {maximumFractionDigits: count < 10 ? 2 : count < 100 ? 1 : 0})}\u00a0${
+    UNITS[unit]}`;
+}
+
+export const exactSize = value => say('bytes', {n: BigInt(value).toLocaleString(language)});
+
+// `value` is a number of hundredths.
+export function percent(value) {
+  return Number.isFinite(value) && value >= 0 ?
+    (value / 100).toLocaleString(language, {style: 'percent', maximumFractionDigits: 1}) : UNKNOWN;
+}
+
+export function inDays(days) {
+  const relative = new Intl.RelativeTimeFormat(language, {numeric: 'always'});
+  return days < MOST_DAYS ? relative.format(days, 'day') :
+    relative.format(Math.round(days / 365.25), 'year');
+}
+
+// `seconds` since the epoch; a time of 0 or before stands for none.
+function toDate(seconds) {
+  const date = new Date(Number(seconds) * 1000);
+  return Number(seconds) > 0 && !Number.isNaN(date.getTime()) ? date : null;
+}
+
+export function time(seconds) {
+  const date = toDate(seconds);
+  return date ? dateFormat({dateStyle: 'medium', timeStyle: 'short', timeZone: zone}).format(date) :
+    UNKNOWN;
+}
+
+export function day(seconds) {
+  const date = toDate(seconds);
+  return date ? dateFormat({dateStyle: 'medium', timeZone: zone}).format(date) : UNKNOWN;
+}
+
+// The zone as people call it, such as "Central European Standard Time, Europe/Berlin".
+export function zoneName(seconds) {
+  const parts = dateFormat({timeZone: zone, timeZoneName: 'long'})
+    .formatToParts(toDate(seconds) ?? new Date());
+  const {value} = parts.find(part => part.type === 'timeZoneName');
+  return value === zone ? value : `${value}, ${zone.replaceAll('_', ' ')}`;
+}
+
+// Milliseconds that read as the server's wall clock when taken as UTC: for scales, whose ticks then
+// fall on the server's midnights.
+export function wallClock(seconds) {
+  const parts = Object.fromEntries(dateFormat({
+    timeZone: zone, hourCycle: 'h23', year: 'numeric', month: 'numeric', day: 'numeric',
+    hour: 'numeric', minute: 'numeric', second: 'numeric'
+  }, 'en-US').formatToParts(seconds * 1000).map(({type, value}) => [type, Number(value)]));
+  return Date.UTC(parts.year, parts.month - 1, parts.day, parts.hour, parts.minute, parts.second);
+}
+
+export const wallDay = (milliseconds, options) =>
+  dateFormat({...options, timeZone: 'UTC'}).format(milliseconds);
+
+export const compareTexts = () => new Intl.Collator(language, {numeric: true}).compare;

@@ -1,0 +1,131 @@
+// Builds the page from the data blocks that stand in it. See data.js for what those are.
+import {copyOriginals, h, shown} from './dom.js';
+import {piecesOf, readReport, readVariable} from './data.js';
+import * as format from './format.js';
+import {fillSection, REPORTS} from './sections.js';
+import {attention} from './summary.js';
+import {card, readVolumes} from './volumes.js';
+
+const THEMES = {system: 'themeSystem', light: 'themeLight', dark: 'themeDark'};
+const main = document.querySelector('main');
+const header = document.querySelector('header');
+const blocks = document.getElementById('data').content;
+const pieces = piecesOf(blocks);
+const written = new Map([...main.querySelectorAll('section[data-report]')].map(
+  section => [section.dataset.report, section]));
+
+function read() {
+  const data = new Map();
+  for (const [name, {variable, width, mode}] of Object.entries(REPORTS)) {
+    const report = written.has(name) && readReport(pieces, variable, width);
+    if (report) {
+      report.mode = mode && readVariable(pieces, mode);
+      report.heading = name + (report.mode ?? '');
+      data.set(name, report);
+    }
+  }
+  return data;
+}
+const data = read();
+const history = readReport(pieces, 'vornVolumeUsageDataHistory', 2);
+
+// Which of the reports without a block have just found nothing: the head knows their number.
+function emptyReports() {
+  const without = [...written.keys()].filter(
+    name => !data.has(name) && REPORTS[name] && !REPORTS[name].always).length;
+  const {empty} = document.body.dataset;
+  return Number(empty) >= without ? 'all' : Number(empty) === 0 ? 'none' : 'some';
+}
+
+// --- Header -------------------------------------------------------------------------------------
+
+function choice(label, options, chosen, change) {
+  const select = h('select', {}, ...options.map(([value, text]) => h(
+    'option', {value, selected: value === chosen}, text)));
+  select.addEventListener('change', () => change(select.value));
+  return h('label', {}, h('span', {}, label), select);
+}
+
+const remember = {
+  get: () => { try { return localStorage.getItem('vorn-theme'); } catch { return null; } },
+  set: theme => { try { localStorage.setItem('vorn-theme', theme); } catch { /* not kept then */ } }
+};
+
+function setTheme(theme) {
+  document.documentElement.dataset.theme = theme in THEMES ? theme : 'system';
+}
+
+function fillHeader() {
+  const {host, profile, time} = main.dataset;
+  const print = h('button', {type: 'button'}, format.say('print'));
+  print.addEventListener('click', () => window.print());
+  header.replaceChildren(
+    h('div', {},
+      h('h1', {}, format.say('title'), ' ', h('span', {class: 'host'}, host)),
+      h('p', {},
+        ...profile ? [format.say('profile'), ' ', h('b', {}, shown(profile)), ' · '] : [],
+        h('time', {datetime: new Date(time * 1000).toISOString()}, format.time(time)), ' ',
+        h('span', {class: 'zone'}, format.zoneName(time)))),
+    h('div', {class: 'controls'},
+      choice(format.say('language'), format.languages(), format.currentLanguage(), code => {
+        format.chooseLanguage(code);
+        render();
+        header.querySelector('select').focus();
+      }),
+      choice(format.say('theme'), Object.entries(THEMES).map(
+        ([theme, key]) => [theme, format.say(key)]), document.documentElement.dataset.theme,
+             theme => { setTheme(theme); remember.set(theme); }),
+      print));
+}
+
+// --- Body ---------------------------------------------------------------------------------------
+
+function firstLook(volumes) {
+  const part = (id, heading, content) => h(
+    'section', {id, 'aria-labelledby': `${id}-heading`},
+    h('h2', {id: `${id}-heading`}, heading), content);
+  return h('div', {class: 'first'},
+           volumes.length ? part('volumes', format.say('volumes'),
+                                 h('div', {class: 'cards'}, ...volumes.map(card))) : null,
+           part('attention', format.say('attention'), attention(data, volumes)));
+}
+
+function navigation(names) {
+  return h('nav', {'aria-label': format.say('sections')}, ...names.map(name => h(
+    'a', {href: `#${name}`}, name === 'volume_usage' ? format.say('history') :
+      format.nameOf('reports', name))));
+}
+
+function render() {
+  document.documentElement.lang = format.currentLanguage();
+  document.title = `${format.say('title')} – ${main.dataset.host}`;
+  document.querySelector('.skip').textContent = format.say('skip');
+  fillHeader();
+  const usage = data.get('volume_usage');
+  const volumes = readVolumes(usage ? [...usage.tables.values()].flat() : [], history?.tables);
+  if (usage) {
+    Object.assign(usage, {volumes, hasHistory: history !== undefined});
+  }
+  const names = [...Object.keys(REPORTS).filter(name => written.has(name)),
+                 ...[...written.keys()].filter(name => !REPORTS[name])];
+  const empty = emptyReports();
+  for (const name of names) {
+    const section = written.get(name);
+    section.id = name;
+    section.setAttribute('aria-labelledby', `${name}-heading`);
+    fillSection(section, name, data.get(name), empty);
+  }
+  main.replaceChildren(
+    navigation(names), firstLook(volumes), ...names.map(name => written.get(name)),
+    h('footer', {}, h('p', {}, format.say('units', {zone: format.currentZone()}))));
+}
+
+format.loadDictionaries(document);
+format.chooseLanguage(readVariable(pieces, 'vornLang') ?? 'en');
+format.chooseZone(main.dataset.zone);
+setTheme(remember.get() ?? 'system');
+document.addEventListener('copy', copyOriginals);
+render();
+if (location.hash) {
+  document.getElementById(decodeURIComponent(location.hash.slice(1)))?.scrollIntoView();
+}

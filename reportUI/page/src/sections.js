@@ -1,0 +1,183 @@
+// The reports of the page, in its order. To add one: name its variable and columns here, and its
+// heading and new column names in every dictionary.
+//
+//   width     values in a row of its block
+//   limit     rows (`limitOf`: numbers in that column) that the page gets at most, and the note
+//   always    without a block the report has failed: it has no way to have no rows
+//   mode      a variable whose value chooses the heading
+//   show      the section's content from what was read, a list of elements
+import {shareMap, typeBars} from './charts.js';
+import {h, shownPlain} from './dom.js';
+import * as format from './format.js';
+import {table} from './table.js';
+import {history} from './volumes.js';
+
+const FILES = [['file', 'path'], ['size', 'size'], ['changed', 'time'], ['share', 'text']];
+
+const rowsOf = ({tables}) => [...tables.values()].flat();
+const csvOf = name => `csv/${name}.csv`;
+const pick = (rows, ...order) => rows.map(row => order.map(index => row[index]));
+
+// A table for each of the named ones.
+function tablesOf(tables, columns, caption) {
+  return [...tables].filter(([, rows]) => rows.length).map(([name, rows]) => table(
+    columns, rows, {caption: caption(name)}));
+}
+
+// The groups of duplicates: {number, file, count, size, frees}, which names one of the files.
+export function groupsOf(rows) {
+  const groups = new Map();
+  for (const [number, , file, size] of rows) {
+    const group = groups.get(number) ?? {number, file, size, count: 0, frees: 0n};
+    if (group.count++ > 0 && format.isNumber(size)) {
+      group.frees += BigInt(size);
+    }
+    groups.set(number, group);
+  }
+  return [...groups.values()];
+}
+
+function showDuplicates(data) {
+  const rows = rowsOf(data);
+  const groups = groupsOf(rows).sort((one, two) => two.frees > one.frees ? 1 :
+    two.frees < one.frees ? -1 : 0);
+  return [
+    table([['group', 'count'], ['file', 'name'], ['copies', 'count'], ['size', 'size'],
+           ['frees', 'size']],
+          groups.map(group => [group.number, group.file.slice(group.file.lastIndexOf('/') + 1),
+                               String(group.count), group.size, String(group.frees)]),
+          {caption: format.say('reclaim'), sorted: 4}),
+    table([['group', 'count'], ...FILES], pick(rows, 0, 2, 3, 4, 1),
+          {caption: data.heading, csv: csvOf('duplicate_file')})];
+}
+
+export const REPORTS = {
+  volume_usage: {
+    variable: 'vornVolumeUsageData',
+    width: 5,
+    always: true,
+    show: ({volumes, hasHistory}) => [
+      ...history(volumes, hasHistory),
+      table([['volume', 'name'], ['percent', 'percent'], ['used', 'size'], ['free', 'size'],
+             ['days', 'outlook']],
+            volumes.map(volume => [volume.name, String(volume.percent), String(volume.used),
+                                   String(volume.free),
+                                   {text: volume.outlook.text, order: volume.outlook.order}]),
+            {caption: format.nameOf('reports', 'volume_usage'), csv: csvOf('volume_usage'),
+             sorted: 1})]
+  },
+  share_list: {
+    variable: 'vornShareListData',
+    width: 3,
+    show: data => [
+      shareMap(rowsOf(data)),
+      table([['share', 'name'], ['size', 'size'], ['volume', 'text']], pick(rowsOf(data), 0, 2, 1),
+            {caption: data.heading, csv: csvOf('share_list'), sorted: 1})]
+  },
+  file_group: {
+    variable: 'vornFileGroupTableData',
+    width: 3,
+    limit: [100, 'cutRows'],
+    show: ({tables}) => [
+      typeBars(tables),
+      ...tablesOf(tables, [['type', 'type'], ['share', 'text'], ['size', 'size']],
+                  name => name === 'vornAll' ? format.say('allFiles') : shownPlain(name))]
+  },
+  file_owner: {
+    variable: 'vornFileOwnerData',
+    width: 4,
+    show: data => [table(
+      [['owner', 'name'], ['share', 'text'], ['files', 'count'], ['size', 'size']], rowsOf(data),
+      {caption: data.heading, csv: csvOf('file_owner')})]
+  },
+  quota_usage: {
+    variable: 'vornQuotaUsageTable',
+    width: 4,
+    limit: [100, 'smallestUsers'],
+    eachTable: true,
+    always: true,
+    missing: 'noQuotas',
+    show: ({tables}) => tablesOf(
+      tables, [['user', 'name'], ['percent', 'percent'], ['used', 'size'], ['quota', 'quota']],
+      shownPlain)
+  },
+  duplicate_file: {
+    variable: 'vornDuplicateFileData',
+    width: 5,
+    limit: [200, 'firstGroups'],
+    limitOf: 0,
+    mode: 'vornDuplicateHashMatch',
+    show: showDuplicates
+  },
+  large_file: {
+    variable: 'vornLargeFileData',
+    width: 3,
+    limit: [200, 'firstRows'],
+    show: data => [table(
+      [['file', 'path'], ['size', 'size'], ['share', 'text']], pick(rowsOf(data), 1, 2, 0),
+      {caption: data.heading, csv: csvOf('large_file'), sorted: 1})]
+  },
+  least_modify: {
+    variable: 'vornLeastModifyData',
+    width: 4,
+    limit: [200, 'firstRows'],
+    show: data => [table(FILES, pick(rowsOf(data), 1, 2, 3, 0),
+                         {caption: data.heading, csv: csvOf('least_modify')})]
+  },
+  most_modify: {
+    variable: 'vornMostModifyData',
+    width: 4,
+    limit: [200, 'firstRows'],
+    show: data => [table(FILES, pick(rowsOf(data), 1, 2, 3, 0),
+                         {caption: data.heading, csv: csvOf('most_modify')})]
+  }
+};
+
+// Whether the page got as many rows as it gets at most.
+export function isCut({limit, limitOf, eachTable}, {tables}) {
+  if (!limit) {
+    return false;
+  }
+  const all = [...tables.values()];
+  if (limitOf !== undefined) {
+    return Number(all.flat().at(-1)?.[limitOf]) >= limit[0];
+  }
+  const counts = all.map(rows => rows.length);
+  return (eachTable ? Math.max(0, ...counts) : counts.reduce((sum, n) => sum + n, 0)) >= limit[0];
+}
+
+const note = (key, values) => h('p', {class: 'note'}, format.say(key, values));
+
+// What the section says besides its rows: of damage, of a cut, and of nothing to show.
+function notesOf(report, data, emptyReports) {
+  if (!data) {
+    return [note(report.missing ?? (report.always || emptyReports === 'none' ? 'missing' :
+      emptyReports === 'all' ? 'noRows' : 'unclear'))];
+  }
+  const count = format.number([...data.tables.values()].flat().length);
+  const notes = [];
+  if (!data.whole) {
+    notes.push(note(data.tables.size ? 'recovered' : 'damaged', {n: count}));
+  } else if (data.oddKeys.length) {
+    notes.push(note('readFromText', {
+      n: count, name: data.oddKeys.map(shownPlain).join(', ')}));
+  } else if (count === '0') {
+    notes.push(note('noRows'));
+  }
+  if (isCut(report, data)) {
+    notes.push(note(report.limit[1], {n: format.number(report.limit[0])}));
+  }
+  return notes;
+}
+
+// Fills `section` with report `name`. `data` is undefined without a block; `emptyReports` says
+// which of the reports without a block have just found nothing: all, some or none.
+export function fillSection(section, name, data, emptyReports) {
+  const report = REPORTS[name];
+  const rows = data ? [...data.tables.values()].flat() : [];
+  const heading = format.nameOf('reports', data?.heading ?? name);
+  section.replaceChildren(
+    h('h2', {id: `${name}-heading`}, name === 'volume_usage' ? format.say('history') : heading),
+    ...report ? notesOf(report, data, emptyReports) : [note('unknown')],
+    ...rows.length ? report.show({...data, heading}).filter(Boolean) : []);
+}
