@@ -8,6 +8,7 @@
 #include <string_view>
 #include <vector>
 
+#include "mail_summary.hpp"
 #include "text_containers.hpp"
 
 namespace host {
@@ -20,16 +21,13 @@ struct MailLimits {
   std::chrono::milliseconds total{120'000};    // all of them
 };
 
-// What the mail of one report says.
+// A message and its envelope.
 struct MailText {
-  std::string profile;
-  std::string host;
-  std::string reports;
-  std::string link;
   std::string from;
   std::vector<std::string> to;
   std::time_t time = 0;
   std::string message_id;  // without the angle brackets
+  MailContent content;
 };
 
 // Whether `address` can stand in a header and in an SMTP command as it is: printable ASCII without
@@ -44,15 +42,25 @@ std::string mail_host(const std::string& smtp_url);
 // `password` filled.
 const char* password_problem(const std::string& path, std::string& password);
 
-// The message: header and a plain text body, lines ended by CR LF, nothing but ASCII.
+// The message: header and the content in both forms, lines ended by CR LF, nothing but ASCII.
 std::string mail_message(const MailText& text);
 
 // A text in quoted-printable, so that any bytes travel and no line is too long.
 std::string quoted_printable(std::string_view text);
 
-// As VornQazSendReport.
+// `text` for an unstructured header field: as it is when it is printable ASCII, otherwise as
+// encoded words on folded lines. Line ends and other control characters become blanks.
+std::string header_text(std::string_view text);
+
+// As VornQazSendReport. With the path of the finished page in `hash` (real_path_report_final) the
+// mail tells its figures.
 int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
                 const MailLimits& limits);
+
+// Sends a mail that says it is a test as send_report sends one. Those who were served; one log line
+// for everything that kept others from it.
+std::vector<std::string> send_test_mail(const char* profile, const VLIBCSzHash& hash,
+                                        const MailLimits& limits);
 
 }  // namespace host
 

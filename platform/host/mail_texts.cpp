@@ -104,7 +104,8 @@ std::string name_in(TextForm form, std::string_view name) {
 }
 
 MailTexts::MailTexts(const std::string& folder, std::string_view code) {
-  if (!is_language_code(code)) {
+  constexpr std::size_t kLongestCode = 7;  // as the page takes them
+  if (!is_language_code(code) || code.size() > kLongestCode) {
     code = "en";
   }
   std::string_view previous;

@@ -108,6 +108,9 @@ class MailServer {
   std::string port_;
 };
 
+const std::string kDictionaries = VORN_PATH_TEMPLATE "/lang";
+const std::string kSourceDictionaries = VORN_TEST_SOURCE_DIR "/reportUI/template/lang";
+
 int send(Entries profile, const std::string& url, const char* to = "a@example.com") {
   profile.emplace_back("smtp_url", url);
   profile.emplace_back("mail_to", to);
@@ -116,11 +119,17 @@ int send(Entries profile, const std::string& url, const char* to = "a@example.co
 
 TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
   const MailServer server;
+  const support::TempFolder folder;
   const std::string long_link = "https://h/" + std::string(1000, 'x') + "?=.\n.\nend";
   const Entries profile = {{"mail_to", " a@example.com , b@example.com,,a@example.com"},
                            {"mail_from", "reports@example.com"},
                            {"report_list", "share_list,large_file"},
+                           {"real_path_report_final", folder.path("report.html")},
                            {"smtp_url", server.url()}};
+  support::write_file(folder.path("report.html"),
+                      "var vornShareListData = [\n[ 'photos', '/', '2048' ]\n];\n");
+  support::write_file(kDictionaries + "/en.json",
+                      support::read_file(kSourceDictionaries + "/en.json"));
   ASSERT_EQ(0, VornQazSendReport("weekly", long_link.c_str(), make_hash(profile).get()));
   EXPECT_EQ("", syslog_text());
   ASSERT_EQ(2U, server.count());
@@ -131,10 +140,13 @@ TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
       "Date: \\w{3}, \\d\\d \\w{3} \\d{4} \\d\\d:\\d\\d:\\d\\d [-+]\\d{4}\r\n"
       "From: reports@example\\.com\r\nTo: a@example\\.com,\r\n b@example\\.com\r\n"
       "Message-ID: <[^<>@ ]+@[^<>@ ]+>\r\n"
-      "Subject: Storage report weekly of [-.\\w]+, \\d{4}-\\d\\d-\\d\\d \\d\\d:\\d\\d:\\d\\d\r\n"
+      "Subject: Storage report weekly of [-.\\w]+, \\d{4}-\\d\\d-\\d\\d \\d\\d:\\d\\d\r\n"
       "Auto-Submitted: auto-generated\r\nMIME-Version: 1\\.0\r\n"
+      "Content-Type: multipart/alternative; boundary=\"(.+)\"\r\n\r\n--\\3\r\n"
       "Content-Type: text/plain; charset=UTF-8\r\n"
-      "Content-Transfer-Encoding: quoted-printable\r\n\r\n([^]*)");
+      "Content-Transfer-Encoding: quoted-printable\r\n\r\n([^]*)\r\n--\\3\r\n"
+      "Content-Type: text/html; charset=UTF-8\r\n"
+      "Content-Transfer-Encoding: quoted-printable\r\n\r\n([^]*)\r\n--\\3--\r\n");
   std::string ports[2];
   for (int i = 0; i < 2; ++i) {
     const std::string mail = server.mail(i + 1);
@@ -142,13 +154,42 @@ TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
     ASSERT_TRUE(std::regex_match(mail, parts, form)) << mail;
     EXPECT_EQ(i == 0 ? "a" : "b", parts[1]);
     ports[i] = parts[2];
-    const std::string body = std::regex_replace(parts[3].str(), std::regex("=\r\n"), "");
-    for (const char* text : {"x?=3D.\r\n.\r\nend\r\n",  // a line of one dot must not end it
-                             "\"weekly\"", "share_list,large_file"}) {
-      EXPECT_NE(std::string::npos, body.find(text)) << body;
+    const std::regex soft_break("=\r\n");
+    const std::string plain = std::regex_replace(parts[4].str(), soft_break, "");
+    const std::string html = std::regex_replace(parts[5].str(), soft_break, "");
+    for (const char* text :
+         {"x?=3D.\r\n.\r\nend\r\n",  // a line of one dot must not end it
+          "Largest share: photos (2=C2=A0KiB)", "Reports: Shares, Largest files"}) {
+      EXPECT_NE(std::string::npos, plain.find(text)) << plain;
     }
+    EXPECT_NE(std::string::npos, html.find("<bdi>photos</bdi> (2=C2=A0KiB)")) << html;
   }
   EXPECT_EQ(ports[0], ports[1]);
+}
+
+TEST(SendReport, NeedsNoDictionary) {
+  const MailServer server;
+  support::write_file(kDictionaries + "/en.json", "{\"mail\": [");
+  EXPECT_EQ(0, send({{"language", "../../etc"}}, server.url()));
+  EXPECT_NE(std::string::npos, server.mail(1).find("Subject: subject weekly "));
+  EXPECT_NE(std::string::npos, server.mail(1).find("\r\nhttps://h/r.html\r\n"));
+}
+
+TEST(SendTestMail, SaysWhoGetsNone) {
+  const MailServer picky("--refuse b@example.com");
+  const Entries profile = {{"mail_to", "a@example.com, b@example.com, c"},
+                           {"smtp_url", picky.url()}};
+  support::write_file(kDictionaries + "/de.json",
+                      support::read_file(kSourceDictionaries + "/de.json"));
+  const auto test = [](Entries entries) {
+    entries.emplace_back("language", "de-AT");
+    return host::send_test_mail("weekly", *make_hash(entries), host::MailLimits{});
+  };
+  EXPECT_EQ(std::vector<std::string>{"a@example.com"}, test(profile));
+  EXPECT_EQ(2U, syslog_lines().size());
+  EXPECT_NE(std::string::npos, picky.mail(1).find("Dies ist ein Test"));
+  EXPECT_TRUE(test({}).empty());
+  EXPECT_NE(std::string::npos, syslog_text().find("no recipients"));
 }
 
 TEST(SendReport, NamesEachRefusedRecipient) {
@@ -288,6 +329,14 @@ TEST(MailAddress, IsPlainEnoughForAHeader) {
     EXPECT_FALSE(host::valid_address(address)) << address;
   }
   EXPECT_FALSE(host::valid_address(std::string(250, 'x') + "@b.cd"));
+}
+
+TEST(HeaderText, KeepsLinesShortAndCharactersWhole) {
+  EXPECT_EQ("a b  Bcc: x", host::header_text("a b\r\nBcc: x"));
+  EXPECT_EQ("=?UTF-8?B?w6Q=?=", host::header_text("\xc3\xa4"));
+  EXPECT_EQ("=?UTF-8?B?PT8=?=", host::header_text("=?")) << "or a reader decodes it";
+  const std::string words = host::header_text(std::string(38, 'x') + "\xc3\xa4");
+  EXPECT_TRUE(words.ends_with("?=\r\n =?UTF-8?B?w6Q=?=")) << words;
 }
 
 TEST(QuotedPrintable, KeepsLinesShortAndBytesWhole) {
