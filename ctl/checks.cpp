@@ -38,21 +38,6 @@ std::string joined(const std::vector<std::string>& texts, const char* separator)
   return all;
 }
 
-// The platform's own verdict on `value`: the message of `judge`, which gets a profile that holds
-// it.
-template <typename Judge>
-std::string platform_problem(const char* key, const std::string& value, Judge judge) {
-  VLIBCSzHash hash(1);
-  hash.set(key, value);
-  std::vector<std::string> earlier = take_host_messages();
-  judge(hash);
-  const std::vector<std::string> messages = take_host_messages();
-  for (const std::string& message : earlier) {
-    warn(message);
-  }
-  return joined(messages, "; ");
-}
-
 std::string report_list_problem(const std::string& value) {
   const std::vector<std::string> names = report_names();
   for (const std::string_view word : host::comma_words(value)) {
@@ -72,8 +57,9 @@ std::string share_list_problem(const std::string& value) {
   }
   for (const std::string_view word : host::comma_words(value)) {
     if (std::find(names.begin(), names.end(), word) == names.end()) {
-      return in_quotes(word) + " is no share" + suggestion(word, names) +
-             "; add it with vornctl share add";
+      const std::string near = suggestion(word, names);
+      return in_quotes(word) + " is no share" +
+             (near.empty() ? "; add it with vornctl share add" : near);
     }
   }
   return "";
@@ -95,10 +81,8 @@ std::string truth_problem(const std::string& value) {
 }
 
 std::string report_dir_problem(const std::string& value) {
-  const std::string problem = platform_problem(
-      "report_dir", value, [](const VLIBCSzHash& hash) { host::report_dir("(new)", hash); });
-  if (!problem.empty()) {
-    return problem;
+  if (const char* error = host::report_dir_error(value); error != nullptr) {
+    return error;
   }
   // The run makes what is missing.
   std::filesystem::path folder(value);
@@ -174,13 +158,11 @@ std::string schedule_problem(const std::string& value) {
 }
 
 std::string keep_problem(const std::string& value) {
-  return platform_problem(
-             "keep_reports", value,
-             [](const VLIBCSzHash& hash) {
-               host::reports_to_keep("", hash);
-             }).empty()
-             ? ""
-             : "is no number from 1 on";
+  VLIBCSzHash hash(1);
+  hash.set("keep_reports", value);
+  const std::size_t number = host::reports_to_keep("", hash);
+  take_host_messages();  // said here in fewer words
+  return number > 0 ? "" : "is no number from 1 on";
 }
 
 constexpr ProfileKey kKeys[] = {
@@ -300,7 +282,8 @@ std::string checked_value(const ProfileKey& key, const std::string& value) {
     problem = key.problem(value);
   }
   if (!problem.empty()) {
-    throw Failure(std::string(key.name) + ' ' + in_quotes(value) + ": " + problem);
+    const bool names_it = problem.front() == '"';
+    throw Failure(key.name + (names_it ? ": " : ' ' + in_quotes(value) + ' ') + problem);
   }
   if (!key.is_list) {
     return value;

@@ -1,12 +1,106 @@
 // vornctl profile: what is reported, and for whom.
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <map>
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "checks.hpp"
 #include "config.hpp"
 #include "ctl.hpp"
+#include "file_io.hpp"
+#include "old_reports.hpp"
+#include "profile_state.hpp"
+#include "run_lock.hpp"
+#include "schedules.hpp"
+#include "text_containers.hpp"
+#include "vorn/paths.h"
+#include "vorn/report.h"
 
 namespace ctl {
 namespace {
+
+std::string titled(const std::string& profile) {
+  return "profile \"" + profile + "\"";
+}
+
+// Keys that need each other. `profile` is as it shall be.
+void check_together(const Section& profile) {
+  if (profile.value("report_list").empty() && profile.name != "global") {
+    throw Failure("report_list can't be empty: a profile without reports makes none");
+  }
+  if (!profile.value("smtp_user").empty() && profile.value("smtp_password_file").empty()) {
+    throw Failure("smtp_user needs smtp_password_file, the file with the password");
+  }
+}
+
+// `profile` with the changes.
+Section changed(Section profile, const Changes& changes) {
+  for (const auto& [key, value] : changes) {
+    std::erase_if(profile.entries, [&](const auto& entry) { return entry.first == key; });
+    if (value) {
+      profile.entries.emplace_back(key, *value);
+    }
+  }
+  return profile;
+}
+
+// --- add ----------------------------------------------------------------------------------------
+
+struct NewProfile {
+  std::string name;
+  std::map<std::string, std::string, std::less<>> values;  // by key
+  std::string duplicates;
+  bool history = false;
+};
+
+void add_profile(NewProfile profile) {
+  check_profile_name(profile.name);
+  if (profile_exists(profile.name)) {
+    throw Failure(titled(profile.name) + " is there already; change it with vornctl profile set");
+  }
+  if (profile.values["report_list"].empty()) {
+    for (const std::string& name : report_names()) {
+      profile.values["report_list"] += (name == report_names().front() ? "" : ",") + name;
+    }
+  }
+  profile.values["duplicate_compare"] = profile.duplicates == "content" ? "true" : "";
+  profile.values["volume_history"] = profile.history ? "true" : "";
+  Changes entries;
+  for (const ProfileKey& key : profile_keys()) {
+    if (const std::string value = checked_value(key, profile.values[key.name]); !value.empty()) {
+      entries.emplace_back(key.name, value);
+    }
+  }
+  check_together(changed({profile.name, {}}, entries));
+  add_section(VORN_PATH_CONFIG, profile.name, entries);
+}
+
+void describe_add(CLI::App& group) {
+  CLI::App& add = *group.add_subcommand("add", "Make a profile");
+  const auto profile = std::make_shared<NewProfile>();
+  add.add_option("NAME", profile->name, "Name of the profile: A-Z a-z 0-9 . _ -")
+      ->type_name("")
+      ->required();
+  for (const ProfileKey& key : profile_keys()) {
+    if (key.option != nullptr) {
+      add.add_option(key.option, profile->values[key.name], key.help)->type_name(key.type);
+    }
+  }
+  add.add_option("--duplicates", profile->duplicates, "Compare files by name and size or content")
+      ->type_name("name|content")
+      ->check([](const std::string& word) {
+        return word == "name" || word == "content" ? "" : "write name or content";
+      });
+  add.add_flag("--history", profile->history, "Show history and forecast of volumes");
+  add.callback([profile] { add_profile(std::move(*profile)); });
+}
+
+// --- list and show ------------------------------------------------------------------------------
 
 nlohmann::ordered_json as_json(const Section& profile) {
   nlohmann::ordered_json json{{"name", profile.name}};
@@ -17,14 +111,169 @@ nlohmann::ordered_json as_json(const Section& profile) {
 }
 
 void list_profiles(bool json) {
+  const std::vector<std::string> all = report_names();
   nlohmann::ordered_json list = nlohmann::ordered_json::array();
-  Table table({{"PROFILE"}, {"REPORTS"}, {"SHARES"}, {"MAIL TO"}});
+  Table table({{"PROFILE"}, {"SHARES"}, {"MAIL TO"}, {"REPORTS"}});
   for (const Section& profile : read_profiles()) {
     list.push_back(as_json(profile));
-    table.add({profile.name, profile.value("report_list", "-"), profile.value("share_list", "all"),
-               profile.value("mail_to", "-")});
+    const std::string reports = profile.value("report_list", "none");
+    const bool has_all = std::all_of(all.begin(), all.end(), [&](const std::string& name) {
+      return reports.find(name) != std::string::npos;
+    });
+    table.add({profile.name, profile.value("share_list", "all"), profile.value("mail_to", "-"),
+               has_all ? "all" : reports});
   }
-  json ? print_json(list) : table.print();
+  if (json) {
+    print_json(list);
+  } else if (table.empty()) {
+    warn("there are no profiles; add one with vornctl profile add NAME");
+  } else {
+    table.print();
+  }
+}
+
+void show_profile(const std::string& name, bool json) {
+  const Section profile = read_profile(name);
+  if (json) {
+    print_json(as_json(profile));
+    return;
+  }
+  Table table({{"KEY"}, {"VALUE"}});
+  for (const auto& [key, value] : profile.entries) {
+    table.add({key, value});
+  }
+  table.print();
+}
+
+void describe_list_and_show(CLI::App& group) {
+  const auto json = std::make_shared<bool>();
+  const auto name = std::make_shared<std::string>();
+  CLI::App& list = *group.add_subcommand("list", "Print every profile");
+  add_json_flag(list, *json);
+  list.callback([json] { list_profiles(*json); });
+  CLI::App& show = *group.add_subcommand("show", "Print the keys of a profile");
+  add_profile_argument(show, *name);
+  add_json_flag(show, *json);
+  show.callback([name, json] { show_profile(*name, *json); });
+}
+
+// --- set ----------------------------------------------------------------------------------------
+
+// `words` are keys, each with its value behind it.
+void set_keys(const std::string& name, const std::vector<std::string>& words) {
+  if (words.size() % 2 != 0) {
+    throw Failure("the key " + words.back() + " has no value; an empty one ('') unsets it",
+                  kWrongUsage);
+  }
+  Changes changes;
+  for (std::size_t i = 0; i < words.size(); i += 2) {
+    const ProfileKey& key = profile_key(words[i]);
+    const std::string value = checked_value(key, words[i + 1]);
+    changes.emplace_back(key.name, value.empty() ? std::nullopt : std::optional(value));
+  }
+  check_together(changed(read_profile(name), changes));
+  change_section(VORN_PATH_CONFIG, name, changes);
+}
+
+void describe_set(CLI::App& group) {
+  CLI::App* set = group.add_subcommand("set", "Change keys of a profile; an empty value unsets");
+  const auto name = std::make_shared<std::string>();
+  const auto first = std::make_shared<std::pair<std::string, std::string>>();
+  add_profile_argument(*set, *name);
+  set->add_option("KEY", first->first, "Key, see vornreport.conf(5)")->type_name("")->required();
+  set->add_option("VALUE", first->second, "Its new value; more pairs may follow")
+      ->type_name("")
+      ->required();
+  // An option of several values would take "[a,b]" apart, so the other pairs are what is left.
+  set->allow_extras();
+  set->callback([set, name, first] {
+    std::vector<std::string> words = set->remaining();
+    words.insert(words.begin(), {first->first, first->second});
+    set_keys(*name, words);
+  });
+}
+
+// --- remove -------------------------------------------------------------------------------------
+
+// The profile as the platform's calls take it.
+VLIBCSzHash as_hash(const Section& profile) {
+  VLIBCSzHash hash(profile.entries.size());
+  for (const auto& [key, value] : profile.entries) {
+    hash.set(key, value);
+  }
+  return hash;
+}
+
+// No run of the profile can begin from here to the end of the process.
+void hold(const std::string& profile) {
+  switch (host::take_profile(profile)) {
+    case host::TakeResult::taken:
+      return;
+    case host::TakeResult::busy:
+      throw Failure(titled(profile) + " is running; try again when its run has ended");
+    case host::TakeResult::failed:
+      throw host_failure(titled(profile) + " can't be locked");
+  }
+}
+
+// Everything of the profile's in its folder, and the folder if nothing else is in it.
+void remove_reports(const std::string& folder) {
+  const auto reports = host::stored_reports(folder, host::ReportSize::left_out);
+  if (!reports) {
+    throw host_failure(folder + " can't be read");
+  }
+  for (const host::StoredReport& report : *reports) {
+    if (report.is_whole && !host::remove_report(folder, report.name)) {
+      throw host_failure(folder + "/" + report.name + " can't be removed");
+    }
+  }
+  if (!host::remove_tree(folder + "/template") || (rmdir(folder.c_str()) != 0 && errno != ENOENT)) {
+    warn(folder + " stays: " +
+         (errno == ENOTEMPTY || errno == EEXIST ? "it holds more than reports"
+                                                : std::strerror(errno)));
+  }
+}
+
+void remove_schedule(const Section& profile, VLIBCSzHash* keys) {
+  constexpr std::size_t kLargestFile = 1U << 20U;
+  const std::string file = cron_file(profile.value(kScheduleKey, "none"));
+  if (!only_runs(profile.name, host::read_file(file, kLargestFile).value_or(""))) {
+    throw Failure(file + " holds other jobs than those of " + titled(profile.name) +
+                  "; move them to a file of their own");
+  }
+  if (VornQazScheduleClean(profile.name.c_str(), &keys, kScheduleKey) < 0) {
+    throw host_failure(titled(profile.name) + " has a schedule that can't be removed");
+  }
+}
+
+void remove_profile(const std::string& name, bool reports_too) {
+  check_profile_name(name);
+  const Section profile = read_profile(name);
+  const std::string folder = report_folder(profile);
+  hold(name);
+  VLIBCSzHash hash = as_hash(profile);
+  VLIBCSzHash* keys = &hash;
+  remove_schedule(profile, keys);
+  if (VornQazInitRealPath(name.c_str(), &keys, 0) == 0) {
+    VornQazReportCleanTmp(name.c_str(), keys);
+  }
+  if (reports_too) {
+    remove_reports(folder);
+  }
+  remove_section(VORN_PATH_CONFIG, name);
+  unlink((VORN_PATH_STATUS "/" + name).c_str());
+  if (!reports_too && access(folder.c_str(), F_OK) == 0) {
+    warn("the reports of " + titled(name) + " stay in " + folder);
+  }
+}
+
+void describe_remove(CLI::App& group) {
+  CLI::App& remove = *group.add_subcommand("remove", "Remove a profile and its schedule");
+  const auto name = std::make_shared<std::string>();
+  const auto reports_too = std::make_shared<bool>();
+  add_profile_argument(remove, *name);
+  remove.add_flag("--reports-too", *reports_too, "Remove its finished reports as well");
+  remove.callback([name, reports_too] { remove_profile(*name, *reports_too); });
 }
 
 }  // namespace
@@ -32,10 +281,10 @@ void list_profiles(bool json) {
 void add_profile_commands(CLI::App& app) {
   CLI::App& group = *app.add_subcommand("profile", "What is reported, and for whom");
   group.require_subcommand(1);
-  const auto json = std::make_shared<bool>();
-  CLI::App& list = *group.add_subcommand("list", "Print every profile");
-  add_json_flag(list, *json);
-  list.callback([json] { list_profiles(*json); });
+  describe_add(group);
+  describe_list_and_show(group);
+  describe_set(group);
+  describe_remove(group);
 }
 
 }  // namespace ctl

@@ -38,26 +38,6 @@ struct CloseDir {
   void operator()(DIR* dir) const { closedir(dir); }
 };
 
-// Why `dir` can't be a report folder, or null. The program puts these paths between single quotes
-// in shell commands without escaping them.
-const char* report_dir_problem(std::string_view dir) {
-  if (!dir.starts_with('/')) {
-    return "is not absolute";
-  }
-  if (dir.size() > kLongestReportDir) {
-    return "is longer than 1024 bytes";
-  }
-  if (std::any_of(dir.begin(), dir.end(), [](char c) {
-        return c == '\'' || static_cast<unsigned char>(c) < ' ' || c == '\x7f';
-      })) {
-    return "holds a single quote or a control character";
-  }
-  if ((std::string(dir) + "/").find("/../") != std::string::npos) {
-    return R"(holds "..")";
-  }
-  return nullptr;
-}
-
 // --- The profile's own folder -------------------------------------------------------------------
 
 bool make_report_folder(const std::string& dir, const std::string& folder) {
@@ -221,10 +201,28 @@ Fd open_report_folder(const std::string& folder) {
   return opened;
 }
 
+const char* report_dir_error(std::string_view dir) {
+  if (!dir.starts_with('/')) {
+    return "is not absolute";
+  }
+  if (dir.size() > kLongestReportDir) {
+    return "is longer than 1024 bytes";
+  }
+  if (std::any_of(dir.begin(), dir.end(), [](char c) {
+        return c == '\'' || static_cast<unsigned char>(c) < ' ' || c == '\x7f';
+      })) {
+    return "holds a single quote or a control character";
+  }
+  if ((std::string(dir) + "/").find("/../") != std::string::npos) {
+    return R"(holds "..")";
+  }
+  return nullptr;
+}
+
 std::optional<std::string> report_dir(const char* profile, const VLIBCSzHash& hash) {
   const char* value = hash.find("report_dir");
   std::string dir = value == nullptr || *value == '\0' ? VORN_PATH_REPORTS : value;
-  if (const char* problem = report_dir_problem(dir); problem != nullptr) {
+  if (const char* problem = report_dir_error(dir); problem != nullptr) {
     log_line(R"(profile "%s": report_dir "%.1100s" %s; write report_dir = /... in %s)", profile,
              dir.c_str(), problem, VORN_PATH_CONFIG);
     errno = EINVAL;

@@ -4,12 +4,17 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "file_io.hpp"
 #include "vorn/text.h"
 
 namespace host {
+
+// Why `dir` can't be a report folder ("is not absolute"), or null. The program puts these paths
+// between single quotes in shell commands without escaping them.
+const char* report_dir_error(std::string_view dir);
 
 // The folder that the profile's key `report_dir` names, or the default: absolute, without slashes
 // at its end (so "/" is the empty text). Nothing, after one log line, when the program couldn't
