@@ -6,7 +6,7 @@ import {h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
 import {sizeElement, typeName} from './table.js';
 
-const WIDTH = 960, HEIGHT = 340, HEADER = 22;
+const WIDTH = 1180, HEIGHT = 340, HEADER = 22;
 const CHARACTER = 7.4;  // widest average of a label's characters, in the drawing's units
 const LINE = 17;
 
@@ -33,14 +33,14 @@ function neighbour(leaves, from, key) {
   return best;
 }
 
-function leafElement(leaf, series, total) {
+function leafElement(leaf, total) {
   const {x0, x1, y0, y1} = leaf;
   const [width, height] = [x1 - x0, y1 - y0];
   const plain = shownPlain(leaf.data.name);
   const label = format.say('selected', {
     name: plain, size: format.size(leaf.value),
     percent: format.percent(leaf.value / total * 100)});
-  const element = svg('g', {class: `leaf series${series % 8}`, role: 'img', tabindex: -1,
+  const element = svg('g', {class: `leaf series${format.seriesOf(leaf.parent.data.name)}`, role: 'img', tabindex: -1,
                             'aria-label': label, transform: `translate(${x0},${y0})`},
                       svg('title', {}, label), svg('rect', {width, height, rx: 2}));
   const lines = [fit(plain, width - 12), fit(format.size(leaf.value), width - 12)];
@@ -68,13 +68,13 @@ export function shareMap(rows) {
     .paddingInner(2).round(true)(root);
   const drawing = svg('svg', {class: 'treemap', viewBox: `0 0 ${WIDTH} ${HEIGHT}`, role: 'group',
                               'aria-label': format.nameOf('reports', 'share_list')});
-  root.children.forEach((volume, series) => {
+  root.children.forEach(volume => {
     const plain = shownPlain(volume.data.name);
     const text = `${plain}  ${format.size(volume.value)}`;
     drawing.append(svg('text', {class: 'volume', x: volume.x0 + 2, y: volume.y0 + 15},
                        fit(text, volume.x1 - volume.x0) || fit(plain, volume.x1 - volume.x0)));
     volume.leaves().forEach(leaf => {
-      leaf.element = drawing.appendChild(leafElement(leaf, series, root.value));
+      leaf.element = drawing.appendChild(leafElement(leaf, root.value));
     });
   });
   const leaves = root.leaves();

@@ -57,6 +57,15 @@ export function say(key, values = {}) {
 }
 export const nameOf = (group, key) => find(group, key) ?? key.replaceAll('_', ' ');
 
+// A number of a colour for each name, the same in all drawings.
+const series = new Map();
+export function seriesOf(name) {
+  if (!series.has(name)) {
+    series.set(name, series.size % 8);
+  }
+  return series.get(name);
+}
+
 // Like say(), but as text and nodes, for values that are elements.
 export function sayNodes(key, values) {
   return (find('page', key) ?? key).split(/\{(\w+)\}/).map(
@@ -75,7 +84,7 @@ export function size(value) {
     return UNKNOWN;
   }
   let unit = 0;
-  while (count >= 1023.95 && unit < UNITS.length - 1) {
+  while (count >= 1023.5 && unit < UNITS.length - 1) {
     count /= 1024;
     ++unit;
   }
@@ -86,9 +95,9 @@ export function size(value) {
 export const exactSize = value => say('bytes', {n: BigInt(value).toLocaleString(language)});
 
 // `value` is a number of hundredths.
-export function percent(value) {
+export function percent(value, maximumFractionDigits = 1) {
   return Number.isFinite(value) && value >= 0 ?
-    (value / 100).toLocaleString(language, {style: 'percent', maximumFractionDigits: 1}) : UNKNOWN;
+    (value / 100).toLocaleString(language, {style: 'percent', maximumFractionDigits}) : UNKNOWN;
 }
 
 export function inDays(days) {

@@ -106,6 +106,7 @@ function render() {
   if (usage) {
     Object.assign(usage, {volumes, hasHistory: history !== undefined});
   }
+  volumes.forEach(({name}) => format.seriesOf(name));
   const names = [...Object.keys(REPORTS).filter(name => written.has(name)),
                  ...[...written.keys()].filter(name => !REPORTS[name])];
   const empty = emptyReports();

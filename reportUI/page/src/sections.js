@@ -18,10 +18,21 @@ const rowsOf = ({tables}) => [...tables.values()].flat();
 const csvOf = name => `csv/${name}.csv`;
 const pick = (rows, ...order) => rows.map(row => order.map(index => row[index]));
 
-// A table for each of the named ones.
-function tablesOf(tables, columns, caption) {
-  return [...tables].filter(([, rows]) => rows.length).map(([name, rows]) => table(
-    columns, rows, {caption: caption(name)}));
+const bySize = (rows, index) => rows.toSorted(
+  (one, two) => (parseFloat(two[index]) || 0) - (parseFloat(one[index]) || 0));
+
+const folded = (summary, content) => h('details', {}, h('summary', {}, summary), content);
+
+// Owner, files and size over all shares, of rows of owner, share, files and size.
+function totalsOf(rows) {
+  const totals = new Map();
+  for (const [owner, , files, bytes] of rows) {
+    const total = totals.get(owner) ?? [owner, 0, 0];
+    total[1] += Number(files) || 0;
+    total[2] += Number(bytes) || 0;
+    totals.set(owner, total);
+  }
+  return bySize([...totals.values()].map(total => total.map(String)), 2);
 }
 
 // The groups of duplicates: {number, file, count, size, frees}, which names one of the files.
@@ -78,17 +89,21 @@ export const REPORTS = {
     variable: 'vornFileGroupTableData',
     width: 3,
     limit: [100, 'cutRows'],
-    show: ({tables}) => [
-      typeBars(tables),
-      ...tablesOf(tables, [['type', 'type'], ['share', 'text'], ['size', 'size']],
-                  name => name === 'vornAll' ? format.say('allFiles') : shownPlain(name))]
+    show: ({tables}) => [typeBars(tables), ...[...tables].filter(([, rows]) => rows.length).map(
+      ([name, rows]) => folded(name === 'vornAll' ? format.say('allFiles') : shownPlain(name), table(
+        [['type', 'type'], ['share', 'text'], ['size', 'size']], bySize(rows, 2),
+        {caption: name === 'vornAll' ? format.say('allFiles') : shownPlain(name), sorted: 2})))]
   },
   file_owner: {
     variable: 'vornFileOwnerData',
     width: 4,
-    show: data => [table(
-      [['owner', 'name'], ['share', 'text'], ['files', 'count'], ['size', 'size']], rowsOf(data),
-      {caption: data.heading, csv: csvOf('file_owner')})]
+    show: data => [
+      table([['owner', 'name'], ['size', 'size'], ['files', 'count']],
+            pick(totalsOf(rowsOf(data)), 0, 2, 1),
+            {caption: data.heading, csv: csvOf('file_owner'), sorted: 1}),
+      folded(format.say('byShare'), table(
+        [['owner', 'name'], ['share', 'text'], ['size', 'size'], ['files', 'count']],
+        pick(rowsOf(data), 0, 1, 3, 2), {caption: format.say('byShare')}))]
   },
   quota_usage: {
     variable: 'vornQuotaUsageTable',
@@ -97,9 +112,9 @@ export const REPORTS = {
     eachTable: true,
     always: true,
     missing: 'noQuotas',
-    show: ({tables}) => tablesOf(
-      tables, [['user', 'name'], ['percent', 'percent'], ['used', 'size'], ['quota', 'quota']],
-      shownPlain)
+    show: ({tables}) => [...tables].filter(([, rows]) => rows.length).map(([name, rows]) => table(
+      [['user', 'name'], ['percent', 'percent'], ['used', 'size'], ['quota', 'quota']],
+      pick(bySize(rows, 3), 0, 3, 2, 1), {caption: shownPlain(name), sorted: 1}))
   },
   duplicate_file: {
     variable: 'vornDuplicateFileData',
@@ -170,6 +185,13 @@ function notesOf(report, data, emptyReports) {
   return notes;
 }
 
+// A print shows what is folded.
+window.addEventListener('beforeprint', () => document.querySelectorAll('details:not([open])').forEach(
+  details => {
+    details.open = true;
+    window.addEventListener('afterprint', () => { details.open = false; }, {once: true});
+  }));
+
 // Fills `section` with report `name`. `data` is undefined without a block; `emptyReports` says
 // which of the reports without a block have just found nothing: all, some or none.
 export function fillSection(section, name, data, emptyReports) {
@@ -180,4 +202,7 @@ export function fillSection(section, name, data, emptyReports) {
     h('h2', {id: `${name}-heading`}, name === 'volume_usage' ? format.say('history') : heading),
     ...report ? notesOf(report, data, emptyReports) : [note('unknown')],
     ...rows.length ? report.show({...data, heading}).filter(Boolean) : []);
+  for (const title of section.querySelectorAll('.title')) {
+    title.textContent = title.textContent === heading ? '' : title.textContent;
+  }
 }

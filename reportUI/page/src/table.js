@@ -1,5 +1,5 @@
 // Tables: sorted, filtered, cut to their first rows, with the CSV file and the paths to copy.
-import {copyText, copyable, h, shown, shownPlain} from './dom.js';
+import {copyText, copyable, h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
 
 const FIRST_ROWS = 10;
@@ -24,7 +24,9 @@ function barElement(share, content) {
 function pathElement(path) {
   const slash = path.lastIndexOf('/') + 1;
   const button = h('button', {class: 'copy', type: 'button', title: format.say('copy'),
-                              'aria-label': format.say('copyOf', {path: shownPlain(path)})}, '⧉');
+                              'aria-label': format.say('copyOf', {path: shownPlain(path)})},
+                   svg('svg', {viewBox: '0 0 16 16', 'aria-hidden': 'true'}, svg('path', {
+                     d: 'M5.5 5.5V2.5h8v8h-3M2.5 5.5h8v8h-8z'})));
   button.addEventListener('click', async () => {
     const said = button.querySelector('.said') ??
       button.appendChild(h('span', {class: 'said', role: 'status'}));
@@ -103,7 +105,7 @@ class Table {
     });
     this.element = h('div', {class: 'table'}, this.tools(csv), h(
       'div', {class: 'scroll', role: 'group', tabindex: 0, 'aria-label': caption},
-      h('table', {}, h('caption', {}, caption), h('thead', {}, h('tr', {}, ...this.headers)),
+      h('table', {}, h('caption', {class: 'unseen'}, caption), h('thead', {}, h('tr', {}, ...this.headers)),
         this.body)), this.more);
     this.body.addEventListener('keydown', event => this.move(event));
     this.body.querySelector('.size')?.setAttribute('tabindex', 0);
@@ -124,7 +126,8 @@ class Table {
   }
 
   tools(csv) {
-    const tools = h('div', {class: 'tools'});
+    const tools = h('div', {class: 'tools'},
+                    h('span', {class: 'title', 'aria-hidden': 'true'}, this.caption));
     if (this.rows.length >= FILTER_FROM) {
       this.filter = h('input', {type: 'search', placeholder: format.say('filter'),
                                 'aria-label': format.say('filterLabel', {name: this.caption})});

@@ -85,7 +85,7 @@ function gauge({percent, state}) {
   return svg('svg', {class: `gauge ${state}`, viewBox: '-46 -46 92 76', 'aria-hidden': 'true'},
              svg('path', {class: 'track', d: piece.endAngle(2.2)()}),
              svg('path', {class: 'value', d: piece.endAngle(-2.2 + 4.4 * share)()}),
-             svg('text', {y: 7}, format.percent(percent)));
+             svg('text', {y: 7}, format.percent(percent, 0)));
 }
 
 export function card(volume) {
@@ -102,9 +102,9 @@ export function card(volume) {
 
 // --- History ------------------------------------------------------------------------------------
 
-const WIDTH = 960, HEIGHT = 300, LEFT = 52, RIGHT = 170, TOP = 18, BOTTOM = 28, LABEL_HEIGHT = 16;
+const WIDTH = 1180, HEIGHT = 320, LEFT = 56, RIGHT = 12, TOP = 18, BOTTOM = 28, LABEL_HEIGHT = 17;
 
-// Labels at the lines' ends, pushed apart so that none covers another.
+// Labels beside the newest samples, pushed apart so that none covers another.
 function spread(labels) {
   labels.sort((one, two) => one.y - two.y);
   labels.forEach((label, i) => {
@@ -130,9 +130,9 @@ function drawHistory(volumes) {
   const now = Math.max(...volumes.map(({samples}) => samples[0].date));
   const first = Math.min(...dates, now - DAY);
   const days = volumes.map(({outlook}) => outlook.days).filter(count => count !== NEVER);
-  // The time to come takes at most as much room as the time that was.
-  const last = now + Math.max(
-    DAY / 2, days.length ? Math.min(Math.max(...days) * DAY * 1.05, now - first) : 0);
+  // The time to come gets room for the labels, and at most half as much as the time that was.
+  const past = now - first;
+  const last = now + Math.min(Math.max(past / 4, Math.max(0, ...days) * DAY * 1.05), past / 2);
   const wall = format.wallClock;
   const x = scaleUtc([wall(first), wall(last)], [LEFT, WIDTH - RIGHT]);
   const y = scaleLinear([0, 100], [HEIGHT - BOTTOM, TOP]);
@@ -157,24 +157,21 @@ function drawHistory(volumes) {
     svg('line', {class: 'today', x1: x(wall(now)), x2: x(wall(now)), y1: TOP, y2: y(0)}),
     svg('text', {class: 'mark', x: x(wall(now)) - 5, y: y(0) - 6, 'text-anchor': 'end'},
         format.say('today')));
-  const labels = volumes.map((volume, index) => {
-    const group = drawing.appendChild(svg('g', {class: `line series${index % 8}`}));
+  const labels = volumes.map(volume => {
+    const group = drawing.appendChild(svg('g', {class: `line series${format.seriesOf(volume.name)}`}));
     group.append(svg('path', {d: path(volume.samples)}));
     const [newest] = volume.samples;
-    let end = newest;
     if (volume.outlook.days !== NEVER && volume.percent < 100) {
-      end = forecastEnd(volume, now, last);
-      group.append(svg('path', {class: 'forecast', d: path([newest, end])}));
+      group.append(svg('path', {
+        class: 'forecast', d: path([newest, forecastEnd(volume, now, last)])}));
     }
     group.append(svg('circle', {r: 3.5, cx: x(wall(newest.date)), cy: y(newest.percent)}));
-    return {group, volume, x: x(wall(end.date)), y: y(end.percent)};
+    return {group, volume, y: y(newest.percent)};
   });
-  for (const {group, volume, at, x: endX, y: endY} of spread(labels)) {
-    const start = WIDTH - RIGHT + 10;
-    group.append(
-      svg('path', {class: 'lead', d: `M${endX + 2},${endY}L${start - 3},${at}`}),
-      svg('text', {x: start, y: at + 4}, svg('title', {}, shownPlain(volume.name)),
-          cut(shownPlain(volume.name), 20)));
+  for (const {volume, at} of spread(labels)) {
+    drawing.append(svg('text', {class: 'label', x: x(wall(now)) + 10, y: at + 4},
+                       svg('title', {}, shownPlain(volume.name)),
+                       cut(shownPlain(volume.name), 24)));
   }
   return drawing;
 }
@@ -211,7 +208,6 @@ export function history(volumes, hasHistory) {
     }
   };
   details.addEventListener('toggle', fill, {once: true});
-  window.addEventListener('beforeprint', fill, {once: true});
   return [h('p', {class: 'lead'}, format.say('historyText')),
           h('div', {class: 'scroll', role: 'group', tabindex: 0,
                     'aria-label': format.say('history')}, drawHistory(drawn)), details];
