@@ -1,16 +1,17 @@
 # shellcheck shell=bash disable=SC2034
 # The Debian packages that the project needs, and how they get onto a machine. Sourced.
 
-# To build and to try the product.
+# To build, try and package the product.
 build_packages=(
   g++ cmake ninja-build pkg-config
   libsqlite3-dev libcurl4-openssl-dev libmount-dev libssl-dev libxxhash-dev
   libcli11-dev nlohmann-json3-dev
-  bubblewrap
+  bubblewrap dpkg-dev
 )
 # Besides those, to run all tests. (CMake looks for GoogleTest only when tests are built.)
 test_packages=(
   libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota samba-common-bin
+  lintian systemd systemd-container
 )
 
 # npm bundles the page. Where it came with another Node.js, Debian's stays away: they conflict.
