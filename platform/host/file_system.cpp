@@ -9,6 +9,7 @@
 #include <unordered_map>
 
 #include "mounts.hpp"
+#include "shares.hpp"
 
 namespace host {
 namespace {
@@ -84,6 +85,10 @@ VornFsKind kind_of_name(std::string_view type) {
   return VORN_FS_OTHER;
 }
 
+VornFsKind kind_in_walk(VornFsKind kind, std::string_view path) {
+  return kind == VORN_FS_REMOTE && is_in_network_share(path) ? VORN_FS_CLUSTER : kind;
+}
+
 }  // namespace host
 
 int VORNGetFSType(const char* path, int flags) try {
@@ -97,7 +102,8 @@ int VORNGetFSType(const char* path, int flags) try {
   }
   // Signed and of another width on some machines; the numbers are 32 bits everywhere.
   const auto magic = static_cast<unsigned long>(found.f_type) & 0xFFFFFFFFUL;
-  return magic == host::kFuseMagic ? host::fuse_kind(path) : host::kind_of_magic(magic);
+  return host::kind_in_walk(
+      magic == host::kFuseMagic ? host::fuse_kind(path) : host::kind_of_magic(magic), path);
 } catch (...) {
   errno = ENOMEM;
   return -1;

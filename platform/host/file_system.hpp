@@ -14,6 +14,10 @@ VornFsKind kind_of_magic(unsigned long magic);
 // The kind for a type of the mount table ("ext4", "fuse.glusterfs").
 VornFsKind kind_of_name(std::string_view type);
 
+// The kind that the walk of a share is told for `path`, which is on a file system of `kind`: on the
+// network it counts as a cluster's when the share is walked there too.
+VornFsKind kind_in_walk(VornFsKind kind, std::string_view path);
+
 // Whether files on such a file system are counted.
 constexpr bool is_walked(VornFsKind kind) {
   return kind != VORN_FS_OTHER && kind != VORN_FS_REMOTE;

@@ -1,5 +1,7 @@
 #include "shares.hpp"
 
+#include <strings.h>
+
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
@@ -51,8 +53,21 @@ bool is_number(std::string_view text) {
   return text.empty();
 }
 
-Share make_share(const std::string& name, const VLIBCSzHash& section) {
-  Share share{name, {}, {}, {}};
+// Whether the section says that the share is walked on network file systems.
+bool wants_network(const std::string& name, const VLIBCSzHash& section, const char* file) {
+  const char* value = section.find("network");
+  const bool wanted = value != nullptr && strcasecmp(value, "yes") == 0;
+  if (value != nullptr && *value != '\0' && !wanted && strcasecmp(value, "no") != 0) {
+    log_line(
+        "share \"%s\": network \"%.80s\" is neither yes nor no, so it counts as no; correct it in "
+        "%s",
+        name.c_str(), value, file);
+  }
+  return wanted;
+}
+
+Share make_share(const std::string& name, const VLIBCSzHash& section, const char* file) {
+  Share share{name, {}, {}, {}, wants_network(name, section, file)};
   const char* path = section.find("path");
   std::string_view folder = path == nullptr ? "" : path;
   if (const char* error = share_path_error(folder); error != nullptr) {
@@ -66,6 +81,13 @@ Share make_share(const std::string& name, const VLIBCSzHash& section) {
   if (const char* index = section.find("file_index"); index != nullptr) {
     share.file_index = index;
   }
+  return share;
+}
+
+// The share whose folder was asked for last: a run walks one share after another, and asks for each
+// folder when it comes to it.
+const Share*& share_in_walk() {
+  static const Share* share = nullptr;
   return share;
 }
 
@@ -156,13 +178,22 @@ std::optional<std::vector<Share>> load_shares(const char* file) {
     VLIBCSzHash section(0);
     VLIBCSzHash* filled = &section;
     if (VLIBCFileGetSection(file, name.c_str(), &filled) >= 0) {
-      shares.push_back(make_share(name, section));
+      shares.push_back(make_share(name, section, file));
     } else {
       log_line("share \"%s\" is left out of every report until its section in %s is corrected",
                name.c_str(), file);
     }
   }
   return shares;
+}
+
+bool is_in_network_share(std::string_view path) {
+  const Share* share = share_in_walk();
+  if (share == nullptr || !share->network || !path.starts_with(share->path)) {
+    return false;
+  }
+  const std::string_view rest = path.substr(share->path.size());
+  return rest.empty() || rest.front() == '/' || share->path == "/";
 }
 
 const std::vector<Share>* all_shares() {
@@ -204,6 +235,7 @@ int VORNSharePathGet(const char* share, char* path, size_t size) try {
     errno = EINVAL;
     return -1;
   }
+  host::share_in_walk() = found;
   return host::copy_out(found->path, path, size);
 } catch (...) {
   errno = ENOMEM;

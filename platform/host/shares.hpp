@@ -14,6 +14,7 @@ struct Share {
   std::string path;        // empty when it can't be worked with
   std::string path_error;  // then, what is wrong with it and what to do
   std::string file_index;  // empty when the share keeps none
+  bool network = false;    // walk it on a network file system too
 };
 
 // Why `name` can't be the name of a share ("it holds a comma"), or null.
@@ -25,6 +26,10 @@ const char* share_path_error(std::string_view path);
 // The shares of `file` in its order. One log line for each that is left out (a bad name, a
 // malformed section). Nothing when the file can't be read (logged).
 std::optional<std::vector<Share>> load_shares(const char* file);
+
+// Whether `path` lies in the share that is being walked (the one whose folder was asked for last),
+// and that share is walked on network file systems too.
+bool is_in_network_share(std::string_view path);
 
 // The server's shares, read once in the life of the process; null when that failed.
 const std::vector<Share>* all_shares();

@@ -18,6 +18,7 @@
 #include "host_log.hpp"
 #include "shares.hpp"
 #include "text_containers.hpp"
+#include "vorn/paths.h"
 #include "vorn/volume.h"
 
 namespace host {
@@ -205,7 +206,38 @@ Records measure_volumes() {
   return first;
 }
 
+// One line for a share that adds nothing to any report.
+void tell_unwalked(const Share& share, const Mount& mount) {
+  if (mount.kind == VORN_FS_REMOTE) {
+    log_line(
+        "share \"%s\" is left out: %s is on a network file system (%s); write network = yes in its "
+        "section in %s to walk it all the same",
+        share.name.c_str(), share.path.c_str(), mount.type.c_str(), VORN_PATH_SHARES);
+  } else {
+    log_line("share \"%s\": %s is on a file system that is not walked (%s); it adds nothing",
+             share.name.c_str(), share.path.c_str(), mount.type.c_str());
+  }
+}
+
 }  // namespace
+
+void add_volume_paths(const ServerVolumes& server, const std::vector<Share>& shares,
+                      VLIBCSzHash& hash) {
+  for (const Share& share : shares) {
+    const Volume* volume = server.holding(share.path.c_str());
+    if (volume != nullptr) {
+      hash.set(share.name, volume->path);
+    } else if (const Mount* mount = mount_holding(server.mounts, share.path.c_str());
+               mount != nullptr && !is_walked(mount->kind)) {
+      if (mount->kind == VORN_FS_REMOTE && share.network) {
+        hash.set(share.name, mount->target);
+      } else {
+        tell_unwalked(share, *mount);
+      }
+    }
+  }
+}
+
 }  // namespace host
 
 VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int /*selector*/) try {
@@ -241,17 +273,7 @@ int VornQazGetVolumePathHash(VLIBCSzHash** hash) try {
   const host::ErrnoKeeper keeper;  // a share whose folder is gone is left out: no failure
   const host::ServerVolumes server = host::read_volumes();
   auto result = std::make_unique<VLIBCSzHash>(shares->size());
-  for (const host::Share& share : *shares) {
-    const host::Volume* volume = server.holding(share.path.c_str());
-    if (volume != nullptr) {
-      result->set(share.name, volume->path);
-    } else if (const host::Mount* mount = host::mount_holding(server.mounts, share.path.c_str());
-               mount != nullptr && !host::is_walked(mount->kind)) {
-      host::log_line(
-          "share \"%s\": %s is on a file system that is not walked (%s); it adds nothing",
-          share.name.c_str(), share.path.c_str(), mount->type.c_str());
-    }
-  }
+  host::add_volume_paths(server, *shares, *result);
   *hash = result.release();
   return 0;
 } catch (...) {

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "mounts.hpp"
+#include "shares.hpp"
 
 namespace host {
 
@@ -39,6 +40,11 @@ struct ServerVolumes {
 
 // The volumes of this server; its shares are taken into account.
 ServerVolumes read_volumes();
+
+// Adds each share's volume to `hash`, as VornQazGetVolumePathHash. One log line for each share that
+// is left out of every report, since its file system is not walked.
+void add_volume_paths(const ServerVolumes& server, const std::vector<Share>& shares,
+                      VLIBCSzHash& hash);
 
 // Whether `path` has one of the lengths at which the program's records cut a mount path.
 constexpr bool may_be_cut(std::string_view path) {

@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include "file_system.hpp"
 #include "support.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
@@ -55,6 +56,29 @@ TEST(Shares, AreReadWithTheirPathsAndIndexes) {
     EXPECT_EQ(0, VORNShareFileIndexDBPathGet("indexed", path, sizeof path));
     EXPECT_STREQ("/var/i.db", path);
     EXPECT_EQ(-1, VORNShareFileIndexDBPathGet("badindex", path, sizeof path));
+  }));
+}
+
+TEST(Shares, AreWalkedOnTheNetworkWhenTheySaySo) {
+  support::write_file(VORN_PATH_SHARES,
+                      "[nas]\npath = /mnt/nas\nnetwork = Yes\n[local]\npath = /mnt\nnetwork = no\n"
+                      "[odd]\npath = /mnt/nas\nnetwork = 1\n[all]\npath = /\nnetwork = yes\n");
+  EXPECT_TRUE(support::passes_in_child([] {  // since the file is read once
+    EXPECT_EQ(VORN_FS_REMOTE, host::kind_in_walk(VORN_FS_REMOTE, "/mnt/nas")) << "no share yet";
+    const struct {
+      const char* share;
+      const char* path;
+      bool is_walked;
+    } cases[] = {{"nas", "/mnt/nas", true},   {"nas", "/mnt/nas/deep", true},
+                 {"nas", "/mnt/nas2", false}, {"local", "/mnt/nas", false},
+                 {"odd", "/mnt/nas", false},  {"all", "/mnt/nas", true}};
+    char path[4096];
+    for (const auto& [share, asked, is_walked] : cases) {
+      EXPECT_EQ(0, VORNSharePathGet(share, path, sizeof path));
+      EXPECT_EQ(is_walked, host::is_walked(host::kind_in_walk(VORN_FS_REMOTE, asked))) << asked;
+      EXPECT_EQ(VORN_FS_OTHER, host::kind_in_walk(VORN_FS_OTHER, asked));
+    }
+    EXPECT_NE(std::string::npos, support::syslog_text().find("neither yes nor no"));
   }));
 }
 

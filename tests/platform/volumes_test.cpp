@@ -7,6 +7,7 @@
 
 #include "file_system.hpp"
 #include "support.hpp"
+#include "text_containers.hpp"
 #include "vorn/volume.h"
 
 namespace {
@@ -35,8 +36,17 @@ TEST(FileSystemKind, FollowsStatfsAndTheMountTable) {
   for (const auto& [magic, kind] : magics) {
     EXPECT_EQ(kind, host::kind_of_magic(magic)) << std::hex << magic;
   }
-  EXPECT_EQ(VORN_FS_CLUSTER, host::kind_of_name("fuse.glusterfs"));
-  EXPECT_EQ(VORN_FS_OTHER, host::kind_of_name("fuse.sshfs"));
+  const std::pair<const char*, int> names[] = {{"fuse.glusterfs", VORN_FS_CLUSTER},
+                                               {"fuse.ceph-fuse", VORN_FS_CLUSTER},
+                                               {"ceph", VORN_FS_CLUSTER},
+                                               {"nfs", VORN_FS_REMOTE},
+                                               {"nfs4", VORN_FS_REMOTE},
+                                               {"cifs", VORN_FS_REMOTE},
+                                               {"smb3", VORN_FS_REMOTE},
+                                               {"fuse.sshfs", VORN_FS_OTHER}};
+  for (const auto& [name, kind] : names) {
+    EXPECT_EQ(kind, host::kind_of_name(name)) << name;
+  }
 }
 
 TEST(Volumes, AreTheDevicesOfTheMountTable) {
@@ -68,6 +78,23 @@ TEST(Volumes, OfAContainerAreWhereTheSharesAre) {
   EXPECT_EQ((std::vector<std::string>{"/", "/etc"}), paths_of(host::choose_volumes(mounts)));
   mounts[2].holds_share = true;
   EXPECT_EQ((std::vector<std::string>{"/", "/srv/share"}), paths_of(host::choose_volumes(mounts)));
+}
+
+TEST(Volumes, OfTheNetworkAreThoseOfSharesThatSaySo) {
+  const support::TempFolder folder;
+  const host::ServerVolumes server = {
+      mounts_of("9998 1 0:90 / / rw - overlay overlay rw\n9999 9998 0:50 / " + folder.path() +
+                " rw - nfs4 server:/x rw\n"),
+      {}};
+  const std::vector<host::Share> shares = {{"local", folder.path(), {}, {}, false},
+                                           {"remote", folder.path(), {}, {}, true}};
+  const support::Hash hash = support::make_hash();
+  host::add_volume_paths(server, shares, *hash);
+  EXPECT_EQ(nullptr, VLIBCSzHashGetValue(hash.get(), "local"));
+  EXPECT_STREQ(folder.path().c_str(), VLIBCSzHashGetValue(hash.get(), "remote"));
+  const std::string log = support::syslog_text();
+  EXPECT_TRUE(log.starts_with("share \"local\" is left out")) << log;
+  EXPECT_NE(std::string::npos, log.find("write network = yes")) << log;
 }
 
 TEST(VolumeId, IsSafeShortAndUnique) {

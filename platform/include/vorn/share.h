@@ -44,8 +44,10 @@ enum VornFsKind {
   VORN_FS_CLUSTER = 6  // CephFS, GlusterFS, Lustre, GPFS, OCFS2, GFS2
 };
 
-// The kind of the file system that holds `path` (a VornFsKind), or -1 when it can't be told.
-// `flags` must be 0.
+// The kind of the file system that holds `path` (a VornFsKind), or -1 when it can't be told. Within
+// the share whose folder was asked for last (VORNSharePathGet), a network file system is of the
+// kind VORN_FS_CLUSTER when the share's section says `network = yes`, so that it is walked. `flags`
+// must be 0.
 int VORNGetFSType(const char* path, int flags);
 
 #ifdef __cplusplus

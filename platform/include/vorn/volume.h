@@ -31,7 +31,8 @@ VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int selector);
 void VORNMountVolInfoFree(VORNMountVolInfo* volumes);
 
 // Makes `*hash` (freed by the caller): share name to the mount path of the volume that holds the
-// share's folder. A share whose folder doesn't exist is left out. 0, or -1 with `*hash` null.
+// share's folder (of a share with `network = yes` also a network file system, which is no volume of
+// the enumeration). A share whose folder doesn't exist is left out. 0, or -1 with `*hash` null.
 int VornQazGetVolumePathHash(VLIBCSzHash** hash);
 
 // Writes the identifier of the volume mounted at `mount_path`: a short text, the same from run to
