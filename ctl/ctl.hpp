@@ -40,7 +40,10 @@ void add_schedule_command(CLI::App& app);
 void add_status_command(CLI::App& app);
 void add_reports_command(CLI::App& app);
 void add_doctor_command(CLI::App& app);
-void add_completion_command(CLI::App& app);
+
+// Prints what can stand in the place of the last of `words`, those behind the program's name; for
+// the shells' completion.
+void complete(const CLI::App& app, std::vector<std::string> words);
 
 // Adds "test-mail" to the group `profile`.
 void add_test_mail_command(CLI::App& profile);

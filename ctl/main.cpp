@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
+#include <string_view>
 
 #include "ctl.hpp"
 
@@ -23,6 +24,12 @@ void run(int argc, char** argv) {
   ctl::add_schedule_command(app);
   ctl::add_status_command(app);
   ctl::add_reports_command(app);
+
+  // Hidden, and asked for before anything is parsed: what it is asked about is no command yet.
+  if (argc > 1 && std::string_view(argv[1]) == "complete") {
+    ctl::complete(app, {argv + 2, argv + argc});
+    return;
+  }
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
@@ -58,7 +65,7 @@ int fail(const char* message, int exit_code) {
 
 int main(int argc, char** argv) try {
   std::setlocale(LC_CTYPE, "C.UTF-8");
-  unsetenv("TZ");  // runs and cron have the system's time zone, so times are told in it
+  unsetenv("TZ");             // runs and cron have the system's time zone, so times are told in it
   ctl::take_host_messages();  // from here on they are collected
   run(argc, argv);
   return finish();

@@ -17,7 +17,7 @@ class Sources(unittest.TestCase):
         for folder, folders, names in os.walk(ROOT):
             folders[:] = [f for f in folders if not f.startswith(('build', '.git', 'quickstart-'))]
             for path in (Path(folder, name) for name in names):
-                if path.suffix == '.sh' or re.match(rb'#!/bin/(ba)?sh\b', path.read_bytes()):
+                if path.suffix in ('.sh', '.bash') or re.match(rb'#!/bin/(ba)?sh\b', path.read_bytes()):
                     scripts.append(path)
         self.assertGreater(len(scripts), 4)
         done = subprocess.run(['shellcheck', '-x', *scripts], cwd=ROOT, text=True,

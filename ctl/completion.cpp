@@ -1,0 +1,161 @@
+// vornctl complete: what can stand at a place of the command line, for the shells' completion.
+#include <algorithm>
+#include <memory>
+
+#include "checks.hpp"
+#include "config.hpp"
+#include "ctl.hpp"
+
+namespace ctl {
+namespace {
+
+using Words = std::vector<std::string>;
+
+// The values that a name or type of ctl.hpp stands for. FOLDER and FILE are the shell's own; they
+// are answered by a line that no name can be.
+Words values_of(const std::string& kind) {
+  Words words;
+  if (kind == "PROFILE") {
+    for (const Section& profile : read_profiles()) {
+      words.push_back(profile.name);
+    }
+  } else if (kind == "SHARE" || kind == "SHARES") {
+    for (const host::Share& share : read_shares()) {
+      words.push_back(share.name);
+    }
+  } else if (kind == "REPORTS") {
+    words = report_names();
+  } else if (kind == "LANGUAGE") {
+    words = installed_languages();
+  } else if (kind == "KEY") {
+    for (const ProfileKey& key : profile_keys()) {
+      words.emplace_back(key.name);
+    }
+  } else if (kind == "FOLDER" || kind == "FILE") {
+    words = {kind == "FOLDER" ? "/folders" : "/files"};
+  } else if (kind.find('|') != std::string::npos) {
+    for (std::size_t start = 0; start <= kind.size();) {
+      const std::size_t end = std::min(kind.find('|', start), kind.size());
+      words.push_back(kind.substr(start, end - start));
+      start = end + 1;
+    }
+  }
+  return words;
+}
+
+// The words of a list are completed one by one.
+Words list_values(const std::string& kind, const std::string& current) {
+  Words words = values_of(kind);
+  const std::size_t comma = current.rfind(',');
+  if ((kind == "SHARES" || kind == "REPORTS") && comma != std::string::npos) {
+    for (std::string& word : words) {
+      word.insert(0, current, 0, comma + 1);
+    }
+  }
+  return words;
+}
+
+bool takes_value(const CLI::Option& option) {
+  return option.get_items_expected_max() > 0;
+}
+
+// How far the words before the current one lead.
+struct Place {
+  const CLI::App* command = nullptr;
+  const CLI::Option* waiting = nullptr;  // an option that wants its value
+  std::size_t positionals = 0;
+};
+
+Place place_of(const CLI::App& app, const Words& before) {
+  Place place{&app};
+  for (const std::string& word : before) {
+    if (place.waiting != nullptr) {
+      place.waiting = nullptr;
+    } else if (word.starts_with('-')) {
+      const CLI::Option* option = place.command->get_option_no_throw(word);
+      place.waiting = option != nullptr && takes_value(*option) ? option : nullptr;
+    } else {
+      const auto commands = place.command->get_subcommands({});
+      const auto found =
+          std::find_if(commands.begin(), commands.end(),
+                       [&](const CLI::App* command) { return command->get_name() == word; });
+      if (found != commands.end()) {
+        place.command = *found;
+      } else {
+        ++place.positionals;
+      }
+    }
+  }
+  return place;
+}
+
+std::string type_of_key(const std::string& name) {
+  for (const ProfileKey& key : profile_keys()) {
+    if (key.name == name) {
+      return key.type;
+    }
+  }
+  return "";
+}
+
+Words positional_values(const Place& place, const std::string& previous,
+                        const std::string& current) {
+  Words kinds;
+  for (const CLI::Option* option : place.command->get_options()) {
+    if (option->get_positional()) {
+      kinds.push_back(option->get_name(true));
+    }
+  }
+  std::size_t index = place.positionals;
+  if (place.command->get_allow_extras() && kinds.size() >= 2) {
+    while (index >= kinds.size()) {
+      index -= 2;  // further pairs of key and value
+    }
+  }
+  if (index >= kinds.size()) {
+    return {};
+  }
+  return list_values(kinds[index] == "VALUE" ? type_of_key(previous) : kinds[index], current);
+}
+
+Words candidates(const CLI::App& app, const Words& before, const std::string& current) {
+  const Place place = place_of(app, before);
+  if (place.waiting != nullptr) {
+    return list_values(place.waiting->get_type_name(), current);
+  }
+  Words words;
+  if (current.starts_with('-')) {
+    for (const CLI::Option* option : place.command->get_options()) {
+      for (const std::string& name : option->get_lnames()) {
+        words.push_back("--" + name);
+      }
+    }
+    return words;
+  }
+  for (const CLI::App* command : place.command->get_subcommands({})) {
+    if (!command->get_group().empty()) {
+      words.push_back(command->get_name());
+    }
+  }
+  return words.empty() ? positional_values(place, before.empty() ? "" : before.back(), current)
+                       : words;
+}
+
+}  // namespace
+
+void complete(const CLI::App& app, std::vector<std::string> words) try {
+  const std::string current = words.empty() ? "" : words.back();
+  if (!words.empty()) {
+    words.pop_back();
+  }
+  for (const std::string& candidate : candidates(app, words, current)) {
+    if (candidate.starts_with(current) || candidate == "/files" || candidate == "/folders") {
+      print_line(candidate);
+    }
+  }
+  take_host_messages();  // nobody wants to read them in the middle of a command line
+} catch (const Failure&) {
+  take_host_messages();
+}
+
+}  // namespace ctl
