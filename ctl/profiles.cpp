@@ -285,6 +285,7 @@ void add_profile_commands(CLI::App& app) {
   describe_list_and_show(group);
   describe_set(group);
   describe_remove(group);
+  add_test_mail_command(group);
 }
 
 }  // namespace ctl
