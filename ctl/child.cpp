@@ -125,22 +125,4 @@ void Child::send_signal(int signal) const {
   }
 }
 
-Finished run_program(const std::vector<std::string>& arguments, std::chrono::milliseconds limit) {
-  using Clock = std::chrono::steady_clock;
-  constexpr std::chrono::milliseconds kStep{50};
-  constexpr std::size_t kLongestOutput = 1U << 20U;
-  Child child(arguments);
-  Finished finished;
-  const auto deadline = Clock::now() + limit;
-  while (!child.has_ended() && Clock::now() < deadline && finished.output.size() < kLongestOutput) {
-    finished.output += child.read_output(kStep);
-  }
-  finished.exit_status = child.has_ended() ? child.exit_status() : -1;
-  for (std::string more = "x"; finished.exit_status >= 0 && !more.empty();) {
-    more = child.read_output(std::chrono::milliseconds(0));
-    finished.output += more;
-  }
-  return finished;
-}
-
 }  // namespace ctl

@@ -39,14 +39,6 @@ class Child {
   host::Fd output_;
 };
 
-// What a program that ends by itself within `limit` prints, and its exit status; -1 when it was
-// ended at the limit. As Child in all else.
-struct Finished {
-  int exit_status = 0;
-  std::string output;
-};
-Finished run_program(const std::vector<std::string>& arguments, std::chrono::milliseconds limit);
-
 }  // namespace ctl
 
 #endif

@@ -24,6 +24,7 @@ void run(int argc, char** argv) {
   ctl::add_schedule_command(app);
   ctl::add_status_command(app);
   ctl::add_reports_command(app);
+  ctl::add_doctor_command(app);
 
   // Hidden, and asked for before anything is parsed: what it is asked about is no command yet.
   if (argc > 1 && std::string_view(argv[1]) == "complete") {

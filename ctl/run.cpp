@@ -74,12 +74,14 @@ class ProgressLine {
                   static_cast<long long>(seconds % 60));
     winsize size{};
     const bool known = ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0;
-    std::fprintf(stderr, "\r\x1b[K%s",
-                 fitting(printable(text) + clock, known ? size.ws_col : 80U).c_str());
-    shown_ = true;
+    std::string line = fitting(printable(text) + clock, known ? size.ws_col : 80U);
+    if (line != shown_) {
+      std::fprintf(stderr, "\r\x1b[K%s", line.c_str());
+      shown_ = std::move(line);
+    }
   }
   void clear() {
-    if (std::exchange(shown_, false)) {
+    if (!std::exchange(shown_, {}).empty()) {
       std::fputs("\r\x1b[K", stderr);
     }
   }
@@ -97,7 +99,7 @@ class ProgressLine {
 
   const bool is_terminal_ = isatty(STDERR_FILENO) == 1;
   const Clock::time_point start_ = Clock::now();
-  bool shown_ = false;
+  std::string shown_;
 };
 
 // --- Starting -----------------------------------------------------------------------------------

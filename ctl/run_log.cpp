@@ -10,8 +10,8 @@
 #include <string_view>
 #include <thread>
 
-#include "child.hpp"
 #include "file_io.hpp"
+#include "process.hpp"
 
 namespace ctl {
 namespace {
@@ -37,10 +37,10 @@ std::vector<std::string> lines_of(std::string_view text) {
 
 std::string journal_of(pid_t pid) {
   constexpr std::chrono::seconds kLimit{5};
-  const Finished read = run_program({kJournalctl, "--quiet", "--no-pager", "--output=cat",
-                                     "--lines=5", "_PID=" + std::to_string(pid)},
-                                    kLimit);
-  return read.exit_status == 0 ? read.output : "";
+  const auto read = ask_program({kJournalctl, "--quiet", "--no-pager", "--output=cat", "--lines=5",
+                                 "_PID=" + std::to_string(pid)},
+                                kLimit);
+  return read && read->status == 0 ? read->out : "";
 }
 
 std::string text_behind(const std::string& file, off_t start) {

@@ -1,0 +1,136 @@
+// vornctl doctor: whether this machine has all that its runs need.
+#include "doctor.hpp"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <array>
+#include <csignal>
+#include <memory>
+#include <nlohmann/json.hpp>
+
+#include "ctl.hpp"
+#include "file_io.hpp"
+
+namespace ctl {
+namespace {
+
+const char* word_for(Level level) {
+  switch (level) {
+    case Level::ok:
+      return "ok";
+    case Level::warning:
+      return "warning";
+    case Level::error:
+      break;
+  }
+  return "error";
+}
+
+const char* sign_for(Level level) {
+  switch (level) {
+    case Level::ok:
+      return "✓";
+    case Level::warning:
+      return "!";
+    case Level::error:
+      break;
+  }
+  return "✗";
+}
+
+void print_as_json(const Findings& findings) {
+  auto array = nlohmann::ordered_json::array();
+  for (const Finding& finding : findings.all()) {
+    array.push_back({{"level", word_for(finding.level)},
+                     {"subject", finding.subject},
+                     {"text", finding.text},
+                     {"remedy", finding.remedy}});
+  }
+  print_json(array);
+}
+
+void print_as_lines(const Findings& findings) {
+  constexpr std::size_t kWordWidth = 8;
+  for (const Finding& finding : findings.all()) {
+    std::string word = word_for(finding.level);
+    word.resize(kWordWidth, ' ');
+    print_line(std::string(sign_for(finding.level)) + " " + word + finding.subject + ": " +
+               finding.text + (finding.remedy.empty() ? "" : "; " + finding.remedy));
+  }
+}
+
+void doctor(bool json) {
+  if (geteuid() != 0) {
+    throw Failure("only root sees what a run sees; run this as root");
+  }
+  Findings findings;
+  check_product(findings);
+  const Configuration configuration = check_configuration(findings);
+  check_shares(findings, configuration);
+  check_quota_tool(findings, configuration);
+  check_mail(findings, configuration);
+  check_space(findings, configuration);
+  check_clock(findings);
+  check_schedules(findings, configuration);
+  check_last_runs(findings, configuration);
+  take_host_messages();  // every one of them has a finding
+  json ? print_as_json(findings) : print_as_lines(findings);
+  const auto is_error = [](const Finding& finding) { return finding.level == Level::error; };
+  if (std::any_of(findings.all().begin(), findings.all().end(), is_error)) {
+    throw Failure("");  // the lines say it
+  }
+}
+
+}  // namespace
+
+void Findings::add(Level level, std::string subject, std::string text, std::string remedy) {
+  constexpr std::string_view kSeparator = "; ";
+  if (const std::size_t at = text.rfind(kSeparator); remedy.empty() && at != std::string::npos) {
+    remedy = text.substr(at + kSeparator.size());
+    text.resize(at);
+  }
+  all_.push_back({level, std::move(subject), std::move(text), std::move(remedy)});
+}
+
+std::optional<std::string> answer_within(std::chrono::milliseconds limit,
+                                         const std::function<std::string()>& ask) {
+  int ends[2];
+  if (pipe2(ends, O_CLOEXEC) != 0) {
+    return std::nullopt;
+  }
+  host::Fd reading(ends[0]);
+  host::Fd writing(ends[1]);
+  const pid_t child = fork();
+  if (child == 0) {
+    const std::string answer = ask();
+    _exit(host::write_all(writing.get(), answer + "\n") ? 0 : 1);
+  }
+  writing = host::Fd();
+  std::array<char, 4096> bytes{};
+  pollfd poller{reading.get(), POLLIN, 0};
+  ssize_t got = 0;
+  if (child > 0 && poll(&poller, 1, static_cast<int>(limit.count())) == 1) {
+    got = read(reading.get(), bytes.data(), bytes.size());
+  }
+  if (child > 0) {
+    // One that waits for a dead server can't even be killed, so nobody waits for its end.
+    kill(child, SIGKILL);
+    waitpid(child, nullptr, got > 0 ? 0 : WNOHANG);
+  }
+  return got > 0 ? std::optional(std::string(bytes.data(), static_cast<std::size_t>(got) - 1))
+                 : std::nullopt;
+}
+
+void add_doctor_command(CLI::App& app) {
+  auto json = std::make_shared<bool>(false);
+  CLI::App* command = app.add_subcommand("doctor", "Check everything that a run needs");
+  add_json_flag(*command, *json);
+  command->callback([json] { doctor(*json); });
+}
+
+}  // namespace ctl

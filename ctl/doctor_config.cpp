@@ -1,0 +1,160 @@
+// What the two configuration files say.
+#include <algorithm>
+#include <set>
+
+#include "checks.hpp"
+#include "config_file.hpp"
+#include "config_lines.hpp"
+#include "ctl.hpp"
+#include "doctor.hpp"
+#include "vorn/paths.h"
+
+namespace ctl {
+namespace {
+
+// The platform's messages and vornctl's failures end in what to do.
+void add_failure(Findings& findings, const std::string& subject, const std::string& message) {
+  findings.add(Level::error, subject, message);
+}
+
+// The sections of `file`, those with a broken line included. Every line that can't be understood
+// is an error, because a run does without the whole section.
+std::vector<Section> check_lines(Findings& findings, const char* file) {
+  std::vector<Section> sections;
+  const std::optional<std::string> text = host::read_config(file);
+  if (!text) {
+    add_failure(findings, file, host_failure("can't be read").what());
+    return sections;
+  }
+  std::set<std::string_view> names;
+  std::set<std::string_view> keys;
+  std::size_t number = 0;
+  std::size_t wrong = 0;
+  for (const host::ConfigLine& line : host::parse_lines(*text)) {
+    ++number;
+    const char* problem = line.problem;
+    if (line.kind == host::LineKind::header) {
+      keys.clear();
+      problem = names.insert(line.name).second ? nullptr : "a section of this name stands above";
+      sections.push_back({std::string(line.name), {}});
+    } else if (line.kind == host::LineKind::entry) {
+      problem = keys.insert(line.name).second ? nullptr : "this key stands in the section twice";
+      if (sections.empty()) {
+        problem = "it stands above every section";
+      } else {
+        sections.back().entries.emplace_back(line.name, line.value);
+      }
+    }
+    if (problem != nullptr) {
+      ++wrong;
+      findings.add(Level::error, file, "line " + std::to_string(number) + ": " + problem,
+                   "correct the line");
+    }
+  }
+  if (wrong == 0) {
+    findings.ok(
+        file, std::to_string(sections.size()) + (sections.size() == 1 ? " section" : " sections"));
+  }
+  return sections;
+}
+
+// The number of findings.
+int check_entry(Findings& findings, const std::string& subject, const std::string& key,
+                const std::string& value) {
+  const auto keys = profile_keys();
+  if (std::none_of(keys.begin(), keys.end(),
+                   [&](const auto& known) { return known.name == key; })) {
+    std::vector<std::string> names;
+    for (const ProfileKey& known : keys) {
+      names.emplace_back(known.name);
+    }
+    const std::string near = suggestion(key, names);
+    findings.add(Level::warning, subject, "the key " + key + " means nothing",
+                 near.empty() ? "remove it" : near.substr(2));
+    return 1;
+  }
+  try {
+    checked_value(profile_key(key), value);
+    return 0;
+  } catch (const Failure& failure) {
+    add_failure(findings, subject, failure.what());
+    return 1;
+  }
+}
+
+void check_profile(Findings& findings, const Section& section) {
+  const std::string subject = section.name == "global" ? "whole server" : "profile " + section.name;
+  int problems = 0;
+  for (const auto& [key, value] : section.entries) {
+    problems += check_entry(findings, subject, key, value);
+    take_host_messages();  // those about other sections have findings of their own
+  }
+  const std::string reports = section.value("report_list");
+  if (reports.empty()) {
+    findings.add(Level::error, subject, "it selects no report",
+                 "run vornctl profile set " + section.name + " report_list share_list,large_file");
+  } else if (problems == 0) {
+    findings.ok(subject, reports);
+  }
+}
+
+void check_share_section(Findings& findings, const Section& section,
+                         const std::vector<host::Share>& shares) {
+  const std::string subject = "share " + section.name;
+  if (const std::string problem = share_name_problem(section.name); !problem.empty()) {
+    findings.add(Level::error, subject, "it is left out: " + problem, "rename its section");
+    return;
+  }
+  const std::vector<std::string> known{"path", "file_index", "network"};
+  for (const auto& [key, value] : section.entries) {
+    if (std::find(known.begin(), known.end(), key) == known.end()) {
+      const std::string near = suggestion(key, known);
+      findings.add(Level::warning, subject, "the key " + key + " means nothing",
+                   near.empty() ? "remove it" : near.substr(2));
+    }
+  }
+  for (const host::Share& share : shares) {
+    if (share.name == section.name && !share.path_error.empty()) {
+      findings.add(Level::error, subject, share.path_error);
+    }
+  }
+}
+
+}  // namespace
+
+Configuration check_configuration(Findings& findings) {
+  Configuration configuration;
+  bool collects = false;
+  for (Section& section : check_lines(findings, VORN_PATH_CONFIG)) {
+    if (section.name == "global") {
+      collects = true;
+      check_profile(findings, section);
+      continue;
+    }
+    try {
+      check_profile_name(section.name);
+    } catch (const Failure& failure) {
+      add_failure(findings, "profile " + section.name, failure.what());
+      continue;
+    }
+    check_profile(findings, section);
+    configuration.profiles.push_back(std::move(section));
+  }
+  if (!collects) {
+    findings.add(Level::warning, "whole server", "without a section [global] no history is kept",
+                 "write [global] and report_list = volume_usage into " VORN_PATH_CONFIG);
+  }
+  const std::vector<Section> sections = check_lines(findings, VORN_PATH_SHARES);
+  configuration.shares = host::load_shares(VORN_PATH_SHARES).value_or(std::vector<host::Share>{});
+  for (const Section& section : sections) {
+    check_share_section(findings, section, configuration.shares);
+  }
+  if (configuration.shares.empty()) {
+    findings.add(Level::warning, "shares", "there are none, so reports on files are empty",
+                 "run vornctl share add NAME PATH");
+  }
+  take_host_messages();  // those lines have their findings
+  return configuration;
+}
+
+}  // namespace ctl

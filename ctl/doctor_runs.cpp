@@ -1,0 +1,120 @@
+// How runs are started, and what the last ones have left.
+#include <unistd.h>
+
+#include <algorithm>
+#include <exception>
+#include <filesystem>
+#include <fstream>
+
+#include "cron_times.hpp"
+#include "ctl.hpp"
+#include "doctor.hpp"
+#include "profile_state.hpp"
+#include "run_paths.hpp"
+#include "schedules.hpp"
+
+namespace ctl {
+namespace {
+
+bool cron_is_running() {
+  std::error_code error;
+  for (const auto& process : std::filesystem::directory_iterator("/proc", error)) {
+    std::ifstream file(process.path() / "comm");
+    std::string name;
+    if (std::getline(file, name) && (name == "cron" || name == "crond")) {
+      return true;
+    }
+  }
+  return false;
+}
+
+void check_job(Findings& findings, const Job& job, const Configuration& configuration) {
+  const std::string subject = "schedule " + job.file;
+  const auto& profiles = configuration.profiles;
+  const bool known = job.profile == "global" ||
+                     std::any_of(profiles.begin(), profiles.end(), [&](const Section& profile) {
+                       return profile.name == job.profile;
+                     });
+  if (!known) {
+    findings.add(Level::warning, subject, "profile " + job.profile + " doesn't exist",
+                 "remove the line");
+    return;
+  }
+  try {
+    const auto next = CronTimes(job.times).next(std::time(nullptr));
+    findings.ok(subject, std::string(option_of(job.kind)) + " " + job.profile + ", next at " +
+                             (next ? time_text(*next) : "the machine's start"));
+  } catch (const std::exception& wrong) {
+    findings.add(Level::error, subject, wrong.what(),
+                 "correct the line; cron leaves the whole file out");
+  }
+}
+
+// What a killed run has left; nothing about a report_dir that can't be worked with, which has its
+// finding.
+void check_leftovers(Findings& findings, const Section& profile) {
+  std::string folder;
+  try {
+    folder = report_folder(profile);
+  } catch (const Failure&) {
+    return;
+  }
+  const auto left = host::unfinished_reports(folder);
+  const std::string statistics = host::statistics_path(profile.name);
+  if (!left) {
+    findings.add(Level::error, "reports of " + profile.name,
+                 host_failure(folder + " can't be used; move it away").what());
+  } else if (!left->empty() || access(statistics.c_str(), F_OK) == 0) {
+    findings.add(Level::warning, "leftovers of " + profile.name,
+                 left->empty() ? statistics : left->front(),
+                 "the next run removes them, or " + std::string(kProgram) + " --clean " +
+                     profile.name + ", which removes the schedule as well");
+  }
+}
+
+}  // namespace
+
+void check_schedules(Findings& findings, const Configuration& configuration) {
+  const std::vector<Job> jobs = scheduled_jobs();
+  std::string checked;
+  for (const Job& job : jobs) {
+    check_job(findings, job, configuration);
+    if (const std::string problem = cron_file_problem(job.file);
+        !problem.empty() && checked != job.file) {
+      findings.add(Level::error, "schedule " + job.file,
+                   "it " + problem + ", so cron leaves it out", "run vornctl schedule again");
+    }
+    checked = job.file;
+  }
+  for (const Section& profile : configuration.profiles) {
+    const std::string id = profile.value(kScheduleKey);
+    if (!id.empty() && access(cron_file(id).c_str(), F_OK) != 0) {
+      findings.add(Level::warning, "schedule of " + profile.name, cron_file(id) + " is missing",
+                   "run vornctl schedule " + profile.name + " with its times, or with --clean");
+    }
+  }
+  if (!jobs.empty() && cron_is_running()) {
+    findings.ok("cron", "it runs");
+  } else if (!jobs.empty()) {
+    findings.add(Level::error, "cron", "it does not run, so nothing is started",
+                 "install the package cron or start it: systemctl enable --now cron");
+  }
+}
+
+void check_last_runs(Findings& findings, const Configuration& configuration) {
+  for (const Section& profile : configuration.profiles) {
+    const std::string subject = "last run of " + profile.name;
+    const RunState state = run_state(profile.name);
+    if (state == RunState::failed || state == RunState::ended_early) {
+      findings.add(Level::warning, subject, word_for(state),
+                   "look into the system log, then run vornctl run " + profile.name);
+    } else {
+      findings.ok(subject, word_for(state));
+    }
+    if (state != RunState::running) {  // what it has begun is no left-over
+      check_leftovers(findings, profile);
+    }
+  }
+}
+
+}  // namespace ctl
