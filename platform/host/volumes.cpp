@@ -171,26 +171,32 @@ const std::string& known_cut_volume_id(const std::string& cut) {
   return entry->second;
 }
 
-std::optional<Space> measure(const std::string& path) {
+// Each device is measured once a run. A run stores a sample and then compares with it: measured
+// anew, what was written in between, over a second, would pass for the speed at which it fills up.
+std::optional<Space> measure(const Volume& volume) {
+  static std::map<dev_t, Space> known;
+  if (const auto before = known.find(volume.device); before != known.end()) {
+    return before->second;
+  }
   const ErrnoKeeper keeper;
   struct statvfs measured {};
   int result = -1;
   do {
-    result = statvfs(path.c_str(), &measured);
+    result = statvfs(volume.path.c_str(), &measured);
   } while (result != 0 && errno == EINTR);
   if (result != 0) {
     log_line("volume \"%s\" is left out, since it can't be measured (%s); see to its mount",
-             path.c_str(), std::strerror(errno));
+             volume.path.c_str(), std::strerror(errno));
     return std::nullopt;
   }
-  return space_of(measured);
+  return known.emplace(volume.device, space_of(measured)).first->second;
 }
 
 Records measure_volumes() {
   Records first;
   VORNMountVolInfo* last = nullptr;
   for (const Volume& volume : read_volumes().volumes) {
-    const std::optional<Space> space = volume.holds_data ? measure(volume.path) : std::nullopt;
+    const std::optional<Space> space = volume.holds_data ? measure(volume) : std::nullopt;
     if (!space) {
       continue;
     }
