@@ -1,6 +1,12 @@
-"""The command line and its actions."""
+"""The command line, its actions and the mail."""
+import email
+import email.policy
+import re
+import subprocess
+from fractions import Fraction
 
-from harness import PROGRAM, ProductTest, make_files, wait_for
+from expected import data_rows
+from harness import PROGRAM, ROOT, ProductTest, make_files, wait_for
 
 
 class CommandLine(ProductTest):
@@ -83,3 +89,44 @@ class Clean(ProductTest):
                 self.assertEqual({path.name for path in (self.m.vorn / 'var/stat').iterdir()},
                                  databases - stat | {'kept'})
                 self.assertEqual(self.m.config.read_bytes(), b''.join((parts | changed).values()))
+
+
+class Mail(ProductTest):
+    def test_the_mail_of_a_run(self):
+        files = {'a/same.bin': 3 << 20, 'b/same.bin': 3 << 20, 'c/same.bin': 3 << 20, 'a/x': 5}
+        make_files(self.m.share('photos'), files)
+        make_files(self.m.share('small'), {'y': 1024})
+        mails = self.m.base / 'mails'
+        mails.mkdir()
+        server = subprocess.Popen([ROOT / 'tests/platform/smtp_server.py', mails],
+                                  stdout=subprocess.PIPE, text=True)
+        self.addCleanup(lambda: (server.kill(), server.communicate()))
+        self.m.profile('weekly', report_list='volume_usage,share_list,duplicate_file', language='de',
+                       keep_reports=1, mail_to='a@example.com',
+                       smtp_url=f'smtp://127.0.0.1:{int(server.stdout.readline())}')
+        for _ in range(2):
+            folder = self.assertSucceeded(self.m.run('--report', 'weekly'), 'weekly')
+        self.assertEqual(self.m.report_folders('weekly'), [folder])
+        self.assertEqual(self.m.shell('exec /usr/vorn/bin/vornctl profile test-mail weekly').out,
+                         'sent to a@example.com\n')
+
+        first, last, test = (
+            email.message_from_bytes((mails / f'{n}.eml').read_bytes(), policy=email.policy.default)
+            for n in (1, 2, 3))
+        self.assertRegex(last['Subject'], r'^Speicherbericht weekly von \S+, \d{4}-\d\d-\d\d \d\d:\d\d$')
+        self.assertIn('Dies ist ein Test', test.get_body(('plain',)).get_content())
+        fullest = max((Fraction(int(used), int(used) + int(free) or 1), name) for name, used, free in
+                      re.findall(r"^\[ '([^']*)', (\d+) , (\d+), ",
+                                 '\n'.join(data_rows((folder / 'report.html').read_text(),
+                                                     'vornVolumeUsageData')), re.MULTILINE))
+        percent = f'{float(fullest[0] * 100):.1f}'.removesuffix('.0').replace('.', ',')
+        lines = [f'Vollstes Volume: {fullest[1]} ({percent}\xa0%)', 'Größte Freigabe: photos (9\xa0MiB)',
+                 'Mögliche Duplikate könnten freigeben: 6\xa0MiB',
+                 'Berichte: Volumes, Freigaben, Doppelte Dateien']
+        text = last.get_body(('plain',)).get_content()
+        self.assertEqual(text.splitlines()[2:6], lines, text)
+        self.assertIn(f'file://{folder}/report.html\r\n', text)
+        html = last.get_body(('html',)).get_content()
+        shown = re.sub('<[^>]*>', '', re.sub('</th>', ': ', html))
+        self.assertEqual([line for line in lines if line in shown], lines, html)
+        self.assertNotEqual(first['Message-ID'], last['Message-ID'])
