@@ -25,8 +25,8 @@ typedef struct VORNMountVolInfo {
 enum { VORN_VOLUMES_OF_USAGE = 11, VORN_VOLUMES_OF_QUOTA = 15 };
 
 // The mounted volumes, freed by the caller; null when there are none. `filter` must be null. A
-// volume that can't be measured is left out, with one syslog line. Each is measured once in the life of
-// the process.
+// volume that can't be measured is left out, with one syslog line. Each is measured once in the
+// life of the process.
 VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int selector);
 // Frees the whole list; accepts null.
 void VORNMountVolInfoFree(VORNMountVolInfo* volumes);

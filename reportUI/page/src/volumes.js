@@ -12,6 +12,10 @@ const DAY = 86400;
 const MOST_SENSIBLE_DAYS = 36525;  // beyond a century, or below 0, there is no growth to speak of
 const STATES = {critical: {percent: 95, days: 14}, warn: {percent: 85, days: 60}};
 const NEVER = Infinity;
+const SHORTEST_HISTORY = 3600;  // seconds; a first run stores a sample of its own
+
+const isShort = samples => samples.length < 2 ||
+  samples[0].date - samples.at(-1).date < SHORTEST_HISTORY;
 
 // When the volume is full, in words that agree with the days that the program estimated:
 // {text, days, order}. The estimate says 0 both for "within a day" and for "has not grown"; the
@@ -25,10 +29,10 @@ function outlookOf({free, total, percent, days, samples}) {
   if (free === 0n) {
     return outlook('full', 0);
   }
-  if (samples.length < 2 || days === '-') {
+  const count = Number(days);
+  if (days === '-' || (count === 0 && isShort(samples))) {
     return outlook('noHistory', NEVER);
   }
-  const count = Number(days);
   if (count > 0 && count <= MOST_SENSIBLE_DAYS) {
     return outlook('fullWhen', count, {when: format.inDays(count)});
   }
@@ -197,8 +201,8 @@ export function history(volumes, hasHistory) {
   if (!hasHistory) {
     return [h('p', {class: 'note'}, format.say('historyMissing'))];
   }
-  const drawn = volumes.filter(({samples}) => samples.length > 1);
-  if (drawn.length === 0) {
+  const drawn = volumes.filter(({samples}) => samples.length > 0);
+  if (drawn.every(({samples}) => isShort(samples))) {
     return [h('p', {class: 'note'}, format.say('historyShort'))];
   }
   const details = h('details', {}, h('summary', {}, format.say('chartData')));
