@@ -80,6 +80,7 @@ write_configuration() {
 
 [$profile]
 report_list = $report_list
+volume_history = true
 report_dir = $report_dir
 CONF
 }
