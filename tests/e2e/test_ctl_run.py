@@ -1,0 +1,428 @@
+"""vornctl: runs, schedules, status, reports, and the doctor."""
+import datetime
+import json
+import os
+import pty
+import re
+import select
+import signal
+import sqlite3
+import time
+from pathlib import Path
+
+from harness import LIMIT, PROGRAM, ProductTest, Run, make_files, wait_for
+
+CTL = '/usr/vorn/bin/vornctl'
+WHOLE, CUT = '<!DOCTYPE html>\n</html>\n', '<!DOCTYPE html>\n'
+
+
+class Feed(list):
+    """Log lines that a log daemon would write to a file."""
+
+    def __init__(self, path):
+        super().__init__()
+        self._path = path
+
+    def append(self, line):
+        super().append(line)
+        with open(self._path, 'a') as file:
+            file.write(f'Nov 21 06:00:00 host vornreport: {line}\n')
+
+
+class CtlTest(ProductTest):
+    def setUp(self):
+        super().setUp()
+        make_files(self.m.share('photos'), {'a.jpg': 10})
+        self.m.profile('weekly', report_list='share_list,large_file')
+
+    def ctl(self, *arguments, log=None):
+        run = Run(self.m, [CTL, *map(str, arguments)], log).finish()
+        self.assertNotIn('terminate called', run.err)
+        return run
+
+    def check(self, arguments, status=0, out='', err=''):
+        run = self.ctl(*arguments)
+        self.assertEqual(run.status, status, run.out + run.err)
+        self.assertRegex(run.out, f'^{out}$')
+        self.assertRegex(run.err, f'^{f"vornctl: {err}{chr(10)}" if err else ""}$')
+        return run
+
+    def ctl_pid(self, run):
+        path = f'/proc/{run.process.pid}/task/{run.process.pid}/children'
+        def find():
+            return [int(pid) for pid in Path(path).read_text().split()
+                    if os.readlink(f'/proc/{pid}/exe').endswith('/vornctl')]
+        return wait_for(find, 'vornctl')[0]
+
+    def stored(self, profile, reports):
+        """Makes report folders, name to page, as runs would have."""
+        for name, page in reports.items():
+            folder = self.m.reports / profile / name
+            (folder / 'csv').mkdir(parents=True)
+            (folder / 'report.html').write_text(page)
+        return self.m.reports / profile
+
+
+class Running(CtlTest):
+    def test_outcomes(self):
+        self.m.profile('nowhere', report_list='share_list', report_dir='/dev/null/reports')
+        self.m.profile('bare')
+        page = rf'{self.m.reports}/weekly/[-_\d]*/report\.html\n'
+        for arguments, status, out, err in (
+                (['weekly'], 0, page, ''),
+                (['weekly', '--data'], 0, '', ''),
+                (['global', '--data'], 0, '', ''),
+                (['global'], 2, '', '"global" stands for the whole server.*'),
+                (['nobody'], 1, '', 'profile "nobody" is not in .*'),
+                (['bare'], 1, '', 'profile bare selects no report.*'),
+                (['nowhere'], 1, '', 'report folder /dev/null/reports/nowhere can.t be used .*')):
+            with self.subTest(arguments):
+                self.check(['run', *arguments], status, out, err)
+                self.assertEqual(self.m.leftovers(), [])
+        self.m.shares.unlink()
+        (self.m.vorn / 'vornreport/sql/vornreport.sql').unlink()
+        (self.m.vorn / 'etc/vornreport.db').unlink()
+        where = 'see grep vornreport /var/log/syslog, and vornctl doctor'
+        self.check(['run', 'weekly'], 1, '', rf'(.*\n)+vornctl: the run of .* failed; {where}')
+        self.check(['run', 'global', '--data'], 1, '',
+                   r'(.*\n)+vornctl: collecting data .* failed.*')
+
+    def test_failure_tells_what_the_log_says(self):
+        logs = self.m.base / 'logs'
+        logs.mkdir()
+        (logs / 'syslog').write_text('Nov 20 host vornreport: of yesterday\n')
+        self.m.options += ['--bind', logs, '/var/log']
+        self.m.shares.unlink()
+        log = self.m.new_log()
+        log.lines = Feed(logs / 'syslog')
+        run = self.ctl('run', 'weekly', log=log)
+        self.assertEqual(run.status, 1)
+        self.assertIn('share.conf can\'t be read', run.err)
+        self.assertNotIn('yesterday', run.err)
+
+    def test_progress(self):
+        master, slave = pty.openpty()
+        self.addCleanup(os.close, master)
+        shown = ''
+        for call, phase in (('lang', 'weekly: starting'),
+                            ('body 2', 'weekly: putting the page together')):
+            self.m.stop_at(call)
+            run = Run(self.m, [CTL, 'run', 'weekly'], None, stderr=slave)
+            self.m.stopped_pid()
+            end = time.monotonic() + LIMIT
+            while phase not in shown and time.monotonic() < end:
+                if select.select([master], [], [], 1)[0]:
+                    shown += os.read(master, 4096).decode()
+            self.assertIn(phase, shown)
+            self.m.go_on()
+            self.assertEqual(run.finish().status, 0)
+        os.close(slave)
+
+    def test_one_run_at_a_time(self):
+        self.m.stop_at('lang')
+        run = self.m.start('--report', 'weekly')
+        self.m.stopped_pid()
+        self.check(['run', 'weekly'], 1, '',
+                   rf'profile weekly is running already \(process {run.pid()}\).*')
+        self.check(['run', 'weekly', '--data'], 1, '', 'profile weekly is running already.*')
+        self.assertIn('running', self.ctl('status').out)
+        self.m.go_on()
+        self.assertSucceeded(run.finish(), 'weekly')
+
+    def test_signals_end_the_run_and_clear_up(self):
+        for number in (signal.SIGINT, signal.SIGTERM, signal.SIGHUP):
+            with self.subTest(number):
+                self.m.stop_at('body 2')
+                run = Run(self.m, [CTL, 'run', 'weekly'], None)
+                self.m.stopped_pid()
+                os.kill(self.ctl_pid(run), number)
+                run.finish()
+                self.m.go_on()
+                self.assertEqual((run.status, run.out), (1, ''))
+                self.assertRegex(run.err, '^vornctl: the run of profile weekly was ended.*\n$')
+                self.assertEqual((self.m.leftovers(), self.m.report_folders('weekly')), ([], []))
+                self.assertEqual(self.m.status('weekly'), 'fail')
+
+
+class Schedules(CtlTest):
+    HEAD = '# Written by vornctl; change it with vornctl schedule.\n'
+
+    def files(self):
+        return {path.name: path.read_text() for path in self.m.cron.iterdir()}
+
+    def test_schedule(self):
+        def job(times, option, profile):
+            return f'{times} root {PROGRAM} {option} {profile} >/dev/null\n'
+        self.m.profile('a.b', report_list='volume_usage', schedule_collect_id='has.dots')
+        self.m.profile('own', report_list='volume_usage', schedule_collect_id='job1')
+        (self.m.cron / 'vornreport-job1').write_text('0 0 * * * root backup\n')
+        self.m.profile('twin', report_list='volume_usage', schedule_collect_id='weekly')
+        report = job('0 4 * * 1', '--report', 'weekly')
+        data = job('*/5 0-6/2 1,15 1-3 0,2-4', '--data', 'weekly')
+        other = {'vornreport-job1': '0 0 * * * root backup\n'}
+        weekly = 'vornreport-weekly'
+        for arguments, status, changed, err in (
+                (['weekly', '--report', ' 0  4 * * MON'], 0, {weekly: report}, ''),
+                (['weekly', '--report', '0 4 * * 1'], 1, {weekly: report}, 'profile twin has .*'),
+                (['twin', '--clean'], 1, {weekly: report}, '.* holds other jobs .*'),
+                (['profile', 'set', 'twin', 'schedule_collect_id', ''], 0, {weekly: report}, ''),
+                (['weekly', '--report', '0 4 * * 1'], 0, {weekly: report}, ''),
+                (['weekly', '--data', '*/5 0-6/2 1,15 jan-mar sun,tue-thu'], 0,
+                 {weekly: report + data}, ''),
+                (['weekly', '--data', '@daily'], 0,
+                 {weekly: report + job('@daily', '--data', 'weekly')}, ''),
+                (['a.b', '--data', '@hourly'], 0,
+                 {'vornreport-a-b-108bf50c': job('@hourly', '--data', 'a.b')}, ''),
+                (['a.b', '--clean'], 0, {'vornreport-a-b-108bf50c': None}, ''),
+                (['own', '--report', '@daily'], 1, {}, '.*vornreport-job1 holds other jobs .*'),
+                (['weekly', '--clean'], 0, {weekly: None}, ''),
+                (['weekly', '--clean'], 0, {}, ''),
+                (['weekly'], 2, {}, 'say when.*'),
+                (['nobody', '--clean'], 1, {}, 'profile "nobody" is not in .*')):
+            with self.subTest(arguments):
+                command = arguments if 'profile' in arguments else ['schedule', *arguments]
+                self.check(command, status, r'(.*\n)*', err)
+                for name, text in changed.items():
+                    other[name] = text and self.HEAD + text
+                other = {name: text for name, text in other.items() if text}
+                self.assertEqual(self.files(), other)
+                for path in self.m.cron.glob('vornreport-[aw]*'):
+                    self.assertEqual(path.stat().st_mode & 0o7777, 0o644)
+                keys = re.findall(r'schedule_collect_id = (\S+)', self.m.config.read_text())
+                self.assertLessEqual({name[11:] for name in other}, set(keys))
+        self.ctl('schedule', 'weekly', '--data', '@daily')
+        self.m.run('--clean', 'weekly')
+        self.assertNotIn(weekly, self.files())
+
+    def test_wrong_times(self):
+        for times, wrong in (
+                ('60 * * * *', 'minute'), ('* 24 * * *', 'hour'), ('* * 0 * *', 'day of the month'),
+                ('* * * foo *', 'month'), ('* * * * 8', 'day of the week'),
+                ('5/2 * * * *', 'minute'),
+                ('*/0 * * * *', 'minute'), ('1,,2 * * * *', 'minute'), ('* 5-1 * * *', 'hour'),
+                ('* * 30 2 *', 'never comes'), ('* * * *', 'has 4 fields'),
+                ('@sometimes', 'no time'),
+                ('* * * * *\nx', 'has 6 fields|day of the week')):
+            with self.subTest(times):
+                run = self.ctl('schedule', 'weekly', '--data', times)
+                self.assertEqual(run.status, 2)
+                self.assertRegex(run.err, wrong)
+                self.assertEqual(self.files(), {})
+
+    def test_cron_runs_it(self):
+        """Debian's cron, in a process namespace and with files of its own."""
+        for name in ('run', 'spool'):
+            (self.m.base / name).mkdir()
+        (self.m.base / 'crontab').write_text('')
+        self.m.options += ['--bind', self.m.base / 'run', '/run', '--bind', self.m.base / 'spool',
+                           '/var/spool/cron', '--bind', self.m.base / 'crontab', '/etc/crontab']
+        self.m.profile('hourly', report_list='volume_usage')
+        self.check(['schedule', 'hourly', '--data', '* * * * *'], out='--data hourly: .*\n')
+        cron = Run(self.m, ['unshare', '--pid', '--fork', '--kill-child', '--mount-proc',
+                            'cron', '-f'], None)
+        self.addCleanup(cron.finish)
+        self.addCleanup(cron.process.terminate)
+        history = self.m.vorn / 'etc/vornreport.db'
+        end = time.monotonic() + 130
+        samples = 0
+        while not samples and time.monotonic() < end:
+            time.sleep(0.5)
+            if history.exists():
+                try:
+                    with sqlite3.connect(history) as db:
+                        samples = db.execute("select count(*) from VolumeUsage "
+                                             "where profile = 'hourly'").fetchone()[0]
+                except sqlite3.OperationalError:
+                    pass  # the run is about to make it
+        self.assertGreater(samples, 0)
+
+
+class Status(CtlTest):
+    def test_status(self):
+        # A volume's name may hold what ends a field.
+        folder = self.stored('weekly', {'2026-01-02_03-04-05': WHOLE, '2026-01-03_03-04-05': CUT})
+        (folder / '2026-01-02_03-04-05/csv/volume_usage.csv').write_text(
+            '\ufeffVolume, Size, Used, Daty to Full\n"/", "100" ,"12.5%", "3"\n'
+            '"/srv/a", "b", "100" ,"91.25%", "12"\n"/c", "100" ,"20%", "-"\n')
+        (self.m.vorn / 'var/status').mkdir(parents=True, exist_ok=True)
+        self.m.profile('far', report_list='share_list', report_dir='relative')
+        states = {'weekly': ('success', 'success'), 'far': ('fail', 'fail'),
+                  'cut': ('collect_data', 'ended early'), 'new': (None, 'never ran')}
+        for name, (word, _) in states.items():
+            if word:
+                (self.m.vorn / 'var/status' / name).write_text(word + '\n')
+            if name in ('cut', 'new'):
+                self.m.profile(name, report_list='share_list')
+        run = self.ctl('status', '--json')
+        found = {entry['profile']: entry for entry in json.loads(run.out)}
+        self.assertEqual({name: entry['status'] for name, entry in found.items()},
+                         {name: shown for name, (_, shown) in states.items()})
+        self.assertIn('report_dir "relative" is not absolute', run.err)
+        weekly = found['weekly']
+        self.assertEqual(weekly['last_report']['path'], f'{folder}/2026-01-02_03-04-05/report.html')
+        self.assertEqual(weekly['fullest_volume'],
+                         {'volume': '/srv/a", "b', 'percent': 91.25, 'days_to_full': 12})
+        self.assertEqual([found['new'][key] for key in ('last_report', 'fullest_volume')],
+                         [None, None])
+        self.assertRegex(self.ctl('status', 'weekly').out,
+                         r'weekly +success +2026-01-02 03:04 +\S+ KiB +- +91 % of '
+                         r'/srv/a", "b +12\n$')
+
+    def test_next_run(self):
+        now = datetime.datetime.now()
+        days = [now.date() + datetime.timedelta(days=ahead) for ahead in range(3000)]
+        at_four = datetime.time(4)
+
+        def first(matches, times=(at_four,)):
+            return next(moment for day in days if matches(day)
+                        for moment in (datetime.datetime.combine(day, time) for time in times)
+                        if moment > now)
+        for times, expected in (
+                ('0 4 * * *', first(lambda day: True)),
+                ('0 4 * * 7', first(lambda day: day.isoweekday() == 7)),
+                ('0 4 29 feb *', first(lambda day: (day.month, day.day) == (2, 29))),
+                # Either of the days is enough, unless one of them begins with a star.
+                ('0 4 13 * fri', first(lambda day: day.day == 13 or day.isoweekday() == 5)),
+                ('0 4 */2 * fri', first(lambda day: day.day % 2 and day.isoweekday() == 5)),
+                ('15-45/30 4,16 1 1 *', first(lambda day: (day.month, day.day) == (1, 1),
+                                              [datetime.time(4, 15)])),
+                ('@yearly', first(lambda day: (day.month, day.day) == (1, 1), [datetime.time(0)]))):
+            with self.subTest(times):
+                self.ctl('schedule', 'weekly', '--report', times)
+                entry = json.loads(self.ctl('status', 'weekly', '--json').out)[0]
+                self.assertEqual(entry['next_run']['time'][:19], expected.isoformat())
+
+
+class Reports(CtlTest):
+    def test_reports(self):
+        recent = datetime.datetime.now() - datetime.timedelta(days=3)
+        names = ['2020-01-02_03-04-05', '2020-01-02_03-04-05-2',
+                 recent.strftime('%Y-%m-%d_%H-%M-%S')]
+        old, second, new = names
+        spared = {'2020-02-02_00-00-00', 'template', 'mine', '2020-03-03_00-00-00',
+                  '.2020-01-01_00-00-00.partial'}
+        for arguments, status, removed in (
+                (['remove', '--older-than', '90d', '--dry-run'], 0, []),
+                (['remove', '--older-than', '90d'], 0, [old, second]),
+                (['remove', '--older-than', '2d'], 0, names),
+                (['keep', '2'], 0, [old]), (['keep', '2', '--dry-run'], 0, []),
+                (['keep', '9'], 0, []), (['keep', '0'], 2, []), (['keep'], 2, []),
+                (['remove'], 2, []), (['remove', '--older-than', '0d'], 2, []),
+                (['remove', '--older-than', '9'], 2, []), (['purge'], 2, [])):
+            with self.subTest(arguments):
+                self.m = self.new_machine()
+                self.m.profile('weekly', report_list='share_list')
+                folder = self.stored('weekly', dict.fromkeys(names, WHOLE) | {
+                    '2020-02-02_00-00-00': CUT})
+                outside = self.m.base / '2020-03-03_00-00-00'
+                outside.mkdir()
+                (outside / 'report.html').write_text(WHOLE)
+                (folder / outside.name).symlink_to(outside)
+                for name in ('template', 'mine', '.2020-01-01_00-00-00.partial'):
+                    (folder / name).mkdir()
+                    (folder / name / 'report.html').write_text(WHOLE)
+                self.assertEqual(self.ctl('reports', 'weekly', *arguments).status, status)
+                self.assertEqual({path.name for path in folder.iterdir()},
+                                 spared | set(names) - set(removed))
+                self.assertTrue((outside / 'report.html').exists())
+
+    def test_list_and_open(self):
+        folder = self.stored('weekly', {
+            '2020-01-02_03-04-05': WHOLE, '2020-01-03_03-04-05': WHOLE, '2021-01-01_00-00-00': CUT})
+        shown = json.loads(self.ctl('reports', 'weekly', '--json').out)
+        self.assertEqual([(entry['name'], entry['complete']) for entry in shown],
+                         [('2020-01-02_03-04-05', True), ('2020-01-03_03-04-05', True),
+                          ('2021-01-01_00-00-00', False)])
+        for date, name in (('', '2020-01-03_03-04-05'), ('2020-01-02', '2020-01-02_03-04-05')):
+            page = f'{folder}/{name}/report.html'
+            self.check(['reports', 'weekly', 'open', *date.split()], out=f'{page}\nfile://{page}\n')
+        self.check(['reports', 'weekly', 'open', '2021'], 1,
+                   err='profile weekly has no complete .*')
+
+
+class Doctor(CtlTest):
+    def test_each_fault_is_found(self):
+        def place(path):
+            return self.m.vorn / path
+
+        def configure(**keys):
+            return lambda: self.m.profile('more', **{'report_list': 'share_list'} | keys)
+
+        def write(path, text):
+            return lambda: place(path).write_text(text)
+
+        def append(path, text):
+            return lambda: path().write_text(path().read_text() + text)
+
+        def leftover():
+            (self.m.reports / 'weekly/.2026-01-01_00-00-00.partial').mkdir(parents=True)
+
+        def killed():
+            (self.m.vorn / 'var/status').mkdir(parents=True, exist_ok=True)
+            (self.m.vorn / 'var/status/weekly').write_text('collect_data\n')
+
+        def bind(text, target):
+            def apply():
+                (self.m.base / 'bound').write_text(text)
+                if os.path.exists(target):
+                    self.m.options += ['--bind', self.m.base / 'bound', target]
+            return apply
+
+        def schedule(text, mode=0o644):
+            def apply():
+                (self.m.cron / 'mine').write_text(text)
+                (self.m.cron / 'mine').chmod(mode)
+            return apply
+        config, shares = (lambda: self.m.config), (lambda: self.m.shares)
+        script, schema = 'vornreport/reportUI/build-template.sh', 'vornreport/sql/vornreport.sql'
+        line = f'* * * * * root {PROGRAM} --data weekly\n'
+        for word, expected, breaks in (
+                ('', '', lambda: None),
+                ('error', 'program: .*can\'t be run', lambda: place('bin/vornreport').chmod(0o644)),
+                ('error', 'template: ', lambda: place(script).unlink()),
+                ('error', 'template: ', write(script, '#!/bin/sh\nexit 3\n')),
+                ('error', 'schema: .*can\'t be read', lambda: place(schema).unlink()),
+                ('error', 'schema: .*is broken', write(schema, 'create nothing')),
+                ('error', 'history: .*is broken', write('etc/vornreport.db', 'x' * 5000)),
+                ('error', 'rights of /usr/vorn/etc: everyone', lambda: place('etc').chmod(0o777)),
+                ('error', 'rights of /usr/vorn/bin: .*root', lambda: os.chown(place('bin'), 1, 0)),
+                ('error', r'vornreport\.conf: line \d+: ', append(config, 'a line\n')),
+                ('error', r'conf: line \d+: .*stands above', append(config, '[weekly]\n')),
+                ('error', 'profile a/b: ', append(config, '[a/b]\nreport_list = share_list\n')),
+                ('error', 'profile more: .*large_file', configure(report_list='larg_file')),
+                ('error', 'profile more: it selects no report', configure(report_list='')),
+                ('error', 'profile more: share_list: ', configure(share_list='photos,fotos')),
+                ('warning', 'profile more: the key languge .*"language"', configure(languge='de')),
+                ('error', 'share 007: ', append(shares, '[007]\npath = /\n')),
+                ('error', 'share none: .*has no path', append(shares, '[none]\n')),
+                ('error', 'share gone: .*found', append(shares, '[gone]\npath = /nowhere\n')),
+                ('error', 'share sys: .*not walked', append(shares, '[sys]\npath = /proc\n')),
+                ('error', 'mail server smtp://127.0.0.1:1: ',
+                 configure(mail_to='a@example.com', smtp_url='smtp://127.0.0.1:1')),
+                ('error', 'cron: it does not run', schedule(line)),
+                ('error', 'schedule .*mine: .*the hour', schedule(line.replace('* *', '* 25', 1))),
+                ('error', 'schedule .*mine: it can be written', schedule(line, 0o666)),
+                ('warning', 'mine: profile gone ', schedule(line.replace('weekly', 'gone'))),
+                ('warning', 'schedule of more: ', configure(schedule_collect_id='job9')),
+                ('warning', 'last run of weekly: ended early', killed),
+                ('warning', 'leftovers of weekly: ', leftover),
+                ('warning', 'time zone: ', bind('no zone', os.path.realpath('/etc/localtime'))),
+                ('error', 'quota tool: ',
+                 lambda: (configure(report_list='quota_usage')(),
+                          bind('', os.path.realpath('/sbin/repquota'))()))):
+            with self.subTest(expected):
+                self.m = self.new_machine()
+                self.m.share('photos')
+                self.m.profile('weekly', report_list='share_list')
+                breaks()
+                run = self.ctl('doctor', '--json')
+                found = json.loads(run.out)
+                bad = [entry for entry in found if entry['level'] != 'ok']
+                errors = [entry for entry in bad if entry['level'] == 'error']
+                self.assertEqual((run.status, run.err), (int(bool(errors)), ''), run.out)
+                self.assertTrue(all(entry['remedy'] for entry in bad), bad)
+                if not expected:
+                    self.assertEqual(errors, [])
+                    continue
+                self.assertTrue([entry for entry in bad if entry['level'] == word and re.search(
+                    expected, f"{entry['subject']}: {entry['text']}; {entry['remedy']}")], bad)
