@@ -150,7 +150,7 @@ std::vector<std::pair<std::string, Pairs>> content(const Lines& lines) {
 // The entries that the section shall have, in any order.
 Pairs meant(Pairs entries, const SectionEdit::Entries& changes) {
   for (const auto& [key, value] : changes) {
-    std::erase_if(entries, [&](const auto& entry) { return entry.first == key; });
+    std::erase_if(entries, [&key = key](const auto& entry) { return entry.first == key; });
     if (const auto& last = find_entry(changes, key)->second) {
       entries.emplace_back(key, *last);
     }

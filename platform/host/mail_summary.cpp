@@ -119,30 +119,38 @@ class Summary {
 };
 
 std::string html_page(const MailTexts& texts, const std::string& title, const std::string& body) {
-  return "<!DOCTYPE html>\n<html lang=\"" + escape_html(texts.language()) +
-         "\">\n<head>\n<meta charset=\"utf-8\">\n"
-         "<meta name=\"color-scheme\" content=\"light dark\">\n"
-         "<meta name=\"supported-color-schemes\" content=\"light dark\">\n<title>" +
+  return R"(<!DOCTYPE html>
+<html lang=")" +
+         escape_html(texts.language()) + R"(">
+<head>
+<meta charset="utf-8">
+<meta name="color-scheme" content="light dark">
+<meta name="supported-color-schemes" content="light dark">
+<title>)" +
          escape_html(title) +
-         "</title>\n</head>\n<body style=\"font-family: sans-serif; line-height: 1.5\">\n" + body +
+         R"(</title>
+</head>
+<body style="font-family: sans-serif; line-height: 1.5">
+)" + body +
          "</body>\n</html>\n";
 }
 
 std::string html_table(const std::vector<Fact>& facts) {
+  constexpr const char* kLabel =
+      R"(<tr><th scope="row" style="text-align: left; vertical-align: top; font-weight: normal; )"
+      R"(padding: 2px 16px 2px 0">)";
+  constexpr const char* kValue = R"(</th><td style="vertical-align: top; padding: 2px 0"><strong>)";
   std::string table = "<table style=\"border-collapse: collapse\">\n";
   for (const auto& [label, value] : facts) {
-    table +=
-        "<tr><th scope=\"row\" style=\"text-align: left; vertical-align: top; font-weight: normal; "
-        "padding: 2px 16px 2px 0\">" +
-        label + "</th><td style=\"vertical-align: top; padding: 2px 0\"><strong>" + value +
-        "</strong></td></tr>\n";
+    table.append(kLabel).append(label).append(kValue).append(value);
+    table += "</strong></td></tr>\n";
   }
   return table + "</table>\n";
 }
 
 std::string html_link(const std::string& link) {
   const std::string text = escape_html(link);
-  return "<a href=\"" + text + "\" style=\"word-break: break-all\">" + text + "</a>";
+  return "<a href=\"" + text + R"(" style="word-break: break-all">)" + text + "</a>";
 }
 
 // A sentence about the profile, which is a subject as well.

@@ -122,6 +122,7 @@ std::vector<StoredReport> list_reports(const Fd& folder, ReportSize size) {
     return order != 0 ? order < 0 : a.first.number < b.first.number;
   });
   std::vector<StoredReport> reports;
+  reports.reserve(found.size());
   for (auto& [stamp, report] : found) {
     reports.push_back(std::move(report));
   }

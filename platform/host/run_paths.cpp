@@ -272,7 +272,8 @@ std::optional<std::vector<std::string>> unfinished_reports(const std::string& fo
   }
   for (const std::string& name : entries_of(opened)) {
     if (name.size() > kUnfinished.size() && name.starts_with('.') && name.ends_with(kUnfinished)) {
-      found.push_back(folder + "/" + name);
+      found.push_back(folder);
+      found.back().append("/").append(name);
     }
   }
   errno = saved_errno;

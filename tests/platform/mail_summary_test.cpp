@@ -126,7 +126,7 @@ TEST(MailSummary, SpeaksEachLanguage) {
     const auto texts =
         nlohmann::json::parse(support::read_file(kDictionaries + "/" + code + ".json"))["mail"];
     english = code == "en" ? texts : english;
-    const std::regex placeholder("\\{\\w+\\}");
+    const std::regex placeholder(R"(\{\w+\})");
     for (const auto& [key, text] : english.items()) {
       const auto placeholders = [&](const std::string& value) {
         const std::sregex_iterator begin(value.begin(), value.end(), placeholder);
