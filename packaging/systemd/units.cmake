@@ -4,8 +4,8 @@ set(units ${CMAKE_CURRENT_LIST_DIR})
 set(UNIT_WORD report)
 # The program's exit status is 0 in any case; the unit's shall tell how the run went.
 set(UNIT_OUTCOME [[ExecStartPost=/bin/sh -c 'read -r word <"$1" && [ "$word" = success ]' sh /usr/vorn/var/status/%i]])
-set(UNIT_MORE ", to give a report to its folder's group and to ask for the quotas of all users")
-set(UNIT_CAPABILITIES "CAP_DAC_READ_SEARCH CAP_CHOWN CAP_SYS_ADMIN")
+set(UNIT_MORE ", and to ask for the quotas of all users")
+set(UNIT_CAPABILITIES "CAP_DAC_READ_SEARCH CAP_SYS_ADMIN")
 configure_file(${units}/vornreport.service.in ${CMAKE_BINARY_DIR}/systemd/vornreport@.service @ONLY)
 
 set(UNIT_WORD data)

@@ -9,12 +9,15 @@ import tempfile
 import unittest
 from pathlib import Path
 
-from harness import BUILD, needs_root
+from expected import data_rows
+from harness import BUILD, LIMIT, ROOT, needs_root
 
 CLONE_NEWNS = 0x20000
 CGROUPS = [Path('/sys/fs/cgroup', name) for name in ('', 'systemd', 'unified')]
 # Records of dpkg and caches, whatever is installed.
 RECORDS = re.compile(r'/(var/lib/dpkg/(status|available|lock|triggers)|var/cache/|var/log/)')
+ENVIRONMENT = {'PATH': '/usr/sbin:/usr/bin:/sbin:/bin', 'DEBIAN_FRONTEND': 'noninteractive'}
+PROFILE = 'duplicate_compare = true\nreport_list = duplicate_file,quota_usage,volume_usage\n'
 
 
 def call(*command, **options):
@@ -29,46 +32,46 @@ class Package(unittest.TestCase):
     @classmethod
     def setUpClass(cls):
         """Makes the package, and a later one whose shipped configuration has changed."""
-        cls.folder = tempfile.TemporaryDirectory(prefix='vorn-', dir='/var/tmp')
-        cls.addClassCleanup(cls.folder.cleanup)
-        base = Path(cls.folder.name)
-        call('cpack', '--config', BUILD / 'CPackConfig.cmake', '-B', base, cwd=base)
-        cls.package, = base.glob('*.deb')
-        cls.later, tree = base / 'later', base / 'tree'
+        folder = tempfile.TemporaryDirectory(prefix='vorn-', dir='/var/tmp')
+        cls.addClassCleanup(folder.cleanup)
+        cls.folder = Path(folder.name)
+        call('cpack', '--config', BUILD / 'CPackConfig.cmake', '-B', cls.folder)
+        cls.package, = cls.folder.glob('*.deb')
+        cls.later, tree = cls.folder / 'later', cls.folder / 'tree'
         call('dpkg-deb', '--raw-extract', cls.package, tree)
         call('sed', '-i', 's/^Version:.*/&.1/', tree / 'DEBIAN/control')
-        for path in tree.glob('usr/**/*.conf'):
-            path.write_text(path.read_text() + '# changed\n')
+        call('sed', '-i', '$a # changed', *tree.glob('usr/**/*.conf'))
         call('dpkg-deb', '--build', tree, cls.later)
         # All that is mounted from now on goes with this process.
-        assert ctypes.CDLL(None, use_errno=True).unshare(CLONE_NEWNS) == 0
+        assert ctypes.CDLL(None).unshare(CLONE_NEWNS) == 0
         call('mount', '--make-rprivate', '/')
 
     def setUp(self):
-        self.base = Path(tempfile.mkdtemp(prefix='machine', dir=self.folder.name))
+        self.base = Path(tempfile.mkdtemp(dir=self.folder))
         call('mount', '-t', 'tmpfs', 'private', self.base)
         self.addCleanup(call, 'umount', '-R', self.base)
-        self.written, self.root = self.base / 'written', self.base / 'root'
-        for path in (self.written, self.root, self.base / 'work'):
+        self.written, self.root, work = (self.base / name for name in ('written', 'root', 'work'))
+        for path in (self.written, self.root, work):
             path.mkdir()
-        call('mount', '-t', 'overlay', '-o',
-             f'lowerdir=/,upperdir={self.written},workdir={self.base / "work"}', 'private', self.root)
-        call('mount', '--bind', '/dev', self.root / 'dev')
-        call('mount', '-t', 'proc', 'private', self.root / 'proc')
+        call('mount', '-t', 'overlay', '-o', f'lowerdir=/,upperdir={self.written},workdir={work}',
+             'private', self.root)
 
-    def within(self, *command):
-        return call('chroot', self.root, *command, env={
-            'PATH': '/usr/sbin:/usr/bin:/sbin:/bin', 'DEBIAN_FRONTEND': 'noninteractive'})
-
-    def dpkg(self, action, package='vornreport'):
-        if action == '--install':
+    def dpkg(self, action, package):
+        """As an administrator, or a script, that answers no question."""
+        if package != 'vornreport':
             shutil.copy(package, self.root / 'var/cache/package.deb')
             package = '/var/cache/package.deb'
-        return self.within('dpkg', action, package)
+        call('mount', '--bind', '/dev', self.root / 'dev')
+        call('chroot', self.root, 'dpkg', action, package, env=ENVIRONMENT)
+        call('umount', self.root / 'dev')
 
-    def tree(self, *folders):
-        return {str(path): path.read_bytes()
-                for folder in folders for path in (self.root / folder).rglob('*') if path.is_file()}
+    def configure(self, name, text):
+        path = self.root / 'usr/vorn/etc' / name
+        path.write_text(path.read_text() + text)
+
+    def contents(self, *folders):
+        return {str(path): path.read_bytes() for folder in folders
+                for path in (self.root / folder).rglob('*') if path.is_file()}
 
     def left(self):
         """What differs from the machine below, besides records."""
@@ -79,44 +82,145 @@ class Package(unittest.TestCase):
             found += [str(below / name) for name in folders if not (below / name).exists()]
         return [path for path in found if not RECORDS.match(path)]
 
+    def boot(self, options, script):
+        """Starts systemd on the machine, in control groups of its own, and runs a script under it.
+        What that printed."""
+        (self.root / 'script').write_text(script)
+        units = self.root / 'etc/systemd/system'
+        (units / 'script.service').write_text(
+            '[Unit]\nSuccessAction=exit-force\nFailureAction=exit-force\n[Service]\nType=oneshot\n'
+            'ExecStart=/bin/sh -ec ". /script 2>&1"\nStandardOutput=file:/out\n')
+        for unit in ('network-online.target', 'timers.target'):
+            (units / unit).symlink_to('/dev/null')  # nothing of this machine shall start
+        groups = [path / f'vorn-{os.getpid()}' for path in CGROUPS
+                  if (path / 'cgroup.procs').exists()]
+
+        def enter():
+            for group in groups:
+                (group / 'cgroup.procs').write_text(str(os.getpid()))
+        try:
+            for group in groups:
+                group.mkdir()
+            call('systemd-nspawn', '--quiet', '--directory', self.root, '--register=no',
+                 '--keep-unit', '--link-journal=no', '--resolv-conf=off', '--timezone=off',
+                 '--machine', f'vorn-{os.getpid()}', *options, '--boot', '--',
+                 '--unit=script.service', preexec_fn=enter, timeout=2 * LIMIT)
+        except AssertionError as error:
+            raise AssertionError(f'{error}\n{(self.root / "out").read_text()}') from None
+        finally:
+            for group in groups:
+                for path, _, _ in os.walk(group, topdown=False):
+                    os.rmdir(path)
+        return (self.root / 'out').read_text()
+
+    def quota_volume(self):
+        """A volume with a quota for the user nobody; the options that make it /mnt."""
+        image, volume = self.base / 'image', self.base / 'volume'
+        call('truncate', '--size=16M', image)
+        call('mkfs.ext4', '-q', '-O', '^quota', image)
+        volume.mkdir()
+        call('mount', '-o', 'loop,usrquota', image, volume)
+        (volume / 'file').write_bytes(b'x' * (8 << 10))
+        shutil.chown(volume / 'file', 'nobody')
+        call('sync', '-f', volume)
+        call('quotacheck', '-cum', volume)
+        call('setquota', '-u', 'nobody', 16, 32, 0, 0, volume)
+        device = call('findmnt', '-n', '-o', 'SOURCE', volume).strip()
+        return [f'--bind={volume}:/mnt', f'--bind={device}']
+
+    def serve_mail(self, mails):
+        """A mail server on loopback; its port."""
+        mails.mkdir()
+        server = subprocess.Popen(['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py', mails],
+                                  stdout=subprocess.PIPE, text=True)
+        self.addCleanup(server.communicate)
+        self.addCleanup(server.terminate)
+        return int(server.stdout.readline())
+
     def test_lintian(self):
-        call('lintian', '--allow-root', '--fail-on', 'error', self.package)
+        call('lintian', '--allow-root', '--fail-on', 'error,warning', self.package)
 
     def test_life(self):
+        """Nothing of an administrator is lost before the purge, and nothing is left after it."""
         self.dpkg('--install', self.package)
-        self.assertEqual(self.within('readlink', '-e', '/usr/sbin/vornctl'),
-                         '/usr/vorn/bin/vornctl\n')
-        elsewhere = self.root / 'srv/elsewhere'
-        (self.root / 'srv/share').mkdir(parents=True)
-        (self.root / 'srv/share/file').write_bytes(b'x' * 5)
-        with (self.root / 'usr/vorn/etc/share.conf').open('a') as file:
-            file.write('[mine]\npath = /srv/share\n')
-        with (self.root / 'usr/vorn/etc/vornreport.conf').open('a') as file:
-            file.write('[own]\nreport_list = large_file\n'
+        share, elsewhere = self.root / 'srv/share', self.root / 'srv/elsewhere'
+        share.mkdir(parents=True)
+        (share / 'file').write_bytes(b'x')
+        self.configure('share.conf', '[mine]\npath = /srv/share\n')
+        self.configure('vornreport.conf', '[own]\nreport_list = large_file\n'
                        '[other]\nreport_list = large_file\nreport_dir = /srv/elsewhere\n')
         for profile in ('own', 'other'):
-            self.within('/usr/vorn/bin/vornreport', '--report', profile)
+            call('chroot', self.root, '/usr/vorn/bin/vornreport', '--report', profile)
             status = self.root / 'usr/vorn/var/status' / profile
             self.assertEqual(status.read_text(), 'success\n')
-        cron = self.root / 'etc/cron.d/vornreport-own'
-        cron.parent.mkdir(exist_ok=True)
-        cron.write_text('0 4 * * 1 root true\n')
-
+        call('chroot', self.root, 'vornctl', 'schedule', 'own', '--report', '@daily',
+             env=ENVIRONMENT)
         mine = ('usr/vorn/etc', 'usr/vorn/var', 'srv', 'etc/cron.d')
-        before = self.tree(*mine)
+        before = self.contents(*mine)
+        self.assertIn(str(self.root / 'etc/cron.d/vornreport-own'), before)
         for action, package in (('--install', self.later), ('--remove', 'vornreport'),
                                 ('--install', self.package), ('--remove', 'vornreport')):
             self.dpkg(action, package)
-            self.assertEqual(self.tree(*mine), before, action)
+            self.assertEqual(self.contents(*mine), before, action)
         self.assertFalse((self.root / 'usr/vorn/bin').exists())
-
-        reports = self.tree('srv')
-        self.dpkg('--purge')
-        self.assertEqual(self.tree('srv'), reports)
-        self.assertTrue(list(elsewhere.glob('other/*/report.html')))
-        shutil.rmtree(self.root / 'srv/share')
-        shutil.rmtree(elsewhere)
+        reports = self.contents('srv')
+        self.dpkg('--purge', 'vornreport')
+        self.assertEqual(self.contents('srv'), reports)
+        for path in (share, elsewhere):
+            shutil.rmtree(path)
         self.assertEqual(self.left(), [])
+
+    def test_units(self):
+        """The units forbid nothing that a run needs, and leave with the package."""
+        self.dpkg('--install', self.package)
+        units = list((self.root / 'usr/lib/systemd/system').glob('vornreport*.service'))
+        for unit in units:
+            call('systemd-analyze', 'security', '--offline=true', '--threshold=25', unit)
+        share, elsewhere = self.root / 'home/share', self.root / 'srv/elsewhere'
+        for path in (share, elsewhere):
+            path.mkdir(parents=True)
+        for path in (share / 'first', share / 'second', share):
+            if path != share:
+                path.write_bytes(b'secret')
+            path.chmod(0o700)
+            shutil.chown(path, 'nobody')
+        shutil.chown(elsewhere, group='users')
+        elsewhere.chmod(0o2770)
+        self.configure('share.conf', '[mine]\npath = /home/share\n')
+        port = self.serve_mail(self.base / 'mails')
+        self.configure('vornreport.conf', (
+            f'[home]\n{PROFILE}mail_to = ann@localhost\nsmtp_url = smtp://localhost:{port}\n'
+            f'[elsewhere]\n{PROFILE}report_dir = /srv/elsewhere\n'
+            f'[denied]\n{PROFILE}report_dir = /srv\n'))
+        own = self.root / 'etc/systemd/system/vornreport@elsewhere.service.d/own.conf'
+        own.parent.mkdir()
+        own.write_text('[Service]\nReadWritePaths=/srv/elsewhere\nSupplementaryGroups=users\n')
+        timers, log, remaining = self.boot(self.quota_volume(), """
+systemctl start vornreport-data@global vornreport@home vornreport@elsewhere
+! systemctl start vornreport@denied >/dev/null 2>&1
+systemctl --quiet enable --now vornreport@home.timer vornreport-data@global.timer
+systemctl list-timers --no-legend
+echo ---
+journalctl -o cat -b -t vornreport
+cp -r /usr/vorn/var/reports/home /kept
+dpkg --purge vornreport >/dev/null
+echo ---
+systemctl list-timers --no-legend
+""").split('---\n')
+        self.assertEqual((re.findall(r' (\S+).timer', timers), remaining),
+                         (['vornreport-data@global', 'vornreport@home'], ''))
+        for line in log.splitlines():
+            self.assertRegex(line, 'volume=/ get quota failed|/srv/denied .*Read-only|=denied')
+        page, = self.root.glob('kept/*/report.html')
+        text = page.read_text()
+        for expected in ("['nobody', 16384, 8192, 50.0]", "'/home/share/first', 6", "[ '/mnt', "):
+            self.assertIn(expected, text)
+        self.assertEqual(len(data_rows(text, 'vornVolumeUsageData')), 2, text[:1000])
+        self.assertEqual(len(list((self.base / 'mails').iterdir())), 1)
+        page, = elsewhere.glob('elsewhere/*/report.html')
+        self.assertEqual((page.group(), page.stat().st_mode & 0o777), ('users', 0o640))
+        self.assertEqual({path for path in self.left() if 'vorn' in path},
+                         {'/' + str(path.relative_to(self.root)) for path in (own, own.parent)})
 
 
 if __name__ == '__main__':
