@@ -40,8 +40,8 @@ def local_time(seconds):
 def data_blocks(folder):
     """All that the reports of a run appended to the page."""
     page = (folder / 'report.html').read_bytes()
-    page = page.split(b'document.documentElement.lang = vornText.lang;\n</script>\n', 1)[1]
-    return page.split(b'<meta name="vorn-empty-reports"')[0]
+    page = re.split(rb"\nvar vornLang = '[\w-]+';\n</script>\n", page, maxsplit=1)[1]
+    return page.split(b'</template>\n</head>\n')[0]
 
 
 def data_rows(page, variable):

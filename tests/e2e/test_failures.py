@@ -68,7 +68,7 @@ class Settings(ProductTest):
                     self.assertIn(line, '\n'.join(run.log_lines))
                 self.assertEqual(self.m.status(name), 'success')
                 page = (self.m.report_folders(name)[0] / 'report.html').read_text()
-                self.assertIn("\n  lang: 'en',\n", page)
+                self.assertIn("\nvar vornLang = 'en';\n", page)
                 row, = data_rows(page, 'vornShareListData')
                 self.assertRegex(row, "^\\[ 'good', '[^']+', '10' \\]$")
 
@@ -98,7 +98,7 @@ class FullDisks(ProductTest):
         return word
 
     def test_every_disk(self):
-        for place, sizes in (('/tmp', range(1, 40, 2)), ('reports', range(1, 60, 3)),
+        for place, sizes in (('/tmp', range(1, 100, 4)), ('reports', range(1, 110, 5)),
                              ('/usr/vorn/var/stat', range(1, 40, 4)),
                              ('/usr/vorn/var/status', range(1, 9))):
             words = []

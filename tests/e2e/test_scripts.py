@@ -15,7 +15,8 @@ class Sources(unittest.TestCase):
     def test_shellcheck(self):
         scripts = []
         for folder, folders, names in os.walk(ROOT):
-            folders[:] = [f for f in folders if not f.startswith(('build', '.git', 'quickstart-'))]
+            folders[:] = [f for f in folders if not f.startswith((
+                'build', '.git', 'quickstart-', 'node_modules'))]
             for path in (Path(folder, name) for name in names):
                 if path.suffix in ('.sh', '.bash') or re.match(rb'#!/bin/(ba)?sh\b', path.read_bytes()):
                     scripts.append(path)

@@ -41,12 +41,12 @@ export function piecesOf(root) {
     script => script.textContent.split(/<script[^>]*>/));
 }
 
-// The text behind the variable's opening, or undefined without a block.
+// {text, open}: the text behind the variable's opening bracket, or undefined without a block.
 function blockOf(pieces, variable) {
   for (const piece of pieces) {
-    const match = new RegExp(`(?:^|\\n)var ${variable} = [[{]\\n`).exec(piece);
+    const match = new RegExp(`(?:^|\\n)var ${variable} = ([[{])\\n`).exec(piece);
     if (match) {
-      return piece.slice(match.index + match[0].length);
+      return {text: piece.slice(match.index + match[0].length), open: match[1]};
     }
   }
   return undefined;
@@ -56,11 +56,13 @@ function blockOf(pieces, variable) {
 // undefined without a block. A report without named tables has one, named ''. `whole` is false when
 // a line is no row, or the end is missing.
 export function readReport(pieces, variable, width) {
-  const text = blockOf(pieces, variable);
-  if (text === undefined) {
+  const block = blockOf(pieces, variable);
+  if (block === undefined) {
     return undefined;
   }
-  const result = {tables: new Map(), whole: /[\]}]\s*;?\s*$/.test(text), oddKeys: []};
+  const {text, open} = block;
+  const end = open === '[' ? /(?:^|\n)\]\s*;?\s*$/ : /\}\s*;?\s*$/;  // a row ends in a bracket, too
+  const result = {tables: new Map(), whole: end.test(text), oddKeys: []};
   let rows;
   for (const line of text.trimEnd().split('\n')) {
     const key = KEY.exec(line);

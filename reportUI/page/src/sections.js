@@ -71,8 +71,8 @@ export const REPORTS = {
       ...history(volumes, hasHistory),
       table([['volume', 'name'], ['percent', 'percent'], ['used', 'size'], ['free', 'size'],
              ['days', 'outlook']],
-            volumes.map(volume => [volume.name, String(volume.percent), String(volume.used),
-                                   String(volume.free),
+            volumes.map(volume => [volume.name, String(volume.percent), String(volume.used ?? ''),
+                                   String(volume.free ?? ''),
                                    {text: volume.outlook.text, order: volume.outlook.order}]),
             {caption: format.nameOf('reports', 'volume_usage'), csv: csvOf('volume_usage'),
              sorted: 1})]
@@ -169,14 +169,15 @@ function notesOf(report, data, emptyReports) {
     return [note(report.missing ?? (report.always || emptyReports === 'none' ? 'missing' :
       emptyReports === 'all' ? 'noRows' : 'unclear'))];
   }
-  const count = format.number([...data.tables.values()].flat().length);
+  const rows = [...data.tables.values()].flat().length;
+  const count = format.number(rows);
   const notes = [];
   if (!data.whole) {
-    notes.push(note(data.tables.size ? 'recovered' : 'damaged', {n: count}));
+    notes.push(note(rows ? 'recovered' : 'damaged', {n: count}));
   } else if (data.oddKeys.length) {
     notes.push(note('readFromText', {
       n: count, name: data.oddKeys.map(shownPlain).join(', ')}));
-  } else if (count === '0') {
+  } else if (rows === 0) {
     notes.push(note('noRows'));
   }
   if (isCut(report, data)) {

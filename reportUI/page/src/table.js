@@ -41,13 +41,16 @@ function pathElement(path) {
            button);
 }
 
+// A number to compare, or NaN for what is shown as unknown.
+const known = text => format.isNumber(text) ? Number(text) : NaN;
+
 // How each kind of column is written, compared and looked for.
 const KINDS = {
   text: {cell: value => shown(value)},
   path: {cell: pathElement, header: true},
   name: {cell: value => shown(value), header: true},
   type: {cell: value => typeName(value), text: value => typeName(value), header: true},
-  size: {number: true, cell: value => sizeElement(value, -1), text: format.size},
+  size: {number: true, key: known, cell: value => sizeElement(value, -1), text: format.size},
   quota: {
     number: true,
     // A quota of 0 is none, and so the greatest.
@@ -55,7 +58,7 @@ const KINDS = {
     cell: value => value === '0' ? format.say('noLimit') : sizeElement(value, -1),
     text: value => value === '0' ? format.say('noLimit') : format.size(value)
   },
-  count: {number: true, cell: format.number, text: format.number},
+  count: {number: true, key: known, cell: format.number, text: format.number},
   percent: {
     number: true,
     key: value => parseFloat(value),
@@ -63,7 +66,7 @@ const KINDS = {
     text: value => format.percent(parseFloat(value))
   },
   outlook: {key: value => value.order, cell: value => value.text, text: value => value.text},
-  time: {number: true, cell: format.time, text: format.time}
+  time: {number: true, key: value => known(value) || NaN, cell: format.time, text: format.time}
 };
 
 export function typeName(label) {

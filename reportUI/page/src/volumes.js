@@ -23,7 +23,7 @@ const isShort = samples => samples.length < 2 ||
 function outlookOf({free, total, percent, days, samples}) {
   const outlook = (key, count, values) => ({
     text: format.say(key, values), days: count, order: count});
-  if (total === 0n) {
+  if (!total) {
     return outlook('unknownSize', NEVER);
   }
   if (free === 0n) {
@@ -52,16 +52,17 @@ function stateOf({percent, outlook}) {
     outlook.days <= STATES[state].days) ?? 'ok';
 }
 
-const bytes = text => format.isNumber(text) ? BigInt(text) : 0n;
+const bytes = text => format.isNumber(text) ? BigInt(text) : undefined;
 
 // The volumes of the rows (identifier, used, free, percent, days) with their samples, newest first,
 // the most pressing first. `history`: the tables of the history block, undefined without one.
 export function readVolumes(rows, history) {
   return rows.map(([name, used, free, , days]) => {
     const volume = {name, used: bytes(used), free: bytes(free), days};
-    volume.total = volume.used + volume.free;
+    const known = volume.used !== undefined && volume.free !== undefined;
+    volume.total = known ? volume.used + volume.free : undefined;
     // Not the percentage of the row: it has but seven characters.
-    volume.percent = volume.total > 0n ? Number(volume.used) / Number(volume.total) * 100 : NaN;
+    volume.percent = volume.total ? Number(volume.used) / Number(volume.total) * 100 : NaN;
     volume.samples = (history?.get(name) ?? []).map(([date, percent]) => (
       {date: Number(date), percent: parseFloat(percent)})).filter(
       sample => sample.date > 0 && Number.isFinite(sample.percent));
@@ -163,7 +164,7 @@ function drawHistory(volumes) {
         format.say('today')));
   const labels = volumes.map(volume => {
     const group = drawing.appendChild(svg('g', {class: `line series${format.seriesOf(volume.name)}`}));
-    group.append(svg('path', {d: path(volume.samples)}));
+    group.append(svg('title', {}, shownPlain(volume.name)), svg('path', {d: path(volume.samples)}));
     const [newest] = volume.samples;
     if (volume.outlook.days !== NEVER && volume.percent < 100) {
       group.append(svg('path', {
