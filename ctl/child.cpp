@@ -55,6 +55,7 @@ Ends open_ends() {
 // 0 or an errno value.
 int spawn(const std::vector<std::string>& arguments, int output, pid_t* pid) {
   std::vector<char*> argv;
+  argv.reserve(arguments.size() + 1);
   for (const std::string& argument : arguments) {
     argv.push_back(const_cast<char*>(argument.c_str()));
   }

@@ -5,8 +5,6 @@
 #include <cerrno>
 #include <charconv>
 #include <cstdio>
-#include <cstdlib>
-#include <cstring>
 #include <iomanip>
 #include <sstream>
 
@@ -21,7 +19,6 @@ namespace ctl {
 namespace {
 
 constexpr std::size_t kLargestStatus = 4096;
-constexpr std::size_t kLargestCsv = 1U << 20U;
 
 std::string local_text(const char* format, std::time_t time) {
   std::tm local{};
@@ -29,40 +26,6 @@ std::string local_text(const char* format, std::time_t time) {
   std::ostringstream text;
   text << std::put_time(&local, format);
   return text.str();
-}
-
-// The field of a CSV line that ends at `end`, its quotes taken off; `end` moves before it. Read
-// from the back, because the first field is a mount path, which may hold anything.
-std::string last_field(const std::string& line, std::size_t& end) {
-  const std::size_t close = end == 0 ? std::string::npos : line.rfind('"', end - 1);
-  const std::size_t open =
-      close == std::string::npos || close == 0 ? std::string::npos : line.rfind('"', close - 1);
-  if (open == std::string::npos) {
-    end = 0;
-    return {};
-  }
-  end = open;
-  return line.substr(open + 1, close - open - 1);
-}
-
-std::optional<FullestVolume> read_volume(const std::string& line) {
-  FullestVolume volume;
-  std::size_t end = line.size();
-  volume.days = last_field(line, end);
-  volume.percent = last_field(line, end);
-  last_field(line, end);  // the size
-  const std::size_t open = line.find('"');
-  const std::size_t close = end == 0 ? 0 : line.rfind('"', end - 1);
-  if (!volume.percent.ends_with('%') || open == std::string::npos || open >= close) {
-    return std::nullopt;
-  }
-  volume.volume = line.substr(open + 1, close - open - 1);
-  volume.percent.pop_back();
-  // Also what stands for "no estimate": the history was not asked for, or shows no growth.
-  if (volume.days == "-" || volume.days == "0") {
-    volume.days.clear();
-  }
-  return volume;
 }
 
 }  // namespace
@@ -88,12 +51,10 @@ std::vector<host::StoredReport> reports_in(const std::string& folder, host::Repo
 }
 
 std::optional<host::StoredReport> newest_whole(const std::vector<host::StoredReport>& reports) {
-  for (auto report = reports.rbegin(); report != reports.rend(); ++report) {
-    if (report->is_whole) {
-      return *report;
-    }
-  }
-  return std::nullopt;
+  const auto newest =
+      std::find_if(reports.rbegin(), reports.rend(),
+                   [](const host::StoredReport& report) { return report.is_whole; });
+  return newest == reports.rend() ? std::nullopt : std::optional(*newest);
 }
 
 RunState run_state(const std::string& profile) {
@@ -139,23 +100,6 @@ pid_t running_process(const std::string& profile) {
     std::from_chars(text->data(), text->data() + text->size(), pid);
   }
   return pid;
-}
-
-std::optional<FullestVolume> fullest_volume(const std::string& folder) {
-  const auto text = host::read_file(folder + "/csv/volume_usage.csv", kLargestCsv);
-  std::optional<FullestVolume> fullest;
-  const auto used = [](const FullestVolume& volume) {
-    return std::strtod(volume.percent.c_str(), nullptr);
-  };
-  for (std::size_t start = 0; text && start < text->size();) {
-    const std::size_t end = std::min(text->find('\n', start), text->size());
-    const auto volume = read_volume(text->substr(start, end - start));
-    if (volume && (!fullest || used(*volume) > used(*fullest))) {
-      fullest = volume;
-    }
-    start = end + 1;
-  }
-  return fullest;
 }
 
 std::string size_text(std::uint64_t bytes) {

@@ -37,15 +37,6 @@ const char* word_for(RunState state);
 // The process that runs `profile`; 0 when there is none or it can't be told.
 pid_t running_process(const std::string& profile);
 
-// How full a volume was, and the report's estimate for it.
-struct FullestVolume {
-  std::string volume;
-  std::string percent;  // "91.25"
-  std::string days;     // whole days; empty when the report has no estimate
-};
-// The fullest volume of the report in `folder`; nothing when it measured none.
-std::optional<FullestVolume> fullest_volume(const std::string& folder);
-
 std::string size_text(std::uint64_t bytes);  // "1.5 GiB"
 std::string time_text(std::time_t time);     // "2026-11-21 04:00", local
 std::string json_time(std::time_t time);     // "2026-11-21T04:00:00+0100"

@@ -60,10 +60,12 @@ void list(const Options& options, const std::string& folder, const Reports& repo
 
 // The newest whole report whose name begins with `date`.
 const host::StoredReport& find_report(const Options& options, const Reports& reports) {
-  for (auto report = reports.rbegin(); report != reports.rend(); ++report) {
-    if (report->is_whole && report->name.starts_with(options.argument)) {
-      return *report;
-    }
+  const auto found =
+      std::find_if(reports.rbegin(), reports.rend(), [&](const host::StoredReport& report) {
+        return report.is_whole && report.name.starts_with(options.argument);
+      });
+  if (found != reports.rend()) {
+    return *found;
   }
   throw Failure("profile " + options.profile + " has no complete report" +
                 (options.argument.empty() ? "" : " of " + options.argument) +

@@ -79,10 +79,7 @@ void RunWatch::take_line(std::string_view line) {
 
 // The texts are stable: operators read them as well.
 void RunWatch::take_progress(std::string_view text) {
-  if (take(text, "stat share=")) {
-    phase_ = Phase::gathering;
-    share_ = text;
-  } else if (take(text, "use file index db, share=")) {
+  if (take(text, "stat share=") || take(text, "use file index db, share=")) {
     phase_ = Phase::gathering;
     share_ = text;
   } else if (take(text, "##### inject report=")) {

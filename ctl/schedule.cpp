@@ -59,7 +59,7 @@ std::string id_for(const std::string& profile) {
 
 // The identifier that the profile has, unless it is of no use: then a new one.
 std::string schedule_id(const Section& profile) {
-  const std::string kept = profile.value(kScheduleKey);
+  std::string kept = profile.value(kScheduleKey);
   if (!is_id(kept)) {
     return id_for(profile.name);
   }

@@ -1,10 +1,12 @@
 // vornctl status: how the profiles are doing.
 #include <CLI/CLI.hpp>
+#include <cstdio>
 #include <memory>
 #include <nlohmann/json.hpp>
 
 #include "ctl.hpp"
 #include "profile_state.hpp"
+#include "report_figures.hpp"
 #include "schedules.hpp"
 
 namespace ctl {
@@ -27,7 +29,7 @@ struct ProfileStatus {
   std::time_t made = 0;
   std::uint64_t size = 0;
   std::optional<NextRun> next;
-  std::optional<FullestVolume> fullest;
+  std::optional<host::FullestVolume> fullest;
 };
 
 std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job>& jobs,
@@ -49,7 +51,7 @@ void add_report(const Section& profile, ProfileStatus& status) try {
     status.last_report = folder + "/" + report->name + "/report.html";
     status.made = report->made;
     status.size = report->size;
-    status.fullest = fullest_volume(folder + "/" + report->name);
+    status.fullest = host::read_figures(status.last_report.c_str()).volume;
   }
 } catch (const Failure& failure) {
   warn(failure.what());
@@ -62,6 +64,15 @@ ProfileStatus status_of(const Section& profile, const std::vector<Job>& jobs, st
   status.next = next_of(profile.name, jobs, now);
   add_report(profile, status);
   return status;
+}
+
+nlohmann::ordered_json json_of(const host::FullestVolume& volume) {
+  nlohmann::ordered_json json{
+      {"volume", volume.name}, {"percent", volume.percent}, {"days_to_full", nullptr}};
+  if (volume.outlook == host::Outlook::days || volume.outlook == host::Outlook::soon) {
+    json["days_to_full"] = volume.days;
+  }
+  return json;
 }
 
 void print_as_json(const std::vector<ProfileStatus>& all) {
@@ -80,23 +91,31 @@ void print_as_json(const std::vector<ProfileStatus>& all) {
                            {"kind", status.next->kind == JobKind::report ? "report" : "data"}};
     }
     if (status.fullest) {
-      auto& volume = entry["fullest_volume"];
-      volume = {{"volume", status.fullest->volume},
-                {"percent", std::strtod(status.fullest->percent.c_str(), nullptr)}};
-      volume["days_to_full"] = nullptr;
-      if (!status.fullest->days.empty()) {
-        volume["days_to_full"] = std::strtoll(status.fullest->days.c_str(), nullptr, 10);
-      }
+      entry["fullest_volume"] = json_of(*status.fullest);
     }
     array.push_back(std::move(entry));
   }
   print_json(array);
 }
 
-std::string volume_text(const FullestVolume& volume) {
+std::string volume_text(const host::FullestVolume& volume) {
   char percent[32];
-  std::snprintf(percent, sizeof percent, "%.0f %%", std::strtod(volume.percent.c_str(), nullptr));
-  return std::string(percent) + " of " + volume.volume;
+  std::snprintf(percent, sizeof percent, "%.0f %%", volume.percent);
+  return std::string(percent) + " of " + volume.name;
+}
+
+std::string days_text(const host::FullestVolume& volume) {
+  switch (volume.outlook) {
+    case host::Outlook::days:
+      return std::to_string(volume.days);
+    case host::Outlook::soon:
+      return "< 1";
+    case host::Outlook::no_growth:
+      return "not filling";
+    case host::Outlook::unknown:
+      break;
+  }
+  return "-";
 }
 
 void print_as_table(const std::vector<ProfileStatus>& all) {
@@ -114,7 +133,7 @@ void print_as_table(const std::vector<ProfileStatus>& all) {
     table.add({status.name, word_for(status.state), reported ? time_text(status.made) : "-",
                reported ? size_text(status.size) : "-", next,
                status.fullest ? volume_text(*status.fullest) : "-",
-               status.fullest && !status.fullest->days.empty() ? status.fullest->days : "-"});
+               status.fullest ? days_text(*status.fullest) : "-"});
   }
   if (table.empty()) {
     print_line("no profiles; add one with vornctl profile add");
@@ -133,6 +152,7 @@ void status(const Options& options) {
     profiles.push_back(read_profile("global"));
   }
   std::vector<ProfileStatus> all;
+  all.reserve(profiles.size());
   for (const Section& profile : profiles) {
     all.push_back(status_of(profile, jobs, now));
   }

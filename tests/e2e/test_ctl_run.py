@@ -239,11 +239,18 @@ class Schedules(CtlTest):
 
 class Status(CtlTest):
     def test_status(self):
-        # A volume's name may hold what ends a field.
-        folder = self.stored('weekly', {'2026-01-02_03-04-05': WHOLE, '2026-01-03_03-04-05': CUT})
-        (folder / '2026-01-02_03-04-05/csv/volume_usage.csv').write_text(
-            '\ufeffVolume, Size, Used, Daty to Full\n"/", "100" ,"12.5%", "3"\n'
-            '"/srv/a", "b", "100" ,"91.25%", "12"\n"/c", "100" ,"20%", "-"\n')
+        block = "<script type='text/javascript'>\nvar {} = {}\n</script>\n"
+        page = WHOLE.replace('</html>', block.format('vornVolumeUsageData', """[
+[ '/', 10 , 90, '10.000000%', '3' ],
+[ '/srv/a', 90 , 10, '90.000000%', '12' ],
+[ '/c', 20 , 80, '20.000000%', '0' ]
+];""") + block.format('vornVolumeUsageDataHistory', """{
+'/srv/a' : [
+[ 1760000000, 90.0 ],
+[ 1750000000, 50.0 ]
+]
+};""") + '</html>')
+        folder = self.stored('weekly', {'2026-01-02_03-04-05': page, '2026-01-03_03-04-05': CUT})
         (self.m.vorn / 'var/status').mkdir(parents=True, exist_ok=True)
         self.m.profile('far', report_list='share_list', report_dir='relative')
         states = {'weekly': ('success', 'success'), 'far': ('fail', 'fail'),
@@ -261,12 +268,12 @@ class Status(CtlTest):
         weekly = found['weekly']
         self.assertEqual(weekly['last_report']['path'], f'{folder}/2026-01-02_03-04-05/report.html')
         self.assertEqual(weekly['fullest_volume'],
-                         {'volume': '/srv/a", "b', 'percent': 91.25, 'days_to_full': 12})
+                         {'volume': '/srv/a', 'percent': 90.0, 'days_to_full': 12})
         self.assertEqual([found['new'][key] for key in ('last_report', 'fullest_volume')],
                          [None, None])
         self.assertRegex(self.ctl('status', 'weekly').out,
-                         r'weekly +success +2026-01-02 03:04 +\S+ KiB +- +91 % of '
-                         r'/srv/a", "b +12\n$')
+                         r'weekly +success +2026-01-02 03:04 +\S+ KiB +- +90 % of '
+                         r'/srv/a +12\n$')
 
     def test_next_run(self):
         now = datetime.datetime.now()
