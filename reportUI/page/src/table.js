@@ -11,7 +11,7 @@ export function sizeElement(bytes, tabindex = 0) {
     return h('span', {}, format.UNKNOWN);
   }
   const exact = format.exactSize(bytes);
-  return h('span', {class: 'size', tabindex, title: exact, 'data-exact': exact},
+  return h('span', {class: 'bytes', tabindex, title: exact, 'data-exact': exact},
            format.size(bytes));
 }
 
@@ -111,7 +111,6 @@ class Table {
       h('table', {}, h('caption', {class: 'unseen'}, caption), h('thead', {}, h('tr', {}, ...this.headers)),
         this.body)), this.more);
     this.body.addEventListener('keydown', event => this.move(event));
-    this.body.querySelector('.size')?.setAttribute('tabindex', 0);
     this.update();
   }
 
@@ -172,23 +171,32 @@ class Table {
     }
     this.count.textContent = format.say(
       'rowCount', {n: format.number(found), m: format.number(this.rows.length)});
+    this.setStop(this.sizes()[0]);
     this.more.hidden = found <= FIRST_ROWS;
     this.more.textContent = this.all ? format.say('showLess') :
       format.say('showAll', {n: format.number(found)});
   }
 
+  sizes() {
+    return [...this.body.querySelectorAll('tr:not([hidden]):not(.later) .bytes')];
+  }
+
+  setStop(size) {
+    this.body.querySelector('.bytes[tabindex="0"]')?.setAttribute('tabindex', -1);
+    size?.setAttribute('tabindex', 0);
+  }
+
   // The sizes of a table are one tab stop, and arrow keys move between them.
   move(event) {
     const step = {ArrowUp: -1, ArrowDown: 1}[event.key];
-    if (!step || !event.target.matches('.size')) {
+    if (!step || !event.target.matches('.bytes')) {
       return;
     }
-    const sizes = [...this.body.querySelectorAll('tr:not([hidden]):not(.later) .size')];
+    const sizes = this.sizes();
     const next = sizes[sizes.indexOf(event.target) + step];
     event.preventDefault();
     if (next) {
-      event.target.setAttribute('tabindex', -1);
-      next.setAttribute('tabindex', 0);
+      this.setStop(next);
       next.focus();
     }
   }

@@ -1,0 +1,133 @@
+// The page stands alone, says so without JavaScript, and speaks the reader's language in the
+// server's time zone.
+import assert from 'node:assert/strict';
+import fs from 'node:fs';
+import http from 'node:http';
+import path from 'node:path';
+import test from 'node:test';
+
+import {ALL, assertSensible, choose, fileOf, LANGUAGES, read, SOURCE, textOf, withPage} from './browser.mjs';
+
+const PAGES = ['big', 'empty', 'hostile', 'broken'];
+const big = read('big');
+
+test('nothing is asked for or said, wherever the page lies', async t => {
+  for (const name of PAGES) {
+    await t.test(name, () => withPage(read(name), async page => {
+      assert.deepEqual(await page.$$eval('section[data-report]', all => all.map(each => each.dataset.report)), ALL);
+    }));
+  }
+  const server = http.createServer((_, response) => response.setHeader('content-type', 'text/html').end(big));
+  await new Promise(resolve => server.listen(0, '127.0.0.1', resolve));
+  const address = `http://127.0.0.1:${server.address().port}/report.html`;
+  await withPage(big, page => page.locator('.card').first().waitFor(), {address});
+  server.close();
+  const [, style] = /<style>([^]*?)<\/style>/.exec(big), [script] = big.match(/<script>[^]*?<\/script>/g).slice(-1);
+  assert.ok(Buffer.byteLength(style + script) <= 120 << 10, 'script and style');
+});
+
+test('the policy lets no other script or style work', async () => {
+  const evil = '<script>document.title="run"</script><img src=x onerror=\'document.title="run"\'>';
+  await withPage(big.replace('<main', `<p style="color:#010203">${evil}</p><main`), async (page, said) => {
+    assert.notEqual(await page.title(), 'run');
+    assert.notEqual(await page.$eval('p[style]', each => getComputedStyle(each).color), 'rgb(1, 2, 3)');
+    assert.equal(said.filter(line => /Content Security Policy/.test(line)).length, 4, said.join('\n'));
+  }, {silent: false});
+});
+
+test('without JavaScript the page says so and links the CSV files', async () => {
+  await withPage(fileOf('big'), async page => {
+    assert.match(await page.locator('noscript').innerText(), /needs JavaScript/);
+    const links = await page.$$eval('a[href^="csv/"]', all => all.map(each => each.getAttribute('href')));
+    const without = ['quota_usage', 'file_group'];
+    assert.deepEqual(links.sort(), ALL.filter(name => !without.includes(name)).map(name => `csv/${name}.csv`).sort());
+    links.forEach(link => assert.ok(fs.existsSync(fileOf('big', link)), link));
+  }, {javaScriptEnabled: false});
+});
+
+test('the first screen answers: cards, what needs attention, and where', async t => {
+  for (const name of PAGES) {
+    await t.test(name, () => withPage(fileOf(name), async page => {
+      for (const part of await page.locator('.card, .notices li').all()) {
+        const {y, height} = await part.boundingBox();
+        assert.ok(y + height <= 800, `${await part.innerText()} ends at ${y + height}`);
+      }
+      const lost = await page.$$eval('a[href^="#"]', all => all.filter(
+        each => !document.getElementById(each.hash.slice(1))).map(each => each.href));
+      assert.deepEqual(lost, []);
+    }));
+  }
+  await withPage(fileOf('big'), async page => {
+    assert.equal(await page.locator('.card').count(), 5);
+    const notices = (await textOf(page, '.notices li')).join('\n');
+    for (const part of [/projects is 90\.\d% full\. Full in \d+ days\./, /anna is over the quota on .*home/,
+                        /bjoern has used 9\d% of the quota/, /largest share is Photos/, /\w+ owns the most/,
+                        /Possible duplicates could free 1\.\d+ GiB/, /The oldest data is from/]) {
+      assert.match(notices.replaceAll('\u00a0', ' '), part);
+    }
+    // A line leads to its section.
+    await page.locator('.notices a').last().click();
+    await page.waitForFunction(() => document.getElementById('least_modify').getBoundingClientRect().top < 200);
+  });
+});
+
+const dictionary = code => JSON.parse(fs.readFileSync(path.join(SOURCE, `template/lang/${code}.json`), 'utf8'));
+
+test('all dictionaries have the same texts and placeholders', () => {
+  const shape = (value, key = '') => typeof value === 'object' ?
+    Object.entries(value).flatMap(([name, each]) => shape(each, `${key}.${name}`)).sort() :
+    [`${key} ${(value.match(/\{\w+\}/g) ?? []).sort()}`];
+  assert.deepEqual(fs.readdirSync(path.join(SOURCE, 'template/lang')), LANGUAGES.map(code => `${code}.json`));
+  for (const code of LANGUAGES) {
+    assert.deepEqual(shape(dictionary(code)), shape(dictionary('en')), code);
+    assert.doesNotMatch(JSON.stringify(dictionary(code)), /""/, code);
+  }
+});
+
+test('each language, chosen without loading again', async () => {
+  await withPage(fileOf('big'), async page => {
+    for (const code of LANGUAGES) {
+      const {page: texts, types, reports, columns} = dictionary(code);
+      await choose(page, code);
+      assert.equal(await page.evaluate(() => document.documentElement.lang), code);
+      assert.equal(await page.evaluate(() => document.activeElement.value), code, 'the focus stays');
+      assert.ok((await page.title()).startsWith(texts.title));
+      assert.deepEqual(await textOf(page, '#large_file h2, #attention h2, #large_file th.number button'),
+                       [texts.attention, reports.large_file, columns.size]);
+      assert.equal(await page.locator('.legend li').first().innerText(), types.image);
+    }
+    await assertSensible(page);
+  });
+  // What the profile says, what became of a dictionary, and what is chosen.
+  const swap = (from, to) => text => text.replace(from, to);
+  for (const [name, change, chosen, title] of [
+    ['empty', text => text, 'de', 'Speicherbericht'],  // of the profile's de-AT
+    ['hostile', text => text, 'en', 'Storage report'],  // of xx
+    ['empty', swap('data-language="de">{', 'data-language="de">{,'), 'en', 'Storage report'],
+    ['empty', swap(`"title": "${dictionary('de').page.title}",`, ''), 'de', 'Storage report'],
+    ['empty', swap(/\nvar vornLang = .*\n/, '\n'), 'en', 'Storage report']]) {
+    await withPage(change(read(name)), async (page, said) => {
+      assert.equal(await page.evaluate(() => document.documentElement.lang), chosen);
+      assert.ok((await page.locator('h1').innerText()).startsWith(title), title);
+      assert.deepEqual(said.filter(line => !line.startsWith('dictionary de: ')), []);
+    }, {silent: false});
+  }
+});
+
+test('times are those of the server, whatever the zone of the reader', async () => {
+  const moment = 1700000000;  // 22:13 on 14 November 2023 in UTC
+  for (const [zone, time, named] of [
+    ['Etc/UTC', 'Nov 14, 2023, 10:13 PM', 'Coordinated Universal Time, Etc/UTC'],
+    ['Asia/Tokyo', 'Nov 15, 2023, 7:13 AM', 'Japan Standard Time, Asia/Tokyo'],
+    ['America/New_York', 'Nov 14, 2023, 5:13 PM', 'Eastern Standard Time, America/New York'],
+    ['+05:30', 'Nov 15, 2023, 3:43 AM', 'GMT+05:30, +05:30'],
+    ['no/zone', 'Nov 14, 2023, 10:13 PM', 'Coordinated Universal Time, UTC']]) {
+    const page = big.replace(/data-time="\d+" data-zone="[^"]*"/, `data-time="${moment}" data-zone="${zone}"`)
+      .replace(/(var vornLeastModifyData = \[\n.*')\d+(' \],?\n)/, `$1${moment}$2`);
+    await withPage(page, async view => {
+      const plain = async selector => (await view.locator(selector).first().innerText()).replaceAll('\u202f', ' ');
+      assert.deepEqual([await plain('header time'), await plain('#least_modify td.changed'), await plain('.zone')],
+                       [time, time, named]);
+    }, {timezoneId: 'Pacific/Auckland'});
+  }
+});

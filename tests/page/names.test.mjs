@@ -1,0 +1,61 @@
+// Names that anybody may have chosen: inert, shown as they are, and whole on the clipboard.
+import assert from 'node:assert/strict';
+import http from 'node:http';
+import test from 'node:test';
+
+import {fileOf, read, section, withPage} from './browser.mjs';
+
+const names = JSON.parse(read('', 'names.json'));  // path, and how it is to be shown
+
+// Over http on loopback, where a page may use the clipboard.
+async function withClipboard(name, work) {
+  const server = http.createServer((_, response) => response.setHeader('content-type', 'text/html').end(read(name)));
+  await new Promise(resolve => server.listen(0, '127.0.0.1', resolve));
+  await withPage(read(name), page => work(page, () => page.evaluate(() => navigator.clipboard.readText())), {
+    address: `http://127.0.0.1:${server.address().port}/`, permissions: ['clipboard-read', 'clipboard-write']});
+  server.close();
+}
+
+test('names are shown exactly and do nothing', () => withPage(fileOf('hostile'), async page => {
+  assert.match(await page.title(), /^Storage report – /);
+  assert.equal(await page.locator('main img, main script, main iframe, main a[href^="http"]').count(), 0);
+  const rows = await page.$$eval('#large_file tbody .path bdi', all => all.map(each => {
+    each.querySelectorAll('.chip').forEach(chip => { chip.textContent = `[${chip.textContent}]`; });
+    return each.textContent;
+  }));
+  const paths = rows.reduce((all, each, i) => i % 2 ? [...all.slice(0, -1), all.at(-1) + each] : [...all, each], []);
+  assert.deepEqual(paths.slice(1, 1 + names.length), names.map(([, shown]) => shown));
+  // The two shares, by their volume; and accounts that are no names of JavaScript.
+  assert.deepEqual((await section(page, 'share_list')).rows.map(row => row[0]), ['big & small', 'docs']);
+  assert.deepEqual((await section(page, 'file_group')).captions, ['All files', 'john-doe', '007']);
+  assert.equal((await section(page, 'duplicate_file')).heading, 'Confirmed duplicates (same content)');
+}));
+
+test('the clipboard gets the names themselves', () => withClipboard('hostile', async (page, clipboard) => {
+  await page.locator('#large_file .more').click();
+  for (const [i, [path]] of names.entries()) {
+    const line = page.locator('#large_file tbody tr').nth(i + 1);
+    await line.locator('.copy').click();
+    await line.locator('.said').waitFor();
+    const copied = await clipboard();
+    if (/[\udc80-\udcff]/.test(path)) {
+      assert.equal(copied, `$'${path.replace(/'/g, "\\'").replace('\udcff', '\\xff').replace('\udcc3', '\\xc3')}'`);
+    } else {
+      assert.equal(copied, path);
+      await page.evaluate(at => {
+        const cell = document.querySelectorAll('#large_file tbody tr')[at].querySelector('.path > span');
+        getSelection().selectAllChildren(cell);
+      }, i + 1);
+      await page.evaluate(() => navigator.clipboard.writeText(''));
+      await page.keyboard.press('Control+C');
+      await page.waitForFunction(() => navigator.clipboard.readText());
+      // The system's clipboard may take control characters from a text without chips only.
+      assert.equal(await clipboard(), path);
+    }
+  }
+  // Rows: a line each, cells parted by tabs, and no words of buttons.
+  await page.evaluate(() => getSelection().selectAllChildren(document.querySelector('#large_file tbody')));
+  await page.keyboard.press('Control+C');
+  const lines = await clipboard();
+  assert.ok(lines.includes(`\tbig & small`) && lines.includes('\u202egpj.exe\t'), lines);
+}));

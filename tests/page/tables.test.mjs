@@ -1,0 +1,82 @@
+// Tables and drawings under the hands of a reader.
+import assert from 'node:assert/strict';
+import test from 'node:test';
+
+import {choose, fileOf, read, section, textOf, withBlock, withPage} from './browser.mjs';
+
+const shares = withBlock(read('hostile'), 'vornShareListData', `[\n${[
+  ['b', '/x', 1024], ['a10', '/', 5], ['Ä', '/', 'nan'], ['a9', '/', 1048576], ['c', '/x', 0], ['d', '/', 2000]].map(
+  ([name, volume, size]) => `[ '${name}', '${volume}', '${size}' ]`).join(',\n')}\n];\n</script>\n`);
+
+// What is unknown comes last either way.
+test('sorting, by number and by text, both ways', () => withPage(shares, async page => {
+  const shown = async () => (await section(page, 'share_list')).rows.map(row => row[0]).join(' ');
+  const sorted = () => page.$$eval('#share_list thead th', all => all.map(each => each.getAttribute('aria-sort')));
+  const [share, size, volume] = await page.locator('#share_list thead button').all();
+  for (const [header, names, states] of [
+    [size, 'c a10 b d a9 Ä', [null, 'ascending', null]], [size, 'a9 d b a10 c Ä', [null, 'descending', null]],
+    [share, 'Ä a9 a10 b c d', ['ascending', null, null]], [share, 'd c b a10 a9 Ä', ['descending', null, null]],
+    [volume, 'd a10 a9 Ä c b', [null, null, 'ascending']]]) {
+    await header.press('Enter');
+    assert.equal(await shown(), names);
+    assert.deepEqual(await sorted(), states);
+  }
+}));
+
+test('filtering, and all rows', () => withPage(fileOf('big'), async page => {
+  const table = page.locator('#large_file .table');
+  const visible = () => table.locator('tbody tr:visible').count();
+  assert.equal(await visible(), 10);
+  const count = table.locator('[role=status].count');
+  assert.equal(await count.innerText(), '200 of 200');
+  await table.locator('.more').click();
+  assert.equal(await visible(), 200);
+  await table.locator('input').fill('.ISO');
+  const found = await visible();
+  assert.ok(found > 0 && found < 50);
+  assert.equal(await count.innerText(), `${found} of 200`);
+  for (const name of await textOf(page, '#large_file tbody tr:visible .name')) {
+    assert.match(name, /\.iso$/);
+  }
+  await table.locator('input').fill('no such');
+  assert.deepEqual([await visible(), await count.innerText()], [0, '0 of 200']);
+  assert.deepEqual((await section(page, 'large_file')).notes, ['These are the first 200 rows. The CSV file holds more.']);
+  assert.deepEqual(await page.$$eval('a.csv', all => all.map(each => each.getAttribute('href')).sort()), [
+    'duplicate_file', 'file_owner', 'large_file', 'least_modify', 'most_modify', 'share_list', 'volume_usage'].map(
+    name => `csv/${name}.csv`));
+}));
+
+test('sizes tell their bytes to the keyboard', () => withPage(shares, async page => {
+  const [share, , volume] = await page.locator('#share_list thead button').all();
+  await share.click();  // for an order in which the stop is another row
+  await volume.press('Tab');
+  for (const bytes of ['1,048,576', '5', '1,024', '0', '2,000', '2,000']) {
+    assert.equal(await page.evaluate(() => getComputedStyle(document.activeElement, '::after').content), `"${bytes} bytes"`);
+    await page.keyboard.press('ArrowDown');
+  }
+  assert.equal(await page.locator('#share_list .bytes[tabindex="0"]').count(), 1);
+}));
+
+test('the treemap is one stop, in which arrows move', () => withPage(fileOf('big'), async page => {
+  assert.equal(await page.locator('.treemap [tabindex="0"]').count(), 1);
+  await page.locator('.treemap [tabindex="0"]').focus();
+  const seen = new Set();
+  for (const key of ['ArrowRight', 'ArrowDown', 'ArrowLeft', 'ArrowUp', 'ArrowRight', 'ArrowRight', 'ArrowRight', 'ArrowRight']) {
+    await page.keyboard.press(key);
+    const label = await page.evaluate(() => document.activeElement.getAttribute('aria-label'));
+    assert.equal(await page.locator('.chosen').innerText(), label);
+    seen.add(label);
+  }
+  assert.ok(seen.size > 4, [...seen].join('\n'));
+  await page.keyboard.press('Tab');
+  assert.equal(await page.evaluate(() => document.activeElement.closest('.treemap')), null);
+}));
+
+test('every drawing has its data as a table', () => withPage(fileOf('big'), async page => {
+  for (const [name, drawing] of [['volume_usage', '.history'], ['share_list', '.treemap'], ['file_group', '.stack']]) {
+    assert.ok(await page.locator(`#${name} ${drawing}`).count() > 0, name);
+    await page.locator(`#${name} summary`).first().click({timeout: 1000}).catch(() => {});
+    assert.ok(await page.locator(`#${name} table:visible tbody tr`).count() > 5, name);
+  }
+  await choose(page, 'de');
+}));
