@@ -1,10 +1,13 @@
 #include "run_watch.hpp"
 
-#include <sqlite3.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
-#include <memory>
+#include <vector>
 
+#include "file_io.hpp"
 #include "run_paths.hpp"
 #include "words.hpp"
 
@@ -14,12 +17,35 @@ namespace {
 constexpr std::size_t kLongestLine = 16384;
 constexpr std::size_t kKeptComplaints = 5;
 
-struct CloseDb {
-  void operator()(sqlite3* db) const { sqlite3_close(db); }
-};
-struct Finalize {
-  void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
-};
+using Page = std::vector<unsigned char>;
+
+// The number in SQLite's form of variable length at `at`, which moves behind it.
+std::uint64_t take_varint(const Page& page, std::size_t& at) {
+  constexpr int kLongest = 9;
+  std::uint64_t value = 0;
+  for (int i = 0; i < kLongest && at < page.size(); ++i) {
+    const unsigned char byte = page[at++];
+    value = i + 1 == kLongest ? value << 8U | byte : value << 7U | (byte & 0x7FU);
+    if ((byte & 0x80U) == 0) {
+      break;
+    }
+  }
+  return value;
+}
+
+// The number of the last row on a leaf page of a table; 0 for any other page.
+std::int64_t last_row(const Page& page) {
+  constexpr unsigned char kTableLeaf = 13;
+  constexpr std::size_t kHeader = 8;
+  const std::size_t cells = std::size_t{page[3]} << 8U | page[4];
+  const std::size_t pointer = kHeader + 2 * cells;
+  if (page[0] != kTableLeaf || cells == 0 || pointer > page.size()) {
+    return 0;
+  }
+  std::size_t at = std::size_t{page[pointer - 2]} << 8U | page[pointer - 1];
+  take_varint(page, at);  // the row's size
+  return static_cast<std::int64_t>(take_varint(page, at));
+}
 
 // Takes `prefix` off the text, if it stands there.
 bool take(std::string_view& text, std::string_view prefix) {
@@ -105,7 +131,7 @@ std::string RunWatch::progress() const {
       return profile_ + ": counting files in " + share_ + files;
     case Phase::reporting:
       return profile_ + ": report " + std::to_string(report_number_) + " of " +
-             std::to_string(reports_) + ", " + report_ + files;
+             std::to_string(reports_) + ", " + report_;
     case Phase::assembling:
       return profile_ + ": putting the page together";
     case Phase::publishing:
@@ -114,26 +140,28 @@ std::string RunWatch::progress() const {
   return profile_ + ": sending";
 }
 
-// Opened as a file that nobody changes, so that no lock is taken: one would make the run's commits
-// wait. What is read may be older than what the run knows by now, or unusable while it writes; then
-// the last number stays.
+// The rows of a share are one transaction, which no reader sees before its end, and a reader's lock
+// would make its commit wait. But rows are numbered, only ever added, and written out as the cache
+// fills: the number of the last row on the last pages of the file tells how many there are.
 void RunWatch::count_files() {
-  if (phase_ != Phase::gathering) {
+  constexpr off_t kPagesLookedAt = 16;
+  constexpr std::size_t kPageSizeAt = 16;
+  unsigned char head[kPageSizeAt + 2];
+  const host::Fd file(open(host::statistics_path(profile_).c_str(),
+                           O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+  struct stat status {};
+  if (phase_ != Phase::gathering || !file || fstat(file.get(), &status) != 0 ||
+      pread(file.get(), head, sizeof head, 0) != static_cast<ssize_t>(sizeof head)) {
     return;
   }
-  const std::string uri = "file:" + host::statistics_path(profile_) + "?immutable=1";
-  sqlite3* opened = nullptr;
-  const int flags = SQLITE_OPEN_READONLY | SQLITE_OPEN_URI;
-  const int result = sqlite3_open_v2(uri.c_str(), &opened, flags, nullptr);
-  const std::unique_ptr<sqlite3, CloseDb> db(opened);
-  sqlite3_stmt* prepared = nullptr;
-  if (result != SQLITE_OK || sqlite3_prepare_v2(db.get(), "SELECT max(id) FROM file_stat", -1,
-                                                &prepared, nullptr) != SQLITE_OK) {
-    return;
-  }
-  const std::unique_ptr<sqlite3_stmt, Finalize> statement(prepared);
-  if (sqlite3_step(statement.get()) == SQLITE_ROW) {
-    files_ = std::max(files_, static_cast<std::int64_t>(sqlite3_column_int64(statement.get(), 0)));
+  const std::size_t size = std::size_t{head[kPageSizeAt]} << 8U | head[kPageSizeAt + 1];
+  Page page(std::max<std::size_t>(size, 512));
+  const off_t pages = status.st_size / static_cast<off_t>(page.size());
+  for (off_t i = pages; i > 1 && i > pages - kPagesLookedAt; --i) {
+    if (pread(file.get(), page.data(), page.size(), (i - 1) * static_cast<off_t>(page.size())) ==
+        static_cast<ssize_t>(page.size())) {
+      files_ = std::max(files_, last_row(page));
+    }
   }
 }
 
