@@ -10,11 +10,12 @@ foreach(name vornreport.conf share.conf)
 endforeach()
 
 file(COPY ${CMAKE_CURRENT_LIST_DIR}/copyright ${CMAKE_CURRENT_LIST_DIR}/changelog
-  DESTINATION ${doc} FILE_PERMISSIONS OWNER_READ OWNER_WRITE GROUP_READ WORLD_READ)
+  DESTINATION ${doc})
 file(COPY ${CMAKE_CURRENT_LIST_DIR}/lintian-overrides
-  DESTINATION ${root}/usr/share/lintian/overrides
-  FILE_PERMISSIONS OWNER_READ OWNER_WRITE GROUP_READ WORLD_READ)
+  DESTINATION ${root}/usr/share/lintian/overrides)
 file(RENAME ${root}/usr/share/lintian/overrides/lintian-overrides
   ${root}/usr/share/lintian/overrides/vornreport)
 file(GLOB pages ${root}/usr/share/man/man?/*.[1-9])
 execute_process(COMMAND gzip -9 -n ${doc}/changelog ${pages} COMMAND_ERROR_IS_FATAL ANY)
+# Whatever the umask of whoever builds it.
+execute_process(COMMAND chmod -R u=rwX,go=rX ${root} COMMAND_ERROR_IS_FATAL ANY)

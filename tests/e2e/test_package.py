@@ -35,7 +35,7 @@ class Package(unittest.TestCase):
         folder = tempfile.TemporaryDirectory(prefix='vorn-', dir='/var/tmp')
         cls.addClassCleanup(folder.cleanup)
         cls.folder = Path(folder.name)
-        call('cpack', '--config', BUILD / 'CPackConfig.cmake', '-B', cls.folder)
+        call('cpack', '--config', BUILD / 'CPackConfig.cmake', '-B', cls.folder, umask=0o077)
         cls.package, = cls.folder.glob('*.deb')
         cls.later, tree = cls.folder / 'later', cls.folder / 'tree'
         call('dpkg-deb', '--raw-extract', cls.package, tree)
@@ -45,6 +45,7 @@ class Package(unittest.TestCase):
         # All that is mounted from now on goes with this process.
         assert ctypes.CDLL(None).unshare(CLONE_NEWNS) == 0
         call('mount', '--make-rprivate', '/')
+        call('mount', '-t', 'tmpfs', 'private', '/run')  # systemd-nspawn notes there what it runs
 
     def setUp(self):
         self.base = Path(tempfile.mkdtemp(dir=self.folder))
@@ -131,8 +132,9 @@ class Package(unittest.TestCase):
     def serve_mail(self, mails):
         """A mail server on loopback; its port."""
         mails.mkdir()
-        server = subprocess.Popen(['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py', mails],
-                                  stdout=subprocess.PIPE, text=True)
+        server = subprocess.Popen(
+            ['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py', mails],
+            stdout=subprocess.PIPE, text=True)
         self.addCleanup(server.communicate)
         self.addCleanup(server.terminate)
         return int(server.stdout.readline())
@@ -197,7 +199,7 @@ class Package(unittest.TestCase):
         own.write_text('[Service]\nReadWritePaths=/srv/elsewhere\nSupplementaryGroups=users\n')
         timers, log, remaining = self.boot(self.quota_volume(), """
 systemctl start vornreport-data@global vornreport@home vornreport@elsewhere
-! systemctl start vornreport@denied >/dev/null 2>&1
+if systemctl start vornreport@denied >/dev/null 2>&1; then exit 1; fi
 systemctl --quiet enable --now vornreport@home.timer vornreport-data@global.timer
 systemctl list-timers --no-legend
 echo ---
