@@ -172,6 +172,28 @@ class Package(unittest.TestCase):
             shutil.rmtree(path)
         self.assertEqual(self.left(), [])
 
+    def test_readme(self):
+        """README's everyday commands do what it shows, up to dates, numbers and blanks."""
+        def normal(text):
+            return re.sub(r'[0-9.]+', '0', re.sub(' +', ' ', text))
+        for name in ('photos', 'projects'):
+            share = self.root / 'srv' / name
+            share.mkdir(parents=True)
+            (share / 'file').write_bytes(b'x' * 1000)
+        shutil.copy(self.package, self.root / 'vornreport_0.1.0_amd64.deb')
+        for name in ('proc', 'dev'):
+            call('mount', '--rbind', f'/{name}', self.root / name)
+        text = (ROOT / 'README.md').read_text().split('## Every day\n')[1].split('\n## ')[0]
+        transcript = ''.join(re.findall('^    (.*\n)', text, re.MULTILINE))
+        steps = re.findall('^# (.*)\n((?:[^#].*\n)*)', transcript, re.MULTILINE)
+        self.assertEqual([command.split()[0] for command, _ in steps],
+                         ['apt-get'] + 8 * ['vornctl'] + ['apt-get'])
+        for command, shown in steps:
+            output = call('chroot', self.root, 'sh', '-c', f'cd /; {command}', env=ENVIRONMENT)
+            if not command.startswith('apt-get'):
+                self.assertEqual(normal(output), normal(shown), command)
+        self.assertFalse((self.root / 'usr/vorn').exists())
+
     def test_units(self):
         """The units forbid nothing that a run needs, and leave with the package."""
         self.dpkg('--install', self.package)

@@ -35,17 +35,18 @@ function totalsOf(rows) {
   return bySize([...totals.values()].map(total => total.map(String)), 2);
 }
 
-// The groups of duplicates: {number, file, count, size, frees}, which names one of the files.
+// The groups of duplicates: {number, size, files, frees}. A file that two shares hold in common is
+// one file.
 export function groupsOf(rows) {
   const groups = new Map();
   for (const [number, , file, size] of rows) {
-    const group = groups.get(number) ?? {number, file, size, count: 0, frees: 0n};
-    if (group.count++ > 0 && format.isNumber(size)) {
-      group.frees += BigInt(size);
-    }
+    const group = groups.get(number) ?? {number, size, files: new Set()};
+    group.files.add(file);
     groups.set(number, group);
   }
-  return [...groups.values()];
+  return [...groups.values()].map(group => ({
+    ...group,
+    frees: format.isNumber(group.size) ? BigInt(group.size) * BigInt(group.files.size - 1) : 0n}));
 }
 
 function showDuplicates(data) {
@@ -55,8 +56,9 @@ function showDuplicates(data) {
   return [
     table([['group', 'count'], ['file', 'name'], ['copies', 'count'], ['size', 'size'],
            ['frees', 'size']],
-          groups.map(group => [group.number, group.file.slice(group.file.lastIndexOf('/') + 1),
-                               String(group.count), group.size, String(group.frees)]),
+          groups.map(({number, files: [file], size, files, frees}) => [
+            number, file.slice(file.lastIndexOf('/') + 1), String(files.size), size,
+            String(frees)]),
           {caption: format.say('reclaim'), sorted: 4}),
     table([['group', 'count'], ...FILES], pick(rows, 0, 2, 3, 4, 1),
           {caption: data.heading, csv: csvOf('duplicate_file')})];
