@@ -1,7 +1,7 @@
 # `cpack` makes a Debian package of a release build. What differs from `cmake --install` (see
 # stage.cmake) is put in order in CPack's own copy of the installation.
 set(CPACK_GENERATOR DEB)
-set(CPACK_PACKAGE_CONTACT "vornreport maintainers <maintainers@users.noreply.c-seed-cf342c98.example>")
+set(CPACK_PACKAGE_CONTACT "vornreport maintainers <maintainers@vornreport.example>")
 set(CPACK_SET_DESTDIR ON)
 set(CPACK_INSTALL_PREFIX /usr)
 set(CPACK_STRIP_FILES ON)
