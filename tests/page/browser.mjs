@@ -3,6 +3,7 @@
 import assert from 'node:assert/strict';
 import {execFileSync} from 'node:child_process';
 import fs from 'node:fs';
+import http from 'node:http';
 import {createRequire} from 'node:module';
 import path from 'node:path';
 import {after, before} from 'node:test';
@@ -82,27 +83,38 @@ export async function choose(page, language) {
 
 export const textOf = (page, selector) => page.locator(selector).allInnerTexts();
 
-// Numbers and times that a slip of arithmetic would leave anywhere, attributes and all.
+// No slip of arithmetic may leave its traces anywhere, attributes and all.
 export async function assertSensible(page) {
-  for (const language of LANGUAGES) {
-    await choose(page, language);
-    const html = await page.evaluate(() => document.querySelector('header').outerHTML +
-      document.querySelector('main').outerHTML);
-    const found = /.{0,80}(NaN|Infinity|undefined|\bnull\b|(?<![\d.,])1970(?![\d.,])).{0,80}/.exec(html);
-    assert.equal(found?.[0], undefined, language);
-  }
+  const found = await page.evaluate(() => {
+    const choice = document.querySelector('header select');
+    return [...choice.options].map(({value}) => {
+      const select = document.querySelector('header select');
+      select.value = value;
+      select.dispatchEvent(new Event('change'));
+      const html = document.querySelector('header').outerHTML + document.querySelector('main').outerHTML;
+      return /.{0,80}(NaN|Infinity|undefined|\bnull\b|(?<![\d.,])1970(?![\d.,])).{0,80}/.exec(html)?.[0];
+    });
+  });
+  assert.deepEqual(found, LANGUAGES.map(() => undefined));
   await choose(page, 'en');
 }
 
-// What a reader finds in a section: notes, captions of its tables, and their rows of cells.
-export const section = (page, name) => page.evaluate(id => {
-  const part = document.getElementById(id);
-  const texts = (root, selector) => [...root.querySelectorAll(selector)].map(
-    element => element.textContent);
-  part.querySelectorAll('details').forEach(details => { details.open = true; });
-  return {
-    heading: part.querySelector('h2').textContent, notes: texts(part, '.note'),
-    captions: texts(part, 'caption'),
-    rows: [...part.querySelectorAll('tbody tr')].map(row => texts(row, 'th, td'))
-  };
-}, name);
+// What a reader finds in each section: notes, captions of its tables, and their rows of cells.
+export const sections = page => page.evaluate(() => Object.fromEntries(
+  [...document.querySelectorAll('section[data-report]')].map(part => {
+    const texts = (root, selector) => [...root.querySelectorAll(selector)].map(
+      element => element.textContent.replaceAll('\u00a0', ' '));
+    return [part.id, {
+      heading: part.querySelector('h2').textContent, notes: texts(part, '.note'),
+      captions: texts(part, 'caption'),
+      rows: [...part.querySelectorAll('tbody tr')].map(row => texts(row, 'th, td'))}];
+  })));
+export const section = async (page, name) => (await sections(page))[name];
+
+// A server of a page, on loopback.
+export async function serve(text, work) {
+  const server = http.createServer((_, response) => response.setHeader('content-type', 'text/html').end(text));
+  await new Promise(resolve => server.listen(0, '127.0.0.1', resolve));
+  await work(`http://127.0.0.1:${server.address().port}/`);
+  server.close();
+}

@@ -2,11 +2,10 @@
 // server's time zone.
 import assert from 'node:assert/strict';
 import fs from 'node:fs';
-import http from 'node:http';
 import path from 'node:path';
 import test from 'node:test';
 
-import {ALL, assertSensible, choose, fileOf, LANGUAGES, read, SOURCE, textOf, withPage} from './browser.mjs';
+import {ALL, assertSensible, choose, fileOf, LANGUAGES, read, serve, SOURCE, textOf, withPage} from './browser.mjs';
 
 const PAGES = ['big', 'empty', 'hostile', 'broken'];
 const big = read('big');
@@ -17,11 +16,7 @@ test('nothing is asked for or said, wherever the page lies', async t => {
       assert.deepEqual(await page.$$eval('section[data-report]', all => all.map(each => each.dataset.report)), ALL);
     }));
   }
-  const server = http.createServer((_, response) => response.setHeader('content-type', 'text/html').end(big));
-  await new Promise(resolve => server.listen(0, '127.0.0.1', resolve));
-  const address = `http://127.0.0.1:${server.address().port}/report.html`;
-  await withPage(big, page => page.locator('.card').first().waitFor(), {address});
-  server.close();
+  await serve(big, address => withPage('', page => page.locator('.card').first().waitFor(), {address}));
   const [, style] = /<style>([^]*?)<\/style>/.exec(big), [script] = big.match(/<script>[^]*?<\/script>/g).slice(-1);
   assert.ok(Buffer.byteLength(style + script) <= 120 << 10, 'script and style');
 });

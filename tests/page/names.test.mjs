@@ -1,20 +1,15 @@
 // Names that anybody may have chosen: inert, shown as they are, and whole on the clipboard.
 import assert from 'node:assert/strict';
-import http from 'node:http';
 import test from 'node:test';
 
-import {fileOf, read, section, withPage} from './browser.mjs';
+import {fileOf, read, section, serve, withPage} from './browser.mjs';
 
 const names = JSON.parse(read('', 'names.json'));  // path, and how it is to be shown
 
 // Over http on loopback, where a page may use the clipboard.
-async function withClipboard(name, work) {
-  const server = http.createServer((_, response) => response.setHeader('content-type', 'text/html').end(read(name)));
-  await new Promise(resolve => server.listen(0, '127.0.0.1', resolve));
-  await withPage(read(name), page => work(page, () => page.evaluate(() => navigator.clipboard.readText())), {
-    address: `http://127.0.0.1:${server.address().port}/`, permissions: ['clipboard-read', 'clipboard-write']});
-  server.close();
-}
+const withClipboard = (name, work) => serve(read(name), address => withPage(
+  '', page => work(page, () => page.evaluate(() => navigator.clipboard.readText())),
+  {address, permissions: ['clipboard-read', 'clipboard-write']}));
 
 test('names are shown exactly and do nothing', () => withPage(fileOf('hostile'), async page => {
   assert.match(await page.title(), /^Storage report – /);
