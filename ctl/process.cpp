@@ -6,6 +6,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <csignal>
@@ -72,10 +73,9 @@ std::vector<std::string> c_environment() {
 }
 
 std::vector<char*> pointers(std::vector<std::string>& texts) {
-  std::vector<char*> found;
-  for (std::string& text : texts) {
-    found.push_back(text.data());
-  }
+  std::vector<char*> found(texts.size());
+  std::transform(texts.begin(), texts.end(), found.begin(),
+                 [](std::string& text) { return text.data(); });
   found.push_back(nullptr);
   return found;
 }

@@ -40,10 +40,10 @@ void check_together(const Section& profile) {
 
 // `profile` with the changes.
 Section changed(Section profile, const Changes& changes) {
-  for (const auto& [key, value] : changes) {
-    std::erase_if(profile.entries, [&](const auto& entry) { return entry.first == key; });
-    if (value) {
-      profile.entries.emplace_back(key, *value);
+  for (const auto& change : changes) {
+    std::erase_if(profile.entries, [&](const auto& entry) { return entry.first == change.first; });
+    if (change.second) {
+      profile.entries.emplace_back(change.first, *change.second);
     }
   }
   return profile;

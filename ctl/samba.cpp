@@ -170,14 +170,12 @@ std::vector<SambaShare> samba_shares(UserShares user_shares) {
   }
   std::erase_if(services, is_global);
   if (user_shares == UserShares::included) {
-    for (Service& service : user_services(global)) {
-      services.push_back(std::move(service));
-    }
+    const std::vector<Service> more = user_services(global);
+    services.insert(services.end(), more.begin(), more.end());
   }
-  std::vector<SambaShare> shares;
-  for (const Service& service : services) {
-    shares.push_back(judged(service, global));
-  }
+  std::vector<SambaShare> shares(services.size());
+  std::transform(services.begin(), services.end(), shares.begin(),
+                 [&](const Service& service) { return judged(service, global); });
   return shares;
 }
 
