@@ -83,7 +83,9 @@ CronTimes parse_times(const std::string& option, const std::string& text) {
 // Where cron mails what a job prints is left to the machine (MAILTO, else the owner, root). The
 // progress on standard output is dropped, so that a mail comes only when a command complained.
 std::string job_line(const std::string& profile, JobKind kind, const std::string& times) {
-  return times + " root " + kProgram + " " + option_of(kind) + " " + profile + " >/dev/null\n";
+  // A removed package leaves its schedules: they are silent then.
+  return times + " root [ ! -x " + kProgram + " ] || " + kProgram + " " + option_of(kind) + " " +
+         profile + " >/dev/null\n";
 }
 
 void write_cron_file(const std::string& path, const std::string& text) {

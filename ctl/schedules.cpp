@@ -47,16 +47,17 @@ std::optional<Job> job_in(const std::string& file, std::string_view line) {
   }
   Job job{file, JobKind::report, {}, take_times(line)};
   take_word(line);  // the user
-  // The program may stand behind others: nice, ionice, flock...
-  while (!line.empty() && take_word(line) != kProgram) {
+  // The program may stand behind others: a test that it is there, nice, ionice, flock...
+  for (std::string_view before; !line.empty();) {
+    const std::string_view word = take_word(line);
+    if (before == kProgram && (word == "--report" || word == "--data")) {
+      job.kind = word == "--data" ? JobKind::data : JobKind::report;
+      job.profile = take_word(line);
+      break;
+    }
+    before = word;
   }
-  const std::string_view option = take_word(line);
-  job.profile = take_word(line);
-  if (job.profile.empty() || (option != "--report" && option != "--data")) {
-    return std::nullopt;
-  }
-  job.kind = option == "--data" ? JobKind::data : JobKind::report;
-  return job;
+  return job.profile.empty() ? std::nullopt : std::optional(std::move(job));
 }
 
 template <typename Visit>

@@ -152,7 +152,8 @@ class Schedules(CtlTest):
 
     def test_schedule(self):
         def job(times, option, profile):
-            return f'{times} root {PROGRAM} {option} {profile} >/dev/null\n'
+            return (f'{times} root [ ! -x {PROGRAM} ] || {PROGRAM} {option} {profile} '
+                    '>/dev/null\n')
         self.m.profile('a.b', report_list='volume_usage', schedule_collect_id='has.dots')
         self.m.profile('own', report_list='volume_usage', schedule_collect_id='job1')
         (self.m.cron / 'vornreport-job1').write_text('0 0 * * * root backup\n')
