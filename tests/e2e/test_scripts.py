@@ -29,7 +29,7 @@ class Sources(unittest.TestCase):
         for folder, forbidden, exempt in (
                 ('src', r'platform/|host/', ''), ('include', r'platform/|host/', ''),
                 ('platform', r'vornreport/|src/|report_frame|file_gathering|rep_', ''),
-                ('include', r'rep_|file_gathering/', ''),
+                ('include', r'rep_|file_gathering/', ''), ('ctl', r'src/|rep_|file_gathering/', ''),
                 ('src', r'rep_', r'registry\.cpp|global\.cpp')):
             for path in (ROOT / folder).rglob('*.[ch]*'):
                 for include in re.findall(r'^\s*#\s*include\s*["<](.*)[">]', path.read_text(),
