@@ -34,6 +34,8 @@ test('narrow and zoomed, nothing is cut off', async t => {
           await choose(page, language);
           await open(page, true);
           const {width} = options.viewport;
+          const today = name === 'big' && await page.locator('.history .today').boundingBox();
+          assert.ok(!today || (today.x > 0 && today.x < width), 'today is in view');
           assert.ok(await page.evaluate(() => document.documentElement.scrollWidth) <= width, language);
           for (const cell of ['th.file .name', 'td.size .bytes']) {
             const box = await page.locator(`#large_file tbody tr:visible ${cell}`).first().boundingBox();

@@ -119,6 +119,8 @@ function render() {
   main.replaceChildren(
     navigation(names), firstLook(volumes), ...names.map(name => written.get(name)),
     h('footer', {}, h('p', {}, format.say('units', {zone: format.currentZone()}))));
+  // Where the drawing is wider than the screen, the time to come is what matters.
+  main.querySelector('.history')?.parentElement.scrollTo({left: 1e6});
 }
 
 format.loadDictionaries(document);
