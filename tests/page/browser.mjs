@@ -21,9 +21,9 @@ export const axe = fs.readFileSync(require.resolve('axe-core/axe.min.js'), 'utf8
 export const fileOf = (name, file = 'report.html') => path.join(process.env.VORN_PAGES, name, file);
 export const read = (name, file) => fs.readFileSync(fileOf(name, file), 'utf8');
 
-let browser, folder, copies = 0;
+const folder = fs.mkdtempSync('/var/tmp/vorn-page-');
+let browser, copies = 0;
 before(async () => {
-  folder = fs.mkdtempSync('/var/tmp/vorn-page-');
   browser = await chromium.launch({
     executablePath: '/usr/bin/chromium', env: {...process.env, HOME: folder},
     args: ['--headless', '--no-sandbox', '--disable-gpu', '--disable-quic', '--no-first-run',

@@ -44,7 +44,6 @@ test('the clipboard gets the names themselves', () => withClipboard('hostile', a
       await page.evaluate(() => navigator.clipboard.writeText(''));
       await page.keyboard.press('Control+C');
       await page.waitForFunction(() => navigator.clipboard.readText());
-      // The system's clipboard may take control characters from a text without chips only.
       assert.equal(await clipboard(), path);
     }
   }
