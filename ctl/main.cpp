@@ -1,5 +1,6 @@
 // vornctl: administration of the reports on a host.
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <clocale>
 #include <cstdio>
 #include <cstdlib>
@@ -12,6 +13,22 @@ namespace {
 
 constexpr const char* kFooter =
     "Exit status: 0 fine, 1 failed, 2 wrong usage. Every command is described in vornctl(8).";
+
+// Names a word that is no command; the parser only says that one is missing.
+void check_commands(const CLI::App& app, int argc, char** argv) {
+  const CLI::App* group = &app;
+  for (int i = 1; i < argc && *argv[i] != '-' && group->get_require_subcommand_min() > 0; ++i) {
+    const auto commands = group->get_subcommands([](const CLI::App*) { return true; });
+    const auto named = std::find_if(commands.begin(), commands.end(), [&](const CLI::App* command) {
+      return command->check_name(argv[i]);
+    });
+    if (named == commands.end()) {
+      throw ctl::Failure('"' + std::string(argv[i]) + "\" is no command; see vornctl --help",
+                         ctl::kWrongUsage);
+    }
+    group = *named;
+  }
+}
 
 void run(int argc, char** argv) {
   CLI::App app("Administration of vornreport: shares, profiles, runs and reports.", "vornctl");
@@ -31,6 +48,7 @@ void run(int argc, char** argv) {
     ctl::complete(app, {argv + 2, argv + argc});
     return;
   }
+  check_commands(app, argc, argv);
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {

@@ -55,7 +55,7 @@ struct NewProfile {
   std::string name;
   std::map<std::string, std::string, std::less<>> values;  // by key
   std::string duplicates;
-  bool history = false;
+  bool no_history = false;
 };
 
 void add_profile(NewProfile profile) {
@@ -69,7 +69,7 @@ void add_profile(NewProfile profile) {
     }
   }
   profile.values["duplicate_compare"] = profile.duplicates == "content" ? "true" : "";
-  profile.values["volume_history"] = profile.history ? "true" : "";
+  profile.values["volume_history"] = profile.no_history ? "" : "true";
   Changes entries;
   for (const ProfileKey& key : profile_keys()) {
     if (const std::string value = checked_value(key, profile.values[key.name]); !value.empty()) {
@@ -96,7 +96,7 @@ void describe_add(CLI::App& group) {
       ->check([](const std::string& word) {
         return word == "name" || word == "content" ? "" : "write name or content";
       });
-  add.add_flag("--history", profile->history, "Show history and forecast of volumes");
+  add.add_flag("--no-history", profile->no_history, "Show no history and forecast of volumes");
   add.callback([profile] { add_profile(std::move(*profile)); });
 }
 

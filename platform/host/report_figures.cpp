@@ -91,23 +91,54 @@ class HistoryBlock : public Block {
       return Line::damaged;
     }
     double percent = 0;
+    const auto date = number_of((*row)[0]);
     const std::string& text = (*row)[1];
-    if (std::from_chars(text.data(), text.data() + text.size(), percent).ec == std::errc()) {
-      samples_->now = samples_->now.value_or(percent);  // the first; older ones follow
-      samples_->has_grown = samples_->has_grown || percent < *samples_->now;
+    if (date &&
+        std::from_chars(text.data(), text.data() + text.size(), percent).ec == std::errc()) {
+      samples_->add(static_cast<double>(*date), percent);
     }
     return Line::row;
   }
 
-  bool has_grown(const std::string& volume) const {
+  // What the page's `days`, which is 0 for two of these, means. The page's script judges alike.
+  Outlook outlook(const std::string& volume, std::uint64_t days) const {
+    constexpr std::uint64_t kMostSensibleDays = 36525;
+    if (days > 0) {
+      return days <= kMostSensibleDays ? Outlook::days : Outlook::no_growth;
+    }
     const auto found = volumes_.find(volume);
-    return found != volumes_.end() && found->second.has_grown;
+    return found == volumes_.end() ? Outlook::unknown : found->second.outlook();
   }
 
  private:
-  struct Samples {
-    std::optional<double> now;
-    bool has_grown = false;
+  // The newest sample comes first.
+  class Samples {
+   public:
+    void add(double date, double percent) {
+      if (!newest_) {
+        newest_ = date;
+        percent_ = percent;
+      }
+      oldest_ = date;
+      if (daily_growth_ == 0 && percent < percent_ && date < *newest_) {
+        daily_growth_ = (percent_ - percent) / (*newest_ - date) * kDay;
+      }
+    }
+    Outlook outlook() const {
+      constexpr double kShortestHistory = 3600;  // a first run stores a sample of its own
+      if (!newest_ || *newest_ - oldest_ < kShortestHistory) {
+        return Outlook::unknown;
+      }
+      constexpr double kSoon = 1.5;  // days; the program's estimate is cut down to whole ones
+      return daily_growth_ * kSoon > 100 - percent_ ? Outlook::soon : Outlook::no_growth;
+    }
+
+   private:
+    static constexpr double kDay = 86400;
+    std::optional<double> newest_;
+    double oldest_ = 0;
+    double percent_ = 0;
+    double daily_growth_ = 0;  // per cent of the volume
   };
   std::map<std::string, Samples> volumes_;
   Samples* samples_ = nullptr;
@@ -283,9 +314,7 @@ ReportFigures read_figures(const char* path) {
   if (is_whole(volumes) && volumes.fullest()) {
     figures.volume = volumes.fullest();
     if (is_whole(history)) {
-      figures.volume->outlook = figures.volume->days > 0                  ? Outlook::days
-                                : history.has_grown(figures.volume->name) ? Outlook::soon
-                                                                          : Outlook::no_growth;
+      figures.volume->outlook = history.outlook(figures.volume->name, figures.volume->days);
     }
   }
   if (is_whole(shares)) {

@@ -13,8 +13,8 @@ namespace host {
 
 // When a volume is full at the speed of its history.
 enum class Outlook {
-  unknown,    // the profile shows no history
-  no_growth,  // no sample shows less usage than now
+  unknown,    // the profile shows no history, or it has just begun
+  no_growth,  // to speak of
   soon,       // in less than a day
   days
 };

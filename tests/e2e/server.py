@@ -6,6 +6,8 @@ import sqlite3
 import subprocess
 import time
 
+from harness import private_mounts
+
 GIB = 1 << 30
 DAY = 86400
 USERS = {'anna': 3001, 'bjoern': 3002, 'chen': 3003, 'dora': 3004, 'john-doe': 3005, 'eve': 3006}
@@ -39,6 +41,7 @@ class Server:
         self.machine, self.test = machine, test
         self.choice = random.Random(7)
         self.now = int(now or time.time())
+        private_mounts()
         self.root = machine.base / 'srv'
         machine.accounts({'root': 0} | USERS)
         machine.options += ['--bind', self.root, '/srv']

@@ -183,17 +183,17 @@ class Profiles(ControlTest):
         made = before + '\n[n]\nreport_list = '
         add, put = ('profile', 'add', 'n'), ('profile', 'set', 'p')
         self.check_table(self.m.config, before, (
-            (add, f'{made}{REPORTS}\n', ''),
+            (add, f'{made}{REPORTS}\nvolume_history = true\n', ''),
             ((*add, '--reports', 'large_file, share_list', '--shares', 'my docs,photos', '--language',
               'de-AT', '--mail-to', 'a@b.c ,d@e.f', '--mail-from', 'v@b.c', '--smtp-url',
               'smtps://m:465', '--smtp-user', 'u', '--smtp-password-file', '/tmp/secret',
               '--report-dir', '/tmp/new/r', '--link-base', 'https://x/r', '--limit-user', 'root',
-              '--duplicates', 'content', '--keep-reports', '3', '--history'),
+              '--duplicates', 'content', '--keep-reports', '3', '--no-history'),
              made + 'large_file,share_list\nshare_list = my docs,photos\nlanguage = de-AT\n'
              'report_dir = /tmp/new/r\nlink_base = https://x/r\nmail_to = a@b.c,d@e.f\n'
              'mail_from = v@b.c\nsmtp_url = smtps://m:465\nsmtp_user = u\n'
              'smtp_password_file = /tmp/secret\nlimit_user = root\nduplicate_compare = true\n'
-             'volume_history = true\nkeep_reports = 3\n', ''),
+             'keep_reports = 3\n', ''),
             ((*put, 'language', 'fr', 'keep_reports', '2'),
              before.replace('language=de', 'language = fr\nkeep_reports = 2'), ''),
             ((*put, 'language', ''), before.replace('language=de\n', ''), ''),

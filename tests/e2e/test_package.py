@@ -1,6 +1,5 @@
 """The Debian package in a private view of this machine: installed, run by systemd, upgraded,
 removed and purged by the real tools, with everything they write kept in memory."""
-import ctypes
 import os
 import re
 import shutil
@@ -10,9 +9,8 @@ import unittest
 from pathlib import Path
 
 from expected import data_rows
-from harness import BUILD, LIMIT, ROOT, needs_root
+from harness import BUILD, LIMIT, ROOT, needs_root, private_mounts
 
-CLONE_NEWNS = 0x20000
 CGROUPS = [Path('/sys/fs/cgroup', name) for name in ('', 'systemd', 'unified')]
 # Records of dpkg and caches, whatever is installed.
 RECORDS = re.compile(r'/(var/lib/dpkg/(status|available|lock|triggers)|var/cache/|var/log/)')
@@ -42,9 +40,7 @@ class Package(unittest.TestCase):
         call('sed', '-i', 's/^Version:.*/&.1/', tree / 'DEBIAN/control')
         call('sed', '-i', '$a # changed', *tree.glob('usr/**/*.conf'))
         call('dpkg-deb', '--build', tree, cls.later)
-        # All that is mounted from now on goes with this process.
-        assert ctypes.CDLL(None).unshare(CLONE_NEWNS) == 0
-        call('mount', '--make-rprivate', '/')
+        private_mounts()
         call('mount', '-t', 'tmpfs', 'private', '/run')  # systemd-nspawn notes there what it runs
 
     def setUp(self):

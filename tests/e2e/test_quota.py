@@ -5,7 +5,7 @@ import struct
 import subprocess
 
 from expected import SCRIPT, data_blocks
-from harness import PROGRAM, ProductTest, needs_root
+from harness import PROGRAM, ProductTest, needs_root, private_mounts
 
 ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002, 'carl': 3003, 'john-doe': 3004}
 MANY = {f'u{i:03}': 4000 + i for i in range(150)}
@@ -64,6 +64,7 @@ class Quotas(ProductTest):
         with image.open('wb') as file:
             file.truncate(16 << 20)
         self.call('mkfs.ext4', '-q', '-O', '^quota', image)
+        private_mounts()
         self.call('mount', '-o', 'loop,usrquota', image, volume)
         self.addCleanup(self.call, 'umount', volume)
         # The tool looks at the device, which the sandbox's own /dev lacks.

@@ -10,8 +10,8 @@ const damaged = n => [n ? `The data of this report is damaged. Rows that could b
   n}. The log of the run says why.` : 'The data of this report is damaged. The log of the run says why.'];
 const missing = ['The data of this report is missing. The log of the run says why.'];
 const nothing = ['Nothing was found.'];
-const fromText = (n, names) => [`An account name (${
-  names}) broke the data block of this report. All its rows could be read from the text: ${n}.`];
+const fromText = (n, names) => [`The account name ${
+  names} is unusual in this report's data, so the rows were read from its text. All are here: ${n}.`];
 
 const FILE = "[ 's', '/f', '1' ]", TYPE = "[ 'reportUI_file_type_text', 's', 1 ]";
 const share = (name, size = '1') => `[ '${name}', '/', '${size}' ]`;

@@ -52,10 +52,13 @@ std::string lines_of(const host::ReportFigures& figures, const std::string& lang
 }
 
 TEST(MailSummary, TellsTheFiguresOfAReport) {
-  const std::string grown =
-      "'/' : [\n[ '2', 10.0 ]\n],\n'/srv' : [\n[ '3', 93.6 ],\n[ '2', 95.0 ],\n[ '1', 93.5 "
-      "]\n]\n};\n";
-  const std::string shrunk = "'/srv' : [\n[ '2', 93.6 ],\n[ '1', 94.0 ]\n]\n};\n";
+  // The newest sample, one of before, and one of a day before.
+  const auto history = [](const std::string& before, const std::string& oldest) {
+    return "'/' : [\n[ '200000', 10.0 ]\n],\n'/srv' : [\n[ '200000', 93.6 ],\n" + before +
+           "[ '113600', " + oldest + " ]\n]\n};\n";
+  };
+  const std::string grown = history("[ '190000', 95.0 ],\n", "80.0");
+  const std::string young = "'/srv' : [\n[ '200000', 93.6 ],\n[ '199999', 93.6 ]\n]\n};\n";
   const std::string volume = "Fullest volume: /srv (93.6%)";
   std::string many;
   for (int i = 0; i < 100; ++i) {
@@ -71,7 +74,10 @@ TEST(MailSummary, TellsTheFiguresOfAReport) {
       {volumes("-"), volume},
       {volumes("12", grown), volume + "\nDays until full: 12"},
       {volumes("0", grown), volume + "\nDays until full: less than 1"},
-      {volumes("0", shrunk), volume + "\nDays until full: no growth"},
+      {volumes("0", history("", "94.0")), volume + "\nDays until full: no growth"},
+      {volumes("0", history("", "93.59")), volume + "\nDays until full: no growth"},
+      {volumes("40000", grown), volume + "\nDays until full: no growth"},
+      {volumes("0", young), volume},
       {shares("[ 'a', '/', '1' ],\n[ 'b, [c]', '/', '1610612736' ]"),
        "Largest share: b, [c] (1.5\u00a0GiB)"},
       {shares("[ 'a', '/', '1' ],\n[ 'b'"), ""},
