@@ -121,12 +121,11 @@ std::vector<Service> services_in(const std::string& folder) {
     if (!text || lstat(path.c_str(), &file) != 0 || !S_ISREG(file.st_mode)) {
       continue;
     }
-    std::vector<Service> found =
-        parse_services("[" + entry.path().filename().string() + "]\n" + *text);
+    std::vector<Service> found = parse_services("[share]\n" + *text);
     Service& service = found.front();
-    if (const auto name = service.parameters.find("sharename"); name != service.parameters.end()) {
-      service.name = name->second;
-    }
+    const auto name = service.parameters.find("sharename");
+    service.name =
+        name != service.parameters.end() ? name->second : entry.path().filename().string();
     const std::string shared = service.parameters["path"];
     if (file.st_uid != 0 && (stat(shared.c_str(), &target) != 0 || target.st_uid != file.st_uid)) {
       continue;  // Samba offers only folders that belong to who has shared them

@@ -80,7 +80,7 @@ class HistoryBlock : public Block {
     if (line == "]" || line == "],") {
       return Line::row;
     }
-    if (line.starts_with('\'') && line.ends_with(kOpening)) {
+    if (line.size() > kOpening.size() && line.starts_with('\'') && line.ends_with(kOpening)) {
       line.remove_prefix(1);
       line.remove_suffix(kOpening.size());
       samples_ = &volumes_[std::string(line)];

@@ -78,6 +78,7 @@ TEST(MailSummary, TellsTheFiguresOfAReport) {
       {volumes("0", history("", "93.59")), volume + "\nDays until full: no growth"},
       {volumes("40000", grown), volume + "\nDays until full: no growth"},
       {volumes("0", young), volume},
+      {volumes("0", "' : [\n};\n"), volume},
       {shares("[ 'a', '/', '1' ],\n[ 'b, [c]', '/', '1610612736' ]"),
        "Largest share: b, [c] (1.5\u00a0GiB)"},
       {shares("[ 'a', '/', '1' ],\n[ 'b'"), ""},
