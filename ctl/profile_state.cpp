@@ -1,11 +1,15 @@
 #include "profile_state.hpp"
 
+#include <sqlite3.h>
+#include <sys/stat.h>
+
 #include <algorithm>
 #include <array>
 #include <cerrno>
 #include <charconv>
 #include <cstdio>
 #include <iomanip>
+#include <memory>
 #include <sstream>
 
 #include "ctl.hpp"
@@ -20,6 +24,10 @@ namespace {
 
 constexpr std::size_t kLargestStatus = 4096;
 
+struct CloseDb {
+  void operator()(sqlite3* db) const { sqlite3_close(db); }
+};
+
 std::string local_text(const char* format, std::time_t time) {
   std::tm local{};
   localtime_r(&time, &local);
@@ -29,6 +37,27 @@ std::string local_text(const char* format, std::time_t time) {
 }
 
 }  // namespace
+
+int samples_since(const std::string& profile, std::time_t start) {
+  constexpr int kWaitMs = 5000;
+  sqlite3* opened = nullptr;
+  const int result = sqlite3_open_v2(VORN_PATH_HISTORY_DB, &opened, SQLITE_OPEN_READONLY, nullptr);
+  const std::unique_ptr<sqlite3, CloseDb> db(opened);
+  sqlite3_stmt* statement = nullptr;
+  sqlite3_busy_timeout(db.get(), kWaitMs);
+  if (result != SQLITE_OK ||
+      sqlite3_prepare_v2(db.get(),
+                         "SELECT count(*) FROM VolumeUsage WHERE profile = ?1 AND "
+                         "CAST(sampleDate AS INTEGER) >= ?2",
+                         -1, &statement, nullptr) != SQLITE_OK) {
+    return 0;
+  }
+  sqlite3_bind_text(statement, 1, profile.c_str(), -1, SQLITE_TRANSIENT);
+  sqlite3_bind_int64(statement, 2, start);
+  const int count = sqlite3_step(statement) == SQLITE_ROW ? sqlite3_column_int(statement, 0) : 0;
+  sqlite3_finalize(statement);
+  return count;
+}
 
 std::string report_folder(const Section& profile) {
   VLIBCSzHash hash(profile.entries.size());
@@ -69,7 +98,15 @@ RunState run_state(const std::string& profile) {
   if (word == "success") {
     return RunState::succeeded;
   }
-  return word == "collect_data" ? RunState::ended_early : RunState::failed;
+  if (word != "collect_data") {
+    return RunState::failed;
+  }
+  // "global" keeps this word when all went well.
+  struct stat status {};
+  const bool has_collected = profile == "global" &&
+                             stat((VORN_PATH_STATUS "/" + profile).c_str(), &status) == 0 &&
+                             samples_since(profile, status.st_mtime) > 0;
+  return has_collected ? RunState::succeeded : RunState::ended_early;
 }
 
 const char* word_for(RunState state) {

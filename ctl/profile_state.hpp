@@ -23,6 +23,9 @@ std::vector<host::StoredReport> reports_in(const std::string& folder, host::Repo
 // The newest one that is whole, or nothing.
 std::optional<host::StoredReport> newest_whole(const std::vector<host::StoredReport>& reports);
 
+// The number of samples of volumes that the history holds for `profile` since `start`.
+int samples_since(const std::string& profile, std::time_t start);
+
 enum class RunState {
   never_ran,
   running,

@@ -16,6 +16,7 @@
 #include "old_reports.hpp"
 #include "profile_state.hpp"
 #include "run_lock.hpp"
+#include "run_paths.hpp"
 #include "schedules.hpp"
 #include "text_containers.hpp"
 #include "vorn/paths.h"
@@ -227,7 +228,10 @@ void remove_reports(const std::string& folder) {
       throw host_failure(folder + "/" + report.name + " can't be removed");
     }
   }
-  if (!host::remove_tree(folder + "/template") || (rmdir(folder.c_str()) != 0 && errno != ENOENT)) {
+  const host::Fd opened = host::open_report_folder(folder);  // not what its name leads to by then
+  const std::string page_parts = "/proc/self/fd/" + std::to_string(opened.get()) + "/template";
+  if ((opened && !host::remove_tree(page_parts)) ||
+      (rmdir(folder.c_str()) != 0 && errno != ENOENT)) {
     warn(folder + " stays: " +
          (errno == ENOTEMPTY || errno == EEXIST ? "it holds more than reports"
                                                 : std::strerror(errno)));
@@ -236,7 +240,11 @@ void remove_reports(const std::string& folder) {
 
 void remove_schedule(const Section& profile, VLIBCSzHash* keys) {
   constexpr std::size_t kLargestFile = 1U << 20U;
-  const std::string file = cron_file(profile.value(kScheduleKey, "none"));
+  const std::string id = profile.value(kScheduleKey);
+  if (id.empty()) {
+    return;
+  }
+  const std::string file = cron_file(id);
   if (!only_runs(profile.name, host::read_file(file, kLargestFile).value_or(""))) {
     throw Failure(file + " holds other jobs than those of " + titled(profile.name) +
                   "; move them to a file of their own");

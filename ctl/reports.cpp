@@ -171,6 +171,11 @@ void reports(const Options& options) {
     throw Failure("write remove --older-than AGE, for instance remove --older-than 90d",
                   kWrongUsage);
   }
+  if (!options.argument.empty() && options.action != "open" && options.action != "keep") {
+    throw Failure("\"" + options.argument + "\" means nothing to " + options.action +
+                      "; only open and keep take a word",
+                  kWrongUsage);
+  }
   const std::size_t keep = options.action == "keep" ? parse_count(options.argument) : 0;
   const std::string folder = report_folder(read_profile(options.profile));
   const Reports found = reports_in(

@@ -1,11 +1,11 @@
 // vornctl run: a run in the foreground.
 #include <signal.h>
-#include <sqlite3.h>
 #include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <array>
 #include <chrono>
 #include <cstdio>
@@ -178,32 +178,6 @@ void clear_up(const Section& profile, bool is_report) {
 
 // --- The outcome --------------------------------------------------------------------------------
 
-struct CloseDb {
-  void operator()(sqlite3* db) const { sqlite3_close(db); }
-};
-
-// The number of samples of volumes that the history holds for `profile` since `start`.
-int samples_since(const std::string& profile, std::time_t start) {
-  constexpr int kWaitMs = 5000;
-  sqlite3* opened = nullptr;
-  const int result = sqlite3_open_v2(VORN_PATH_HISTORY_DB, &opened, SQLITE_OPEN_READONLY, nullptr);
-  const std::unique_ptr<sqlite3, CloseDb> db(opened);
-  sqlite3_stmt* statement = nullptr;
-  sqlite3_busy_timeout(db.get(), kWaitMs);
-  if (result != SQLITE_OK ||
-      sqlite3_prepare_v2(db.get(),
-                         "SELECT count(*) FROM VolumeUsage WHERE profile = ?1 AND "
-                         "CAST(sampleDate AS INTEGER) >= ?2",
-                         -1, &statement, nullptr) != SQLITE_OK) {
-    return 0;
-  }
-  sqlite3_bind_text(statement, 1, profile.c_str(), -1, SQLITE_TRANSIENT);
-  sqlite3_bind_int64(statement, 2, start);
-  const int count = sqlite3_step(statement) == SQLITE_ROW ? sqlite3_column_int(statement, 0) : 0;
-  sqlite3_finalize(statement);
-  return count;
-}
-
 // "global" keeps its status from before a collection to after it, so the history tells.
 bool has_collected(const Section& profile, std::time_t start) {
   if (profile.name == "global" ||
@@ -225,16 +199,27 @@ bool has_collected(const Section& profile, std::time_t start) {
   throw Failure(what + "; see " + log.command() + ", and vornctl doctor");
 }
 
-std::string newest_report(const Section& profile) {
-  const std::string folder = report_folder(profile);
-  const auto report = newest_whole(reports_in(folder, host::ReportSize::left_out));
-  return report ? folder + "/" + report->name + "/report.html" : "";
+std::vector<host::StoredReport> reports_of(const Section& profile) {
+  return reports_in(report_folder(profile), host::ReportSize::left_out);
+}
+
+// The page that isn't among the reports `before`; empty when there is none. After the clock was set
+// back it isn't the last one.
+std::string new_page(const Section& profile, const std::vector<host::StoredReport>& before) {
+  for (const host::StoredReport& report : reports_of(profile)) {
+    const bool is_new = std::none_of(before.begin(), before.end(),
+                                     [&](const auto& known) { return known.name == report.name; });
+    if (is_new && report.is_whole) {
+      return report_folder(profile) + "/" + report.name + "/report.html";
+    }
+  }
+  return "";
 }
 
 void run(const Options& options) {
   const Section profile = read_profile(options.profile);
   check_start(options, profile);
-  const std::string before = options.data ? "" : newest_report(profile);
+  const auto before = options.data ? std::vector<host::StoredReport>{} : reports_of(profile);
   const std::time_t start = std::time(nullptr);
   const RunLog log;
   const SignalsNoted noted;
@@ -259,11 +244,11 @@ void run(const Options& options) {
     }
     return;
   }
-  const std::string report = newest_report(profile);
-  if (run_state(profile.name) != RunState::succeeded || report == before) {
+  const std::string page = new_page(profile, before);
+  if (run_state(profile.name) != RunState::succeeded || page.empty()) {
     fail_with_log("the run of profile " + profile.name + " failed", log, child, watched);
   }
-  print_line(report);
+  print_line(page);
 }
 
 }  // namespace

@@ -3,6 +3,8 @@
 // The file and the profile's key are two things, so their order matters: the key is written first
 // and removed last. Whatever ends this in between, no job is left that the profile doesn't name,
 // and "vornreport --clean" removes what there is.
+#include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -98,7 +100,23 @@ void write_cron_file(const std::string& path, const std::string& text) {
   }
 }
 
+// The cron file and the key are read, changed and written by one vornctl at a time. Beside the
+// configuration, where only root can take the lock.
+host::Fd lock_schedules() {
+  constexpr const char* kLock = "/usr/vorn/etc/.vornreport.conf.schedules";
+  host::Fd lock(open(kLock, O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
+  if (!lock || flock(lock.get(), LOCK_EX) != 0) {
+    throw Failure(std::string(kLock) + " can't be locked (" + std::strerror(errno) +
+                  "); run this as root");
+  }
+  return lock;
+}
+
 void set_schedule(const Options& options) {
+  if (options.profile == "global" && !options.report.empty()) {
+    throw Failure("\"global\" stands for the whole server and has no report; give --data only",
+                  kWrongUsage);
+  }
   // Both are read before anything is written.
   std::string report_times = options.report;
   std::string data_times = options.data;
@@ -108,6 +126,7 @@ void set_schedule(const Options& options) {
   if (!data_times.empty()) {
     data_times = parse_times("--data", data_times).text();
   }
+  const host::Fd lock = lock_schedules();
   const Section profile = read_profile(options.profile);
   const std::string id = schedule_id(profile);
   const std::string path = cron_file(id);
@@ -133,6 +152,7 @@ void set_schedule(const Options& options) {
 }
 
 void clean_schedule(const Options& options) {
+  const host::Fd lock = lock_schedules();
   const Section profile = read_profile(options.profile);
   const std::string id = profile.value(kScheduleKey);
   if (id.empty()) {

@@ -163,11 +163,14 @@ class Samba(ControlTest):
         programs = self.m.base / 'programs'
         programs.mkdir()
         (programs / 'testparm').symlink_to(shutil.which('testparm'))
-        for path in (os.environ['PATH'], programs):
+        odd = ('skipped', r'b\x0ac', 'it holds a control character')
+        for path, more in ((os.environ['PATH'], ()), (programs, (odd,))):
+            if more:
+                (self.m.base / 'samba/usershares/b\nc').write_text('path=/etc\n')
             self.m.shares.write_text('[there]\npath = /etc\n')
             run = self.m.shell(f"PATH='{path}' {CTL} share import-samba")
             self.assertEqual(run.out.splitlines(),
-                             self.lines((*self.decisions, ('imported', 'Mine', None))), run.err)
+                             self.lines((*self.decisions, ('imported', 'Mine', None), *more)), run.err)
 
 
 class Profiles(ControlTest):
@@ -248,6 +251,9 @@ class Profiles(ControlTest):
         self.assertEqual([path.name for path in report.parent.iterdir()], ['mine'])
         self.assertFalse(job.exists() or (self.m.vorn / 'var/status/p').exists())
         self.check(('profile', 'list'), 0, 'no profiles')
+        self.m.profile('q', report_list='share_list')
+        (self.m.cron / 'vornreport-none').write_text('0 4 * * * root backup\n')
+        self.check(('profile', 'remove', 'q'))
 
 
 class Completion(ControlTest):

@@ -67,7 +67,8 @@ class Running(CtlTest):
     def test_outcomes(self):
         self.m.profile('nowhere', report_list='share_list', report_dir='/dev/null/reports')
         self.m.profile('bare')
-        page = rf'{self.m.reports}/weekly/[-_\d]*/report\.html\n'
+        self.stored('weekly', {'2099-01-01_00-00-00': WHOLE})  # of a clock that was wrong
+        page = rf'{self.m.reports}/weekly/(?!2099)[-_\d]*/report\.html\n'
         for arguments, status, out, err in (
                 (['weekly'], 0, page, ''),
                 (['weekly', '--data'], 0, '', ''),
@@ -79,6 +80,7 @@ class Running(CtlTest):
             with self.subTest(arguments):
                 self.check(['run', *arguments], status, out, err)
                 self.assertEqual(self.m.leftovers(), [])
+        self.assertRegex(self.ctl('status', 'global').out, 'global +success ')
         self.m.shares.unlink()
         (self.m.vorn / 'vornreport/sql/vornreport.sql').unlink()
         (self.m.vorn / 'etc/vornreport.db').unlink()
@@ -179,6 +181,7 @@ class Schedules(CtlTest):
                 (['weekly', '--clean'], 0, {weekly: None}, ''),
                 (['weekly', '--clean'], 0, {}, ''),
                 (['weekly'], 2, {}, 'say when.*'),
+                (['global', '--report', '@daily'], 2, {}, '"global" stands for .*'),
                 (['nobody', '--clean'], 1, {}, 'profile "nobody" is not in .*')):
             with self.subTest(arguments):
                 command = arguments if 'profile' in arguments else ['schedule', *arguments]
@@ -194,6 +197,12 @@ class Schedules(CtlTest):
         self.ctl('schedule', 'weekly', '--data', '@daily')
         self.m.run('--clean', 'weekly')
         self.assertNotIn(weekly, self.files())
+        # Two at once lose nothing of each other's.
+        one = f'{CTL} schedule weekly'
+        run = Run(self.m, ['sh', '-c', f'for i in 1 2 3 4 5 6 7 8; do {one} --clean; '
+                           f'{one} --report @daily & {one} --data @daily & wait; '
+                           f'grep -c @daily /etc/cron.d/{weekly} >&2; done'], None).finish()
+        self.assertEqual(run.err, '2\n' * 8)
 
     def test_wrong_times(self):
         for times, wrong in (
@@ -315,7 +324,8 @@ class Reports(CtlTest):
                 (['remove', '--older-than', '2d'], 0, names),
                 (['keep', '2'], 0, [old]), (['keep', '2', '--dry-run'], 0, []),
                 (['keep', '9'], 0, []), (['keep', '0'], 2, []), (['keep'], 2, []),
-                (['remove'], 2, []), (['remove', '--older-than', '0d'], 2, []),
+                (['remove'], 2, []), (['remove', old, '--older-than', '2d'], 2, []),
+                (['remove', '--older-than', '0d'], 2, []),
                 (['remove', '--older-than', '9'], 2, []), (['purge'], 2, [])):
             with self.subTest(arguments):
                 self.m = self.new_machine()
