@@ -11,7 +11,7 @@ const damaged = n => [n ? `The data of this report is damaged. Rows that could b
 const missing = ['The data of this report is missing. The log of the run says why.'];
 const nothing = ['Nothing was found.'];
 const fromText = (n, names) => [`The account name ${
-  names} is unusual in this report's data, so the rows were read from its text. All are here: ${n}.`];
+  names} is unusual in this report's data, so the rows were read from its text: ${n}.`];
 
 const FILE = "[ 's', '/f', '1' ]", TYPE = "[ 'reportUI_file_type_text', 's', 1 ]";
 const share = (name, size = '1') => `[ '${name}', '/', '${size}' ]`;
@@ -51,7 +51,7 @@ const CASES = {
                     `{\n'/' : [\n${Array(100).fill("['a', 0, 0, -1.0]").join(',\n')}]}\n${END}`,
                     ['These are the 100 users with the smallest usage. More are not shown.'], [['a', '–', '0 B', 'no limit']]],
   'bare nan': ['volume_usage', 'vornVolumeUsageData', block("[ '/', nan , 1, 'nan%', '12' ]"), [],
-               [['/', '–', '–', '1 B', 'Size unknown']]],
+               [['/', '–', 'Size unknown', '–', '1 B']]],
   'no quotas': ['quota_usage', 'vornQuotaUsageTable', '', [
     'No quotas could be read: no volume has user quotas, or /sbin/repquota is missing. The log of the run says which.'], []],
   'owners': ['file_owner', 'vornFileOwnerData', block("[ 'a', 's', 'x', '-1' ]"), [], [['a', '–', '0']]],
@@ -101,7 +101,7 @@ test('the forecast says the same everywhere', async () => {
                          'vornVolumeUsageDataHistory', `{\n${samples.join(',\n')}\n}\n${END}`);
   await withPage(page, async view => {
     const {rows} = await section(view, 'volume_usage');
-    const table = new Map(rows.filter(row => row.length === 5).map(row => [row[0], row[4]]));
+    const table = new Map(rows.filter(row => row.length === 5).map(row => [row[0], row[2]]));
     const cards = new Map(await view.$$eval('.card', all => all.map(one => [
       one.querySelector('h3').textContent, one.querySelector('.outlook').lastChild.textContent.trim()])));
     const lines = await view.$$eval('.history .line', all => all.map(one => [

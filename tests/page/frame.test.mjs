@@ -55,7 +55,7 @@ test('the first screen answers: cards, what needs attention, and where', async t
   await withPage(fileOf('big'), async page => {
     assert.equal(await page.locator('.card').count(), 5);
     const notices = (await textOf(page, '.notices li')).join('\n');
-    for (const part of [/projects is 90\.\d% full\. Full in \d+ days\./, /anna is over the quota on .*home/,
+    for (const part of [/projects is 90\.\d% used\. Full in \d+ days\./, /anna is over the quota on .*home/,
                         /bjoern has used 9\d% of the quota/, /largest share is Photos/, /\w+ owns the most/,
                         /Possible duplicates could free 1\.\d+ GiB/, /The oldest data is from/]) {
       assert.match(notices.replaceAll('\u00a0', ' '), part);

@@ -7,13 +7,29 @@ import * as format from './format.js';
 import {sizeElement, typeName} from './table.js';
 
 const WIDTH = 1180, HEIGHT = 340, HEADER = 22;
-const CHARACTER = 7.4;  // widest average of a label's characters, in the drawing's units
+// The widths of a label's characters at most, in the drawing's units.
+const CHARACTER = 7.4, CAPITAL = 10.2, WIDE = 13.5;
 const LINE = 17;
 
-const fit = (text, width) => {
-  const room = Math.floor(width / CHARACTER);
-  return text.length <= room ? text : room < 4 ? '' : `${text.slice(0, room - 1)}…`;
-};
+const widthOf = character => character > '\u1100' ? WIDE :
+  /[\p{Lu}\p{M}@%_]/u.test(character) ? CAPITAL : CHARACTER;
+
+// `text` as far as there is room for it: cut behind a whole character, or '' when little would stay.
+function fit(text, width) {
+  const characters = [...text];
+  let used = 0, kept = 0;
+  for (let i = 0; i < characters.length; ++i) {
+    used += widthOf(characters[i]);
+    if (used > width) {
+      return kept < 3 ? '' : `${characters.slice(0, kept).join('')}…`;
+    }
+    kept += used + CHARACTER <= width;
+  }
+  return text;
+}
+
+// A number that is cut says something else.
+const fitWhole = (text, width) => fit(text, width) === text ? text : '';
 
 // The leaf that lies nearest in the direction of an arrow key.
 function neighbour(leaves, from, key) {
@@ -43,7 +59,7 @@ function leafElement(leaf, total) {
   const element = svg('g', {class: `leaf series${format.seriesOf(leaf.parent.data.name)}`, role: 'img', tabindex: -1,
                             'aria-label': label, transform: `translate(${x0},${y0})`},
                       svg('title', {}, label), svg('rect', {width, height, rx: 2}));
-  const lines = [fit(plain, width - 12), fit(format.size(leaf.value), width - 12)];
+  const lines = [fit(plain, width - 12), fitWhole(format.size(leaf.value), width - 12)];
   lines.forEach((text, i) => {
     if (text && height > LINE * (i + 1) + 6) {
       element.append(svg('text', {x: 7, y: LINE * (i + 1), class: i ? 'amount' : ''}, text));
@@ -72,7 +88,7 @@ export function shareMap(rows) {
     const plain = shownPlain(volume.data.name);
     const text = `${plain}  ${format.size(volume.value)}`;
     drawing.append(svg('text', {class: 'volume', x: volume.x0 + 2, y: volume.y0 + 15},
-                       fit(text, volume.x1 - volume.x0) || fit(plain, volume.x1 - volume.x0)));
+                       fitWhole(text, volume.x1 - volume.x0) || fit(plain, volume.x1 - volume.x0)));
     volume.leaves().forEach(leaf => {
       leaf.element = drawing.appendChild(leafElement(leaf, root.value));
     });

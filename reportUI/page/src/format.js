@@ -94,10 +94,11 @@ export function size(value) {
 
 export const exactSize = value => say('bytes', {n: BigInt(value).toLocaleString(language)});
 
-// `value` is a number of hundredths.
+// `value` is a number of hundredths. What is below 100 is never rounded to it: it isn't full yet.
 export function percent(value, maximumFractionDigits = 1) {
+  const most = value < 100 ? 100 - 10 ** -maximumFractionDigits : Infinity;
   return Number.isFinite(value) && value >= 0 ?
-    (value / 100).toLocaleString(language, {style: 'percent', maximumFractionDigits}) : UNKNOWN;
+    (Math.min(value, most) / 100).toLocaleString(language, {style: 'percent', maximumFractionDigits}) : UNKNOWN;
 }
 
 export function inDays(days) {
@@ -132,13 +133,22 @@ export function zoneName(seconds) {
 }
 
 // Milliseconds that read as the server's wall clock when taken as UTC: for scales, whose ticks then
-// fall on the server's midnights.
+// fall on the server's midnights. A clock is only ever set at a quarter of an hour, so the samples
+// that one run took of all volumes are worked out once.
+const QUARTER = 900;
+const offsets = new Map();
 export function wallClock(seconds) {
-  const parts = Object.fromEntries(dateFormat({
-    timeZone: zone, hourCycle: 'h23', year: 'numeric', month: 'numeric', day: 'numeric',
-    hour: 'numeric', minute: 'numeric', second: 'numeric'
-  }, 'en-US').formatToParts(seconds * 1000).map(({type, value}) => [type, Number(value)]));
-  return Date.UTC(parts.year, parts.month - 1, parts.day, parts.hour, parts.minute, parts.second);
+  const quarter = Math.floor(seconds / QUARTER);
+  if (!offsets.has(quarter)) {
+    const start = quarter * QUARTER * 1000;
+    const parts = Object.fromEntries(dateFormat({
+      timeZone: zone, hourCycle: 'h23', year: 'numeric', month: 'numeric', day: 'numeric',
+      hour: 'numeric', minute: 'numeric', second: 'numeric'
+    }, 'en-US').formatToParts(start).map(({type, value}) => [type, Number(value)]));
+    offsets.set(quarter, Date.UTC(
+      parts.year, parts.month - 1, parts.day, parts.hour, parts.minute, parts.second) - start);
+  }
+  return seconds * 1000 + offsets.get(quarter);
 }
 
 export const wallDay = (milliseconds, options) =>

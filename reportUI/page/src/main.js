@@ -7,6 +7,7 @@ import {attention} from './summary.js';
 import {card, readVolumes} from './volumes.js';
 
 const THEMES = {system: 'themeSystem', light: 'themeLight', dark: 'themeDark'};
+const MOST_BESIDE = 8;  // cards of volumes beside what needs attention
 const main = document.querySelector('main');
 const header = document.querySelector('header');
 const blocks = document.getElementById('data').content;
@@ -84,10 +85,13 @@ function firstLook(volumes) {
   const part = (id, heading, content) => h(
     'section', {id, 'aria-labelledby': `${id}-heading`},
     h('h2', {id: `${id}-heading`}, heading), content);
-  return h('div', {class: 'first'},
-           volumes.length ? part('volumes', format.say('volumes'),
-                                 h('div', {class: 'cards'}, ...volumes.map(card))) : null,
-           part('attention', format.say('attention'), attention(data, volumes)));
+  const cards = volumes.length ? part('volumes', format.say('volumes'),
+                                      h('div', {class: 'cards'}, ...volumes.map(card))) : null;
+  const found = attention(data, volumes);
+  const notices = found && part('attention', format.say('attention'), found);
+  // Many cards take the whole width, and would push the rest out of sight.
+  return !cards && !notices ? '' : volumes.length > MOST_BESIDE ? h('div', {class: 'first many'}, notices, cards) :
+    h('div', {class: 'first'}, cards, notices);
 }
 
 function navigation(names) {

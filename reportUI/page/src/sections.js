@@ -71,11 +71,11 @@ export const REPORTS = {
     always: true,
     show: ({volumes, hasHistory}) => [
       ...history(volumes, hasHistory),
-      table([['volume', 'name'], ['percent', 'percent'], ['used', 'size'], ['free', 'size'],
-             ['days', 'outlook']],
-            volumes.map(volume => [volume.name, String(volume.percent), String(volume.used ?? ''),
-                                   String(volume.free ?? ''),
-                                   {text: volume.outlook.text, order: volume.outlook.order}]),
+      table([['volume', 'name'], ['percent', 'percent'], ['days', 'outlook'], ['used', 'size'],
+             ['free', 'size']],
+            volumes.map(({name, percent, outlook, used, free}) => [
+              name, String(percent), {text: outlook.text, order: outlook.order},
+              String(used ?? ''), String(free ?? '')]),
             {caption: format.nameOf('reports', 'volume_usage'), csv: csvOf('volume_usage'),
              sorted: 1})]
   },

@@ -30,8 +30,8 @@ function quotaNotices(data) {
   const notices = users.slice(0, MOST_USERS).map(user => ({
     to: 'quota_usage', state: user.percent > OVER ? 'critical' : 'warn',
     key: user.percent > OVER ? 'noticeOverQuota' : 'noticeNearQuota',
-    values: {user: shown(user.user), volume: shown(user.volume), used: sizeElement(user.used),
-             quota: sizeElement(user.quota), percent: format.percent(user.percent)}}));
+    values: {user: shown(user.user), volume: shown(user.volume), used: sizeElement(user.used, null),
+             quota: sizeElement(user.quota, null), percent: format.percent(user.percent)}}));
   if (users.length > MOST_USERS) {
     notices.push({to: 'quota_usage', state: 'warn', key: 'noticeMoreUsers',
                   values: {n: format.number(users.length - MOST_USERS)}});
@@ -52,7 +52,7 @@ function greatest(sums) {
 function shareNotices(data) {
   const best = greatest(rowsOf(data).map(([share, , bytes]) => [share, Number(bytes)]));
   return best ? [{to: 'share_list', key: 'noticeShare',
-                  values: {share: shown(best[0]), size: sizeElement(best[1])}}] : [];
+                  values: {share: shown(best[0]), size: sizeElement(best[1], null)}}] : [];
 }
 
 function ownerNotices(data) {
@@ -62,7 +62,7 @@ function ownerNotices(data) {
   }
   const best = greatest(sums);
   return best ? [{to: 'file_owner', key: 'noticeOwner',
-                  values: {owner: shown(best[0]), size: sizeElement(best[1])}}] : [];
+                  values: {owner: shown(best[0]), size: sizeElement(best[1], null)}}] : [];
 }
 
 function duplicateNotices(data) {
@@ -73,7 +73,7 @@ function duplicateNotices(data) {
   const kind = data.mode === '1' ? 'noticeConfirmed' : 'noticePossible';
   return [{to: 'duplicate_file',
            key: isCut(REPORTS.duplicate_file, data) || !data.whole ? `${kind}More` : kind,
-           values: {size: sizeElement(frees)}}];
+           values: {size: sizeElement(frees, null)}}];
 }
 
 function oldestNotices(data) {
@@ -91,13 +91,16 @@ function line({to, state = 'info', key, values}) {
            h('a', {href: `#${to}`}, ...format.sayNodes(key, values)));
 }
 
-// The list of what needs attention, each line with a link to its section. `data`: report name to
-// what was read.
+const rank = ({state = 'info'}) => ['critical', 'warn'].indexOf(state) + 1 || 3;
+
+// The list of what needs attention, the worst first, each line with a link to its section. `data`: report name to
+// what was read. Null where no report looks for what may need some.
 export function attention(data, volumes) {
   const notices = [
     ...volumeNotices(volumes), ...quotaNotices(data.get('quota_usage')),
     ...shareNotices(data.get('share_list')), ...ownerNotices(data.get('file_owner')),
     ...duplicateNotices(data.get('duplicate_file')), ...oldestNotices(data.get('least_modify'))];
+  notices.sort((one, two) => rank(one) - rank(two));
   return notices.length ? h('ul', {class: 'notices'}, ...notices.map(line)) :
-    h('p', {}, format.say('nothing'));
+    data.has('volume_usage') || data.has('quota_usage') ? h('p', {}, format.say('nothing')) : null;
 }

@@ -97,7 +97,7 @@ export function card(volume) {
   return h('article', {class: `card ${volume.state}`},
            gauge(volume),
            h('div', {},
-             h('h3', {}, shown(volume.name)),
+             h('h3', {title: shownPlain(volume.name)}, shown(volume.name)),
              h('p', {class: 'unseen'}, format.percent(volume.percent)),
              h('p', {class: 'outlook'}, stateElement(volume.state), ' ', volume.outlook.text),
              h('p', {}, ...format.sayNodes('usedOf', {
@@ -107,16 +107,18 @@ export function card(volume) {
 
 // --- History ------------------------------------------------------------------------------------
 
-const WIDTH = 1180, HEIGHT = 320, LEFT = 56, RIGHT = 12, TOP = 18, BOTTOM = 28, LABEL_HEIGHT = 17;
+const WIDTH = 1180, LEAST_HEIGHT = 320, LEFT = 56, RIGHT = 12, TOP = 18, BOTTOM = 28;
+const LABEL_HEIGHT = 17;
 
-// Labels beside the newest samples, pushed apart so that none covers another.
-function spread(labels) {
+// Labels beside the newest samples, pushed apart so that none covers another. The last is at
+// `lowest` at most.
+function spread(labels, lowest) {
   labels.sort((one, two) => one.y - two.y);
   labels.forEach((label, i) => {
     label.at = Math.max(label.y, i ? labels[i - 1].at + LABEL_HEIGHT : TOP);
   });
-  for (let i = labels.length - 1, lowest = HEIGHT - BOTTOM; i >= 0; --i, lowest -= LABEL_HEIGHT) {
-    labels[i].at = Math.min(labels[i].at, lowest);
+  for (let i = labels.length - 1; i >= 0; --i) {
+    labels[i].at = Math.min(labels[i].at, lowest - (labels.length - 1 - i) * LABEL_HEIGHT);
   }
   return labels;
 }
@@ -139,19 +141,22 @@ function drawHistory(volumes) {
   const past = now - first;
   const last = now + Math.min(Math.max(past / 4, Math.max(0, ...days) * DAY * 1.05), past / 2);
   const wall = format.wallClock;
+  const height = Math.max(LEAST_HEIGHT, TOP + BOTTOM + volumes.length * LABEL_HEIGHT);
   const x = scaleUtc([wall(first), wall(last)], [LEFT, WIDTH - RIGHT]);
-  const y = scaleLinear([0, 100], [HEIGHT - BOTTOM, TOP]);
+  const y = scaleLinear([0, 100], [height - BOTTOM, TOP]);
   const path = line().x(({date}) => x(wall(date))).y(({percent}) => y(percent));
   const spanDays = (last - first) / DAY;
-  const dayFormat = spanDays > 700 ? {year: 'numeric', month: 'short'} :
+  const dayFormat = spanDays > 300 ? {year: 'numeric', month: 'short'} :
     {month: 'short', day: 'numeric'};
 
-  const drawing = svg('svg', {class: 'history', viewBox: `0 0 ${WIDTH} ${HEIGHT}`, role: 'img',
+  const drawing = svg('svg', {class: 'history', viewBox: `0 0 ${WIDTH} ${height}`, role: 'img',
                               'aria-label': format.say('historyText')});
-  const ticks = Math.min(7, Math.max(2, Math.floor(spanDays)));
+  // One at the very edge would be cut.
+  const ticks = x.ticks(Math.min(7, Math.max(2, Math.floor(spanDays)))).filter(
+    date => x(date) < WIDTH - 36);
   for (const [axis, at] of [
-    [axisBottom(x).ticks(ticks).tickFormat(date => format.wallDay(+date, dayFormat)),
-     `translate(0,${HEIGHT - BOTTOM})`],
+    [axisBottom(x).tickValues(ticks).tickFormat(date => format.wallDay(+date, dayFormat)),
+     `translate(0,${height - BOTTOM})`],
     [axisLeft(y).tickValues([0, 25, 50, 75, 100]).tickFormat(format.percent)
       .tickSize(LEFT + RIGHT - WIDTH), `translate(${LEFT},0)`]]) {
     select(drawing.appendChild(svg('g', {class: 'axis', transform: at}))).call(
@@ -173,7 +178,10 @@ function drawHistory(volumes) {
     group.append(svg('circle', {r: 3.5, cx: x(wall(newest.date)), cy: y(newest.percent)}));
     return {group, volume, y: y(newest.percent)};
   });
-  for (const {volume, at} of spread(labels)) {
+  for (const {group, volume, y: from, at} of spread(labels, height - BOTTOM)) {
+    if (at !== from) {  // a thin line tells whose label it is
+      group.append(svg('path', {class: 'leader', d: `M${x(wall(now)) + 3},${from}l6,${at - from}`}));
+    }
     drawing.append(svg('text', {class: 'label', x: x(wall(now)) + 10, y: at + 4},
                        svg('title', {}, shownPlain(volume.name)),
                        cut(shownPlain(volume.name), 24)));
