@@ -38,8 +38,8 @@ int VornQazProfileRunning(const char* profile);
 // In a report run (VornQazInitRealPath with for_report 1) "success" is stored only when the
 // finished report is complete; otherwise "fail" is stored, one syslog line says why, what looked
 // like a report is removed, and the result is still 0. -1 when nothing could be stored.
-// After a success the oldest finished reports beyond the profile's key `keep_reports` (a number from
-// 1 on; unset: all are kept) are removed, never the one just made.
+// After a success the oldest finished reports beyond the profile's key `keep_reports` (a number
+// from 1 on; unset: all are kept) are removed, never the one just made.
 int VornQazStatusUpdate(const char* profile, const char* status);
 
 // Adds to `*hash` the paths that don't depend on a profile: `real_path_base`, `real_path_stat_db`.
