@@ -130,7 +130,11 @@ void set_schedule(const Options& options) {
   const Section profile = read_profile(options.profile);
   const std::string id = schedule_id(profile);
   const std::string path = cron_file(id);
-  const std::string before = host::read_file(path, kLargestCronFile).value_or("");
+  const auto read = host::read_file(path, kLargestCronFile);
+  if (!read && access(path.c_str(), F_OK) == 0) {
+    throw Failure(path + " can't be read, so it is left as it is; look into it and move it away");
+  }
+  const std::string before = read.value_or("");
   if (!only_runs(profile.name, before)) {
     throw Failure(path + " holds other jobs than those of profile " + profile.name +
                   "; move them to a file of their own");

@@ -63,7 +63,7 @@ void replace_all(std::string& text, const std::string& what, const std::string& 
   }
 }
 
-// One pass, so that a value that looks like a placeholder stays what it is.
+// One pass, so that a value with braces in it stays what it is.
 std::string filled(std::string_view text, MailTexts::Values values) {
   std::string out;
   while (!text.empty()) {
