@@ -7,7 +7,7 @@
 #include <exception>
 #include <string_view>
 
-#include "ctl.hpp"
+#include "base/ctl.hpp"
 
 namespace {
 

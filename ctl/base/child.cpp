@@ -1,4 +1,4 @@
-#include "child.hpp"
+#include "base/child.hpp"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -14,7 +14,7 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "ctl.hpp"
+#include "base/ctl.hpp"
 
 namespace ctl {
 namespace {

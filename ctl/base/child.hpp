@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "file_io.hpp"
+#include "vorn/base/file_io.hpp"
 
 namespace ctl {
 

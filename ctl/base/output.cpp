@@ -4,9 +4,9 @@
 #include <cwchar>
 #include <nlohmann/json.hpp>
 
-#include "ctl.hpp"
-#include "host_log.hpp"
-#include "utf8.hpp"
+#include "base/ctl.hpp"
+#include "base/host_log.hpp"
+#include "vorn/base/utf8.hpp"
 
 namespace ctl {
 namespace {

@@ -1,4 +1,4 @@
-#include "process.hpp"
+#include "base/process.hpp"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -13,8 +13,8 @@
 #include <cstring>
 #include <utility>
 
-#include "ctl.hpp"
-#include "file_io.hpp"
+#include "base/ctl.hpp"
+#include "vorn/base/file_io.hpp"
 
 namespace ctl {
 namespace {

@@ -1,4 +1,4 @@
-#include "checks.hpp"
+#include "config/checks.hpp"
 
 #include <pwd.h>
 #include <sys/stat.h>
@@ -11,17 +11,17 @@
 #include <numeric>
 #include <set>
 
-#include "config.hpp"
-#include "ctl.hpp"
-#include "link.hpp"
-#include "mail.hpp"
-#include "old_reports.hpp"
-#include "run_paths.hpp"
-#include "text_containers.hpp"
-#include "utf8.hpp"
+#include "base/ctl.hpp"
+#include "base/text_containers.hpp"
+#include "config/config.hpp"
+#include "mail/mail.hpp"
+#include "run/link.hpp"
+#include "run/old_reports.hpp"
+#include "run/run_paths.hpp"
+#include "vorn/base/utf8.hpp"
+#include "vorn/base/words.hpp"
 #include "vorn/paths.h"
 #include "vornreport/registry.hpp"
-#include "words.hpp"
 
 namespace ctl {
 namespace {

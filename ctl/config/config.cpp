@@ -1,12 +1,12 @@
-#include "config.hpp"
+#include "config/config.hpp"
 
 #include <algorithm>
 
-#include "config_edit.hpp"
-#include "config_file.hpp"
-#include "config_lines.hpp"
-#include "ctl.hpp"
-#include "profile.hpp"
+#include "base/ctl.hpp"
+#include "config/config_edit.hpp"
+#include "config/config_file.hpp"
+#include "config/config_lines.hpp"
+#include "config/profile.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {

@@ -8,7 +8,7 @@
 #include <utility>
 #include <vector>
 
-#include "shares.hpp"
+#include "config/shares.hpp"
 
 namespace ctl {
 

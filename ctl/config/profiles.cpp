@@ -9,16 +9,16 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "checks.hpp"
-#include "config.hpp"
-#include "ctl.hpp"
-#include "file_io.hpp"
-#include "old_reports.hpp"
-#include "profile_state.hpp"
-#include "run_lock.hpp"
-#include "run_paths.hpp"
-#include "schedules.hpp"
-#include "text_containers.hpp"
+#include "base/ctl.hpp"
+#include "base/text_containers.hpp"
+#include "config/checks.hpp"
+#include "config/config.hpp"
+#include "run/old_reports.hpp"
+#include "run/profile_state.hpp"
+#include "run/run_lock.hpp"
+#include "run/run_paths.hpp"
+#include "schedule/schedules.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 

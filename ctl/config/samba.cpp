@@ -1,4 +1,4 @@
-#include "samba.hpp"
+#include "config/samba.hpp"
 
 #include <sys/stat.h>
 
@@ -7,10 +7,10 @@
 #include <map>
 #include <optional>
 
-#include "ctl.hpp"
-#include "file_io.hpp"
-#include "process.hpp"
-#include "words.hpp"
+#include "base/ctl.hpp"
+#include "base/process.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/words.hpp"
 
 namespace ctl {
 namespace {

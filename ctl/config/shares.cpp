@@ -5,13 +5,13 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "checks.hpp"
-#include "config.hpp"
-#include "ctl.hpp"
-#include "samba.hpp"
+#include "base/ctl.hpp"
+#include "config/checks.hpp"
+#include "config/config.hpp"
+#include "config/samba.hpp"
+#include "vorn/base/words.hpp"
 #include "vorn/paths.h"
 #include "vorn/share.h"
-#include "words.hpp"
 
 namespace ctl {
 namespace {

@@ -3,10 +3,10 @@
 #include <string>
 #include <vector>
 
-#include "config.hpp"
-#include "ctl.hpp"
-#include "mail.hpp"
-#include "text_containers.hpp"
+#include "base/ctl.hpp"
+#include "base/text_containers.hpp"
+#include "config/config.hpp"
+#include "mail/mail.hpp"
 #include "vorn/config.h"
 #include "vorn/paths.h"
 

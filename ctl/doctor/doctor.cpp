@@ -1,5 +1,5 @@
 // vornctl doctor: whether this machine has all that its runs need.
-#include "doctor.hpp"
+#include "doctor/doctor.hpp"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -13,8 +13,8 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "ctl.hpp"
-#include "file_io.hpp"
+#include "base/ctl.hpp"
+#include "vorn/base/file_io.hpp"
 
 namespace ctl {
 namespace {

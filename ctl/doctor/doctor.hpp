@@ -9,7 +9,7 @@
 #include <string_view>
 #include <vector>
 
-#include "config.hpp"
+#include "config/config.hpp"
 
 namespace ctl {
 

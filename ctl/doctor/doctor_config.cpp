@@ -2,11 +2,11 @@
 #include <algorithm>
 #include <set>
 
-#include "checks.hpp"
-#include "config_file.hpp"
-#include "config_lines.hpp"
-#include "ctl.hpp"
-#include "doctor.hpp"
+#include "base/ctl.hpp"
+#include "config/checks.hpp"
+#include "config/config_file.hpp"
+#include "config/config_lines.hpp"
+#include "doctor/doctor.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {

@@ -12,9 +12,9 @@
 #include <memory>
 #include <set>
 
-#include "ctl.hpp"
-#include "doctor.hpp"
-#include "profile_state.hpp"
+#include "base/ctl.hpp"
+#include "doctor/doctor.hpp"
+#include "run/profile_state.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {

@@ -9,11 +9,11 @@
 #include <cstring>
 #include <memory>
 
-#include "ctl.hpp"
-#include "doctor.hpp"
-#include "file_io.hpp"
-#include "process.hpp"
-#include "schedules.hpp"
+#include "base/ctl.hpp"
+#include "base/process.hpp"
+#include "doctor/doctor.hpp"
+#include "schedule/schedules.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {

@@ -6,12 +6,12 @@
 #include <filesystem>
 #include <fstream>
 
-#include "cron_times.hpp"
-#include "ctl.hpp"
-#include "doctor.hpp"
-#include "profile_state.hpp"
-#include "run_paths.hpp"
-#include "schedules.hpp"
+#include "base/ctl.hpp"
+#include "doctor/doctor.hpp"
+#include "run/profile_state.hpp"
+#include "run/run_paths.hpp"
+#include "schedule/cron_times.hpp"
+#include "schedule/schedules.hpp"
 
 namespace ctl {
 namespace {

@@ -8,10 +8,10 @@
 #include <cstring>
 #include <memory>
 
-#include "doctor.hpp"
-#include "file_system.hpp"
-#include "mounts.hpp"
-#include "text_containers.hpp"
+#include "base/text_containers.hpp"
+#include "doctor/doctor.hpp"
+#include "machine/file_system.hpp"
+#include "machine/mounts.hpp"
 #include "vorn/config.h"
 #include "vorn/paths.h"
 

@@ -1,4 +1,4 @@
-#include "profile_state.hpp"
+#include "run/profile_state.hpp"
 
 #include <sqlite3.h>
 #include <sys/stat.h>
@@ -12,11 +12,11 @@
 #include <memory>
 #include <sstream>
 
-#include "ctl.hpp"
-#include "file_io.hpp"
-#include "run_lock.hpp"
-#include "run_paths.hpp"
-#include "text_containers.hpp"
+#include "base/ctl.hpp"
+#include "base/text_containers.hpp"
+#include "run/run_lock.hpp"
+#include "run/run_paths.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {

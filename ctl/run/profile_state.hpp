@@ -8,8 +8,8 @@
 #include <string>
 #include <vector>
 
-#include "config.hpp"
-#include "old_reports.hpp"
+#include "config/config.hpp"
+#include "run/old_reports.hpp"
 
 namespace ctl {
 

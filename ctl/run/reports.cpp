@@ -11,10 +11,10 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "child.hpp"
-#include "ctl.hpp"
-#include "profile_state.hpp"
-#include "text_containers.hpp"
+#include "base/child.hpp"
+#include "base/ctl.hpp"
+#include "base/text_containers.hpp"
+#include "run/profile_state.hpp"
 #include "vorn/report.h"
 
 namespace ctl {

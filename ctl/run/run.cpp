@@ -12,14 +12,14 @@
 #include <memory>
 #include <string>
 
-#include "child.hpp"
-#include "ctl.hpp"
-#include "old_reports.hpp"
-#include "profile_state.hpp"
-#include "run_log.hpp"
-#include "run_watch.hpp"
-#include "schedules.hpp"
-#include "text_containers.hpp"
+#include "base/child.hpp"
+#include "base/ctl.hpp"
+#include "base/text_containers.hpp"
+#include "run/old_reports.hpp"
+#include "run/profile_state.hpp"
+#include "run/run_log.hpp"
+#include "run/run_watch.hpp"
+#include "schedule/schedules.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 #include "vornreport/registry.hpp"

@@ -1,4 +1,4 @@
-#include "run_log.hpp"
+#include "run/run_log.hpp"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -10,8 +10,8 @@
 #include <string_view>
 #include <thread>
 
-#include "file_io.hpp"
-#include "process.hpp"
+#include "base/process.hpp"
+#include "vorn/base/file_io.hpp"
 
 namespace ctl {
 namespace {

@@ -1,4 +1,4 @@
-#include "run_watch.hpp"
+#include "run/run_watch.hpp"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -7,9 +7,9 @@
 #include <algorithm>
 #include <vector>
 
-#include "file_io.hpp"
-#include "run_paths.hpp"
-#include "words.hpp"
+#include "run/run_paths.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/words.hpp"
 
 namespace ctl {
 namespace {

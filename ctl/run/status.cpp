@@ -4,10 +4,10 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "ctl.hpp"
-#include "profile_state.hpp"
-#include "report_figures.hpp"
-#include "schedules.hpp"
+#include "base/ctl.hpp"
+#include "run/profile_state.hpp"
+#include "run/report_figures.hpp"
+#include "schedule/schedules.hpp"
 
 namespace ctl {
 namespace {

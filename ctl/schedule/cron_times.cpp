@@ -1,4 +1,4 @@
-#include "cron_times.hpp"
+#include "schedule/cron_times.hpp"
 
 #include <strings.h>
 

@@ -15,11 +15,11 @@
 #include <cstdio>
 #include <cstring>
 
-#include "cron_times.hpp"
-#include "ctl.hpp"
-#include "file_io.hpp"
-#include "profile_state.hpp"
-#include "schedules.hpp"
+#include "base/ctl.hpp"
+#include "run/profile_state.hpp"
+#include "schedule/cron_times.hpp"
+#include "schedule/schedules.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {

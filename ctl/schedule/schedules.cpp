@@ -1,4 +1,4 @@
-#include "schedules.hpp"
+#include "schedule/schedules.hpp"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -7,11 +7,11 @@
 #include <cstring>
 #include <exception>
 
-#include "cron_times.hpp"
-#include "file_io.hpp"
-#include "run_paths.hpp"
+#include "run/run_paths.hpp"
+#include "schedule/cron_times.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/words.hpp"
 #include "vorn/paths.h"
-#include "words.hpp"
 
 namespace ctl {
 namespace {

@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "config.hpp"
+#include "config/config.hpp"
 
 namespace ctl {
 

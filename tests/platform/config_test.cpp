@@ -9,9 +9,9 @@
 #include <cstring>
 #include <filesystem>
 
-#include "config_edit.hpp"
+#include "base/text_containers.hpp"
+#include "config/config_edit.hpp"
 #include "support.hpp"
-#include "text_containers.hpp"
 
 namespace {
 

@@ -11,7 +11,7 @@
 #include <filesystem>
 #include <random>
 
-#include "sqlite_memory.hpp"
+#include "machine/sqlite_memory.hpp"
 #include "support.hpp"
 #include "vorn/report.h"
 

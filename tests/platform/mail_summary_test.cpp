@@ -1,5 +1,5 @@
 // The figures of a finished report, and what a mail says of them.
-#include "mail_summary.hpp"
+#include "mail/mail_summary.hpp"
 
 #include <gtest/gtest.h>
 

@@ -11,9 +11,9 @@
 #include <filesystem>
 #include <regex>
 
-#include "file_io.hpp"
-#include "mail.hpp"
+#include "mail/mail.hpp"
 #include "support.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 

@@ -6,7 +6,7 @@
 #include <filesystem>
 #include <set>
 
-#include "old_reports.hpp"
+#include "run/old_reports.hpp"
 #include "support.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"

@@ -1,9 +1,9 @@
 // Shares, and the selection of a profile.
-#include "shares.hpp"
+#include "config/shares.hpp"
 
 #include <gtest/gtest.h>
 
-#include "file_system.hpp"
+#include "machine/file_system.hpp"
 #include "support.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"

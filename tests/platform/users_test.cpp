@@ -1,5 +1,5 @@
 // Accounts, as the name service knows them (the sandbox has a password file of the tests' own).
-#include "users.hpp"
+#include "machine/users.hpp"
 
 #include <gtest/gtest.h>
 

@@ -1,13 +1,13 @@
 // Which mounts are volumes, and what they are called.
-#include "volumes.hpp"
+#include "machine/volumes.hpp"
 
 #include <gtest/gtest.h>
 
 #include <set>
 
-#include "file_system.hpp"
+#include "base/text_containers.hpp"
+#include "machine/file_system.hpp"
 #include "support.hpp"
-#include "text_containers.hpp"
 #include "vorn/volume.h"
 
 namespace {

@@ -1,4 +1,4 @@
-#include "formats.hpp"
+#include "base/formats.hpp"
 
 #include <fcntl.h>
 #include <sys/sendfile.h>
@@ -11,9 +11,9 @@
 #include <cstring>
 #include <ctime>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "utf8.hpp"
+#include "base/host_log.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/utf8.hpp"
 #include "vorn/report.h"
 
 namespace host {

@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "text_containers.hpp"
+#include "base/text_containers.hpp"
 
 namespace host {
 

@@ -1,4 +1,4 @@
-#include "host_log.hpp"
+#include "base/host_log.hpp"
 
 #include <syslog.h>
 

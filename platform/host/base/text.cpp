@@ -9,9 +9,9 @@
 #include <cstring>
 #include <exception>
 
-#include "file_io.hpp"
-#include "text_containers.hpp"
-#include "words.hpp"
+#include "base/text_containers.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/words.hpp"
 
 namespace {
 

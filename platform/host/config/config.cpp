@@ -7,11 +7,11 @@
 #include <cstring>
 #include <exception>
 
-#include "config_file.hpp"
-#include "config_lines.hpp"
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "text_containers.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "config/config_file.hpp"
+#include "config/config_lines.hpp"
+#include "vorn/base/file_io.hpp"
 
 namespace host {
 namespace {

@@ -1,11 +1,11 @@
-#include "config_edit.hpp"
+#include "config/config_edit.hpp"
 
 #include <algorithm>
 
-#include "config_file.hpp"
-#include "config_lines.hpp"
-#include "host_log.hpp"
-#include "words.hpp"
+#include "base/host_log.hpp"
+#include "config/config_file.hpp"
+#include "config/config_lines.hpp"
+#include "vorn/base/words.hpp"
 
 namespace host {
 namespace {

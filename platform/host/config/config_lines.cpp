@@ -1,10 +1,10 @@
-#include "config_lines.hpp"
+#include "config/config_lines.hpp"
 
 #include <algorithm>
 #include <unordered_set>
 
-#include "host_log.hpp"
-#include "words.hpp"
+#include "base/host_log.hpp"
+#include "vorn/base/words.hpp"
 
 namespace host {
 namespace {

@@ -10,9 +10,9 @@
 #include <memory>
 #include <thread>
 
-#include "config_file.hpp"
-#include "file_io.hpp"
-#include "host_log.hpp"
+#include "base/host_log.hpp"
+#include "config/config_file.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/text.h"
 
 namespace host {

@@ -1,12 +1,12 @@
 // The language of the page.
-#include "language.hpp"
+#include "config/language.hpp"
 
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <string_view>
 
-#include "host_log.hpp"
+#include "base/host_log.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 

@@ -1,5 +1,5 @@
 // Profile names, the list of profiles and their schedules.
-#include "profile.hpp"
+#include "config/profile.hpp"
 
 #include <sys/stat.h>
 #include <unistd.h>
@@ -12,9 +12,9 @@
 #include <string>
 #include <string_view>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "text_containers.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/config.h"
 #include "vorn/paths.h"
 #include "vorn/report.h"

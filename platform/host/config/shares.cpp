@@ -1,4 +1,4 @@
-#include "shares.hpp"
+#include "config/shares.hpp"
 
 #include <strings.h>
 
@@ -8,14 +8,14 @@
 #include <memory>
 #include <unordered_set>
 
-#include "host_log.hpp"
-#include "text_containers.hpp"
-#include "utf8.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "vorn/base/utf8.hpp"
+#include "vorn/base/words.hpp"
 #include "vorn/config.h"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 #include "vorn/share.h"
-#include "words.hpp"
 
 namespace host {
 namespace {

@@ -17,8 +17,8 @@
 #include <utility>
 #include <vector>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
+#include "base/host_log.hpp"
+#include "vorn/base/file_io.hpp"
 
 // Rows are read as a whole when the statement runs: a statement that is under way holds a lock that
 // keeps writers out, and what a caller does between two rows may take any time.

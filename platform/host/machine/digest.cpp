@@ -12,7 +12,7 @@
 #include <memory>
 #include <new>
 
-#include "file_io.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/report.h"
 
 namespace host {

@@ -10,7 +10,7 @@
 #include <csignal>
 #include <cstdlib>
 
-#include "sqlite_memory.hpp"
+#include "machine/sqlite_memory.hpp"
 #include "vorn/report.h"
 
 #if defined(__SANITIZE_ADDRESS__)

@@ -1,4 +1,4 @@
-#include "file_system.hpp"
+#include "machine/file_system.hpp"
 
 #include <linux/magic.h>
 #include <sys/stat.h>
@@ -8,8 +8,8 @@
 #include <cerrno>
 #include <unordered_map>
 
-#include "mounts.hpp"
-#include "shares.hpp"
+#include "config/shares.hpp"
+#include "machine/mounts.hpp"
 
 namespace host {
 namespace {

@@ -1,4 +1,4 @@
-#include "mounts.hpp"
+#include "machine/mounts.hpp"
 
 #include <fcntl.h>
 #include <libmount/libmount.h>
@@ -11,7 +11,7 @@
 #include <string_view>
 #include <unordered_set>
 
-#include "file_system.hpp"
+#include "machine/file_system.hpp"
 
 namespace host {
 namespace {

@@ -1,4 +1,4 @@
-#include "sqlite_memory.hpp"
+#include "machine/sqlite_memory.hpp"
 
 #include <algorithm>
 #include <array>

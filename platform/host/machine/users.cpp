@@ -1,5 +1,5 @@
 // User accounts. Looked up one by one, never enumerated: domains of any size can be asked that way.
-#include "users.hpp"
+#include "machine/users.hpp"
 
 #include <pwd.h>
 #include <unistd.h>
@@ -14,10 +14,10 @@
 #include <utility>
 #include <vector>
 
-#include "file_io.hpp"
-#include "formats.hpp"
-#include "host_log.hpp"
-#include "text_containers.hpp"
+#include "base/formats.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/report.h"
 #include "vorn/user.h"
 

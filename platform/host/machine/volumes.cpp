@@ -1,4 +1,4 @@
-#include "volumes.hpp"
+#include "machine/volumes.hpp"
 
 #include <algorithm>
 #include <cerrno>
@@ -13,11 +13,11 @@
 #include <tuple>
 #include <utility>
 
-#include "file_io.hpp"
-#include "file_system.hpp"
-#include "host_log.hpp"
-#include "shares.hpp"
-#include "text_containers.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "config/shares.hpp"
+#include "machine/file_system.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 #include "vorn/volume.h"
 

@@ -11,8 +11,8 @@
 #include <string_view>
 #include <vector>
 
-#include "mounts.hpp"
-#include "shares.hpp"
+#include "config/shares.hpp"
+#include "machine/mounts.hpp"
 
 namespace host {
 

@@ -1,4 +1,4 @@
-#include "mail.hpp"
+#include "mail/mail.hpp"
 
 #include <curl/curl.h>
 #include <sys/random.h>
@@ -13,13 +13,13 @@
 #include <memory>
 #include <optional>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "mail_delivery.hpp"
-#include "profile.hpp"
+#include "base/host_log.hpp"
+#include "config/profile.hpp"
+#include "mail/mail_delivery.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/words.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
-#include "words.hpp"
 
 namespace host {
 namespace {

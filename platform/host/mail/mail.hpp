@@ -8,8 +8,8 @@
 #include <string_view>
 #include <vector>
 
-#include "mail_summary.hpp"
-#include "text_containers.hpp"
+#include "base/text_containers.hpp"
+#include "mail/mail_summary.hpp"
 
 namespace host {
 

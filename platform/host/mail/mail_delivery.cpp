@@ -1,4 +1,4 @@
-#include "mail_delivery.hpp"
+#include "mail/mail_delivery.hpp"
 
 #include <curl/curl.h>
 #include <sys/socket.h>
@@ -9,7 +9,7 @@
 #include <memory>
 #include <string_view>
 
-#include "host_log.hpp"
+#include "base/host_log.hpp"
 #include "vorn/paths.h"
 
 namespace host {

@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "mail.hpp"
+#include "mail/mail.hpp"
 
 namespace host {
 

@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <array>
 
-#include "mail.hpp"
-#include "utf8.hpp"
+#include "mail/mail.hpp"
+#include "vorn/base/utf8.hpp"
 
 namespace host {
 namespace {

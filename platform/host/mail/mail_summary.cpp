@@ -1,4 +1,4 @@
-#include "mail_summary.hpp"
+#include "mail/mail_summary.hpp"
 
 #include <algorithm>
 #include <cstddef>

@@ -4,8 +4,8 @@
 
 #include <string>
 
-#include "mail_texts.hpp"
-#include "report_figures.hpp"
+#include "mail/mail_texts.hpp"
+#include "run/report_figures.hpp"
 
 namespace host {
 

@@ -1,4 +1,4 @@
-#include "mail_texts.hpp"
+#include "mail/mail_texts.hpp"
 
 #include <algorithm>
 #include <array>
@@ -6,9 +6,9 @@
 #include <nlohmann/json.hpp>
 #include <optional>
 
-#include "file_io.hpp"
-#include "language.hpp"
-#include "utf8.hpp"
+#include "config/language.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/utf8.hpp"
 
 namespace host {
 namespace {

@@ -1,5 +1,5 @@
 // The link under which readers find a finished report.
-#include "link.hpp"
+#include "run/link.hpp"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -13,10 +13,10 @@
 #include <string>
 #include <string_view>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "page.hpp"
-#include "text_containers.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "run/page.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 

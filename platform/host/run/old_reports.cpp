@@ -1,4 +1,4 @@
-#include "old_reports.hpp"
+#include "run/old_reports.hpp"
 
 #include <fcntl.h>
 #include <fts.h>
@@ -13,11 +13,11 @@
 #include <memory>
 #include <utility>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "page.hpp"
-#include "run_paths.hpp"
-#include "text_containers.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "run/page.hpp"
+#include "run/run_paths.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
 namespace host {

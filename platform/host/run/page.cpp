@@ -1,4 +1,4 @@
-#include "page.hpp"
+#include "run/page.hpp"
 
 #include <fcntl.h>
 #include <strings.h>
@@ -6,7 +6,7 @@
 
 #include <string_view>
 
-#include "file_io.hpp"
+#include "vorn/base/file_io.hpp"
 
 namespace host {
 

@@ -1,4 +1,4 @@
-#include "page_lines.hpp"
+#include "run/page_lines.hpp"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <utility>
 
-#include "words.hpp"
+#include "vorn/base/words.hpp"
 
 namespace host {
 namespace {

@@ -1,4 +1,4 @@
-#include "report_figures.hpp"
+#include "run/report_figures.hpp"
 
 #include <algorithm>
 #include <charconv>
@@ -7,9 +7,9 @@
 #include <string_view>
 #include <unordered_set>
 
-#include "file_io.hpp"
-#include "page_lines.hpp"
-#include "words.hpp"
+#include "run/page_lines.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/words.hpp"
 
 namespace host {
 namespace {

@@ -7,7 +7,7 @@
 //
 // The file's content is the holder's process id. It is only read by the next holder, to know which
 // names in /tmp a killed run has left.
-#include "run_lock.hpp"
+#include "run/run_lock.hpp"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -19,9 +19,9 @@
 #include <cstring>
 #include <utility>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "run_temporary.hpp"
+#include "base/host_log.hpp"
+#include "run/run_temporary.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
 namespace host {

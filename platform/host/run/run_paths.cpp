@@ -1,5 +1,5 @@
 // The paths of a profile, and the preparation of its report run.
-#include "run_paths.hpp"
+#include "run/run_paths.hpp"
 
 #include <dirent.h>
 #include <fcntl.h>
@@ -15,18 +15,18 @@
 #include <memory>
 #include <string_view>
 
-#include "config_file.hpp"
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "old_reports.hpp"
-#include "profile.hpp"
-#include "run_lock.hpp"
-#include "run_temporary.hpp"
-#include "shares.hpp"
-#include "text_containers.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "config/config_file.hpp"
+#include "config/profile.hpp"
+#include "config/shares.hpp"
+#include "run/old_reports.hpp"
+#include "run/run_lock.hpp"
+#include "run/run_temporary.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/base/words.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
-#include "words.hpp"
 
 namespace host {
 namespace {

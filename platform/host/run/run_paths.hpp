@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "file_io.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/text.h"
 
 namespace host {

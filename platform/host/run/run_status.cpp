@@ -11,15 +11,15 @@
 #include <string_view>
 #include <vector>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
-#include "old_reports.hpp"
-#include "page.hpp"
-#include "profile.hpp"
-#include "run_lock.hpp"
-#include "run_paths.hpp"
-#include "run_temporary.hpp"
-#include "text_containers.hpp"
+#include "base/host_log.hpp"
+#include "base/text_containers.hpp"
+#include "config/profile.hpp"
+#include "run/old_reports.hpp"
+#include "run/page.hpp"
+#include "run/run_lock.hpp"
+#include "run/run_paths.hpp"
+#include "run/run_temporary.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 

@@ -1,4 +1,4 @@
-#include "run_temporary.hpp"
+#include "run/run_temporary.hpp"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -9,8 +9,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "file_io.hpp"
-#include "host_log.hpp"
+#include "base/host_log.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
 namespace host {
