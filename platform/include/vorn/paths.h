@@ -10,6 +10,7 @@
 #define VORN_PATH_TEMPLATE "/usr/vorn/vornreport/reportUI/template"
 #define VORN_PATH_STAT "/usr/vorn/var/stat"
 #define VORN_PATH_STATUS "/usr/vorn/var/status"
+#define VORN_PATH_PROGRESS "/usr/vorn/var/progress"
 #define VORN_PATH_REPORTS "/usr/vorn/var/reports"
 #define VORN_PATH_CRON "/etc/cron.d"
 

@@ -35,9 +35,11 @@ int VornQazProfileRunning(const char* profile);
 
 // Stores the status word of `profile`, atomically: "collect_data", "success" or "fail". Only the
 // holder of the profile can.
-// In a report run (VornQazInitRealPath with for_report 1) "success" is stored only when the
-// finished report is complete; otherwise "fail" is stored, one syslog line says why, what looked
-// like a report is removed, and the result is still 0. -1 when nothing could be stored.
+// This is the end of a report run (VornQazInitRealPath with for_report 1), and the only one: of it
+// "success" is stored only when the finished report is complete; otherwise "fail" is stored, one
+// syslog line says why, and what looked like a report is removed. Behind the word the status file
+// tells more (report_format/run_state.hpp).
+// 0 when the word was stored; 1 when "fail" was, in place of "success"; -1 when nothing could be.
 // After a success the oldest finished reports beyond the profile's key `keep_reports` (a number
 // from 1 on; unset: all are kept) are removed, never the one just made.
 int VornQazStatusUpdate(const char* profile, const char* status);
@@ -57,9 +59,16 @@ int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report)
 // Removes what an unfinished run of `profile` left: its `.partial` folders, its statistics database
 // with journal, and this process's temporary names in /tmp. Never a finished report, and nothing
 // while another live process holds the profile. `hash` is the profile with its paths; null when
-// loading it failed, then only what needs no configuration is removed. When this process is in the
-// middle of a run of `profile` (it holds it), the status "fail" is stored. 0 or -1.
+// loading it failed, then only what needs no configuration is removed. Declares nothing: the status
+// stays what it is. 0 or -1.
 int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash);
+
+// Puts `text` in the place of what VORN_PATH_PROGRESS tells of the run of `profile`: atomically, so
+// that a reader never sees a part. Nothing waits for the disk. 0, or -1 without any message: a run
+// goes on without.
+int VornQazProgressUpdate(const char* profile, const char* text);
+// Removes it; a missing one is fine.
+void VornQazProgressEnd(const char* profile);
 
 // Removes the schedule whose identifier is the value of `key` in `*hash` (its file in
 // VORN_PATH_CRON), and the key. 1 when `*hash` changed, 0 when there was nothing to do, -1 on
@@ -75,6 +84,19 @@ int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size);
 // Non-zero when the profile selects `share`: its key `share_list` (names separated by commas) is
 // unset or names it.
 int VornQazMatchShare(const VLIBCSzHash* hash, const char* share);
+
+// --- The server ---------------------------------------------------------------------------------
+
+// Its name and its time zone ("Europe/Berlin", or "+02:00" where the zone has no name). The length,
+// or -1 when it doesn't fit or an argument is null.
+int VornQazGetHostName(char* out, size_t size);
+int VornQazGetTimeZone(char* out, size_t size);
+
+// From now on the platform calls `sink` for what it notices that a reader of the report must know,
+// besides its syslog line: a kind of report_format's table of incidents, what it concerns, and a
+// sentence that says what is wrong and what to do. Null: nobody is told.
+typedef void (*VornIncidentSink)(const char* kind, const char* what, const char* text);
+void VornQazSetIncidentSink(VornIncidentSink sink);
 
 // --- What reports look things up in -------------------------------------------------------------
 

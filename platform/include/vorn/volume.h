@@ -25,8 +25,9 @@ typedef struct VORNMountVolInfo {
 enum { VORN_VOLUMES_OF_USAGE = 11, VORN_VOLUMES_OF_QUOTA = 15 };
 
 // The mounted volumes, freed by the caller; null when there are none. `filter` must be null. A
-// volume that can't be measured is left out, with one syslog line. Each is measured once in the
-// life of the process.
+// volume that can't be measured is left out, with one syslog line and an incident
+// ("volume_unknown"). What was measured counts for five minutes: a run stores a sample and compares
+// with it a moment later, and what is written in between must not pass for growth.
 VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int selector);
 // Frees the whole list; accepts null.
 void VORNMountVolInfoFree(VORNMountVolInfo* volumes);
@@ -35,6 +36,14 @@ void VORNMountVolInfoFree(VORNMountVolInfo* volumes);
 // share's folder (of a share with `network = yes` also a network file system, which is no volume of
 // the enumeration). A share whose folder doesn't exist is left out. 0, or -1 with `*hash` null.
 int VornQazGetVolumePathHash(VLIBCSzHash** hash);
+
+// Writes the mount path of the volume that holds `path` (links followed), as the enumeration has it,
+// into `mount_path`; of a path on a file system that is no volume the mount's own. The length, or -1
+// when it can't be told or doesn't fit.
+int VORNVolumeOfPath(const char* path, char* mount_path, size_t size);
+
+// Non-zero when the volume mounted at `mount_path` keeps users' quotas, by its mount options.
+int VORNVolumeHasQuotas(const char* mount_path);
 
 // Writes the identifier of the volume mounted at `mount_path`: a short text, the same from run to
 // run, fit for a quoted JavaScript string and a quoted CSV field. Never fails for a volume of the

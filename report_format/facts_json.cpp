@@ -1,0 +1,459 @@
+// The facts as JSON, written and read: one function for each list and direction, side by side, so
+// that a key can't be spelt in two ways.
+#include <array>
+#include <cmath>
+#include <nlohmann/json.hpp>
+#include <type_traits>
+
+#include "report_format/attention.hpp"
+#include "report_format/facts.hpp"
+
+namespace report_format {
+namespace {
+
+using Json = nlohmann::ordered_json;
+
+template <typename T, typename Record>
+concept IsA = std::is_same_v<std::remove_const_t<T>, Record>;
+template <typename T>
+concept Arithmetic = std::is_arithmetic_v<T>;
+
+// In one class, whose functions know each other whatever their order.
+struct Codec {
+  // --- Reading single values
+  // ---------------------------------------------------------------------- What is missing or of
+  // another kind leaves `value` as it is.
+
+  static void take(const Json& json, std::string& value) {
+    if (json.is_string()) {
+      value = json.get<std::string>();
+    }
+  }
+  static void take(const Json& json, bool& value) {
+    if (json.is_boolean()) {
+      value = json.get<bool>();
+    }
+  }
+  static void take(const Json& json, double& value) {
+    if (json.is_number()) {
+      value = json.get<double>();
+    }
+  }
+  static void take(const Json& json, std::uint64_t& value) {
+    if (json.is_number_unsigned()) {
+      value = json.get<std::uint64_t>();
+    }
+  }
+  static void take(const Json& json, std::int64_t& value) {
+    constexpr std::uint64_t kMost = INT64_MAX;
+    if (json.is_number_integer() &&
+        (!json.is_number_unsigned() || json.get<std::uint64_t>() <= kMost)) {
+      value = json.get<std::int64_t>();
+    }
+  }
+
+  template <typename Enum, std::size_t Count>
+  static void take_word(const Json& json, Enum& value, const std::array<Enum, Count>& all) {
+    for (const Enum one : all) {
+      if (json.is_string() && json.get_ref<const std::string&>() == word_of(one)) {
+        value = one;
+      }
+    }
+  }
+  static void take(const Json& json, Level& value) {
+    take_word(json, value, std::array{Level::kOk, Level::kWarning, Level::kCritical});
+  }
+  static void take(const Json& json, ForecastState& value) {
+    using enum ForecastState;
+    take_word(json, value, std::array{kFull, kShort, kGrowing, kShrinking, kSteady});
+  }
+
+  static Json written(Level level) { return word_of(level); }
+  static Json written(ForecastState state) { return word_of(state); }
+  static Json written(const Arithmetic auto& number) { return number; }
+  static Json written(const std::string& text) { return text; }
+
+  // --- Records
+  // ------------------------------------------------------------------------------------ A record
+  // names its keys once, in fields(); Writer and Reader go through them.
+
+  template <typename Value>
+  static Json written(const std::vector<Value>& list) {
+    Json json = Json::array();
+    for (const Value& value : list) {
+      json.push_back(written(value));
+    }
+    return json;
+  }
+  template <typename Value>
+  static void take(const Json& json, std::vector<Value>& list) {
+    if (!json.is_array()) {
+      return;
+    }
+    list.clear();
+    for (const Json& entry : json) {
+      take(entry, list.emplace_back());
+    }
+  }
+
+  template <typename Value>
+  static Json written(const std::optional<Value>& value) {
+    return value ? written(*value) : Json(nullptr);
+  }
+  template <typename Value>
+  static void take(const Json& json, std::optional<Value>& value) {
+    if (!json.is_null()) {
+      Value taken{};
+      take(json, taken);
+      value = std::move(taken);
+    }
+  }
+
+  static Json written(const Sample& sample) { return {sample.time, sample.used}; }
+  static void take(const Json& json, Sample& sample) {
+    if (json.is_array() && json.size() == 2) {
+      take(json[0], sample.time);
+      take(json[1], sample.used);
+    }
+  }
+
+  static Json written(IncidentLevel level) {
+    return level == IncidentLevel::kError ? "error" : "warning";
+  }
+  static void take(const Json& json, IncidentLevel& level) {
+    level = json == "error" ? IncidentLevel::kError : IncidentLevel::kWarning;
+  }
+
+  static Json written(const AttentionValue& value) {
+    return std::visit([](const auto& one) { return Json(one); }, value);
+  }
+  static void take(const Json& json, AttentionValue& value) {
+    if (json.is_string()) {
+      value = json.get<std::string>();
+    } else if (json.is_number_integer()) {
+      std::int64_t number = 0;
+      take(json, number);
+      value = number;
+    } else if (json.is_number()) {
+      value = json.get<double>();
+    }
+  }
+
+  using AttentionValues = std::vector<std::pair<std::string, AttentionValue>>;
+  static Json written(const AttentionValues& values) {
+    Json json = Json::object();
+    for (const auto& [name, value] : values) {
+      json[name] = written(value);
+    }
+    return json;
+  }
+  static void take(const Json& json, AttentionValues& values) {
+    values.clear();
+    if (json.is_object()) {
+      for (const auto& [name, value] : json.items()) {
+        take(value, values.emplace_back(name, AttentionValue{}).second);
+      }
+    }
+  }
+
+  // Whether duplicates are told by content is a word in the file.
+  template <typename Bool>
+  struct Mode {
+    Bool by_content;
+  };
+
+  class Writer {
+   public:
+    template <typename Value>
+    void operator()(const char* key, const Value& value) {
+      json_[key] = written(value);
+    }
+    void operator()(const char* key, Mode<const bool*> mode) {
+      json_[key] = *mode.by_content ? "content" : "name";
+    }
+    Json take_json() { return std::move(json_); }
+
+   private:
+    Json json_ = Json::object();
+  };
+
+  class Reader {
+   public:
+    explicit Reader(const Json& json) : json_(json) {}
+    template <typename Value>
+    void operator()(const char* key, Value& value) {
+      if (const auto found = json_.find(key); found != json_.end()) {
+        take(*found, value);
+      }
+    }
+    void operator()(const char* key, Mode<bool*> mode) {
+      const auto found = json_.find(key);
+      *mode.by_content = found != json_.end() && *found == "content";
+    }
+
+   private:
+    const Json& json_;
+  };
+
+  // `Is<Record>` is the record or a const one.
+  static void fields(auto& field, IsA<Incident> auto& r) {
+    field("level", r.level);
+    field("kind", r.kind);
+    field("what", r.what);
+    field("text", r.text);
+  }
+
+  static void fields(auto& field, IsA<Jump> auto& r) {
+    field("date", r.date);
+    field("bytes", r.bytes);
+  }
+
+  static void fields(auto& field, IsA<Forecast> auto& r) {
+    field("state", r.state);
+    field("days", r.days);
+    field("days_low", r.days_low);
+    field("days_high", r.days_high);
+    field("per_day", r.per_day);
+    field("window", r.window);
+    field("jump", r.jump);
+  }
+
+  static void fields(auto& field, IsA<GrownSince> auto& r) {
+    field("since", r.since);
+    field("files", r.files);
+    field("bytes", r.bytes);
+  }
+
+  static void fields(auto& field, IsA<Grown> auto& r) {
+    field("last", r.last);
+    field("week", r.week);
+    field("month", r.month);
+  }
+
+  static void fields(auto& field, IsA<Cause> auto& r) {
+    field("kind", r.kind);
+    field("share", r.share);
+    field("name", r.name);
+    field("bytes", r.bytes);
+    field("since", r.since);
+  }
+
+  static void fields(auto& field, IsA<VolumeFacts> auto& r) {
+    field("id", r.id);
+    field("path", r.path);
+    field("size", r.size);
+    field("used", r.used);
+    field("free", r.free);
+    field("percent", r.percent);
+    field("level", r.level);
+    field("forecast", r.forecast);
+    field("samples", r.samples);
+    field("explained", r.explained);
+    field("outside", r.outside);
+    field("filled_by", r.filled_by);
+    field("grown_by", r.grown_by);
+  }
+
+  static void fields(auto& field, IsA<ShareFacts> auto& r) {
+    field("name", r.name);
+    field("path", r.path);
+    field("volume", r.volume);
+    field("files", r.files);
+    field("folders", r.folders);
+    field("bytes", r.bytes);
+    field("allocated", r.allocated);
+    field("unreadable", r.unreadable);
+    field("other", r.other);
+    field("whole", r.whole);
+    field("grown", r.grown);
+    field("samples", r.samples);
+  }
+
+  static void fields(auto& field, IsA<OwnerPlace> auto& r) {
+    field("share", r.share);
+    field("volume", r.volume);
+    field("files", r.files);
+    field("bytes", r.bytes);
+  }
+
+  static void fields(auto& field, IsA<OwnerFacts> auto& r) {
+    field("name", r.name);
+    field("files", r.files);
+    field("bytes", r.bytes);
+    field("grown", r.grown);
+    field("places", r.places);
+  }
+
+  static void fields(auto& field, IsA<TypeShare> auto& r) {
+    field("share", r.share);
+    field("files", r.files);
+    field("bytes", r.bytes);
+  }
+
+  static void fields(auto& field, IsA<TypeFacts> auto& r) {
+    field("type", r.type);
+    field("files", r.files);
+    field("bytes", r.bytes);
+    field("grown", r.grown);
+    field("shares", r.shares);
+  }
+
+  static void fields(auto& field, IsA<AgeFacts> auto& r) {
+    field("age", r.age);
+    field("files", r.files);
+    field("bytes", r.bytes);
+  }
+
+  static void fields(auto& field, IsA<QuotaFacts> auto& r) {
+    field("volume", r.volume);
+    field("user", r.user);
+    field("used", r.used);
+    field("quota", r.quota);
+    field("percent", r.percent);
+    field("level", r.level);
+    field("forecast", r.forecast);
+  }
+
+  static void fields(auto& field, IsA<DuplicateFacts> auto& r) {
+    field("mode", Mode<decltype(&r.by_content)>{&r.by_content});
+    field("groups", r.groups);
+    field("files", r.files);
+    field("reclaimable", r.reclaimable);
+  }
+
+  static void fields(auto& field, IsA<Attention> auto& r) {
+    field("level", r.level);
+    field("code", r.code);
+    field("values", r.values);
+    field("section", r.section);
+  }
+
+  static void fields(auto& field, IsA<ReportFacts> auto& r) {
+    field("name", r.name);
+    field("rows", r.rows);
+    field("shown", r.shown);
+    field("limit", r.limit);
+    field("csv", r.csv);
+    field("ok", r.ok);
+  }
+
+  static void fields(auto& field, IsA<Facts> auto& r) {
+    field("host", r.host);
+    field("profile", r.profile);
+    field("time_zone", r.time_zone);
+    field("language", r.language);
+    field("started", r.started);
+    field("finished", r.finished);
+    field("complete", r.complete);
+    field("incidents", r.incidents);
+    field("volumes", r.volumes);
+    field("shares", r.shares);
+    field("owners", r.owners);
+    field("types", r.types);
+    field("ages", r.ages);
+    field("quotas", r.quotas);
+    field("duplicates", r.duplicates);
+    field("attention", r.attention);
+    field("reports", r.reports);
+  }
+
+  static Json written(const auto& record) requires(
+      !Arithmetic<std::remove_cvref_t<decltype(record)>>) {
+    Writer writer;
+    fields(writer, record);
+    return writer.take_json();
+  }
+
+  template <typename Record>
+  static void take(const Json& json, Record& record) {
+    if (json.is_object()) {
+      Reader reader(json);
+      fields(reader, record);
+    }
+  }
+};
+
+// Stops at the first value of the object's own key "started".
+class StartedFinder : public nlohmann::json_sax<nlohmann::json> {
+ public:
+  std::optional<std::int64_t> found;
+
+  bool null() override { return next(); }
+  bool boolean(bool /*value*/) override { return next(); }
+  bool number_float(double /*value*/, const std::string& /*text*/) override { return next(); }
+  bool string(std::string& /*value*/) override { return next(); }
+  bool binary(nlohmann::json::binary_t& /*value*/) override { return next(); }
+  bool number_integer(std::int64_t /*value*/) override { return next(); }
+  bool number_unsigned(std::uint64_t value) override {
+    if (is_wanted_ && value <= INT64_MAX) {
+      found = static_cast<std::int64_t>(value);
+    }
+    return next();
+  }
+  bool key(std::string& name) override {
+    is_wanted_ = depth_ == 1 && name == "started";
+    return true;
+  }
+  bool start_object(std::size_t /*size*/) override { return open(); }
+  bool start_array(std::size_t /*size*/) override { return open(); }
+  bool end_object() override { return close(); }
+  bool end_array() override { return close(); }
+  bool parse_error(std::size_t /*at*/, const std::string& /*token*/,
+                   const nlohmann::detail::exception& /*error*/) override {
+    return false;
+  }
+
+ private:
+  bool next() { return !std::exchange(is_wanted_, false); }
+  bool open() {
+    ++depth_;
+    return next();
+  }
+  bool close() {
+    --depth_;
+    return true;
+  }
+
+  int depth_ = 0;
+  bool is_wanted_ = false;
+};
+
+}  // namespace
+
+Json to_json(const Facts& facts) {
+  Json json = Json::object();
+  json["format"] = kFactsFormat;
+  json.update(Codec::written(facts));
+  return json;
+}
+
+std::string to_line(const Facts& facts) {
+  std::string line;
+  for (const char c :
+       to_json(facts).dump(-1, ' ', /*ensure_ascii=*/true, Json::error_handler_t::replace)) {
+    c == '<' ? line += "\\u003c" : line += c;
+  }
+  return line;
+}
+
+std::optional<Facts> facts_of(std::string_view text) {
+  const Json json = Json::parse(text, nullptr, /*allow_exceptions=*/false);
+  if (!json.is_object()) {
+    return std::nullopt;
+  }
+  const auto format = json.find("format");
+  if (format == json.end() || *format != kFactsFormat) {
+    return std::nullopt;
+  }
+  Facts facts;
+  Codec::take(json, facts);
+  return facts;
+}
+
+std::optional<std::int64_t> started_of(std::string_view text) {
+  StartedFinder finder;
+  nlohmann::json::sax_parse(text, &finder);
+  return finder.found;
+}
+
+}  // namespace report_format

@@ -1,0 +1,47 @@
+// The two small files by which a run tells others how it is doing: its status, kept after it, and
+// its progress, removed at its end.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace report_format {
+
+// --- Status: /usr/vorn/var/status/<profile>
+// -------------------------------------------------------
+
+// The first line of the file.
+inline constexpr const char* kCollecting = "collect_data";
+inline constexpr const char* kSuccess = "success";
+inline constexpr const char* kFail = "fail";
+
+// Behind it stand "key = value" lines; a reader leaves keys aside that it doesn't know.
+struct RunStatus {
+  std::string word;
+  std::string report;  // folder name of the finished report; only of kSuccess
+  int incidents = 0;   // that the report tells
+};
+std::string status_text(const RunStatus& status);
+RunStatus status_of(std::string_view text);
+
+// --- Progress: /usr/vorn/var/progress/<profile>
+// ----------------------------------------------------
+
+enum class Phase : std::uint8_t { kStarting, kGathering, kReporting, kAssembling, kPublishing };
+
+struct Progress {
+  Phase phase = Phase::kStarting;
+  std::string share;        // kGathering
+  std::uint64_t files = 0;  // counted so far, in all shares
+  std::string report;       // kReporting
+  int number = 0;           // of that report, from 1
+  int reports = 0;          // that the run makes
+};
+// One line of JSON: phase ("starting", "gathering", "reporting", "assembling", "publishing"),
+// share, files, report, number, reports.
+std::string progress_text(const Progress& progress);
+std::optional<Progress> progress_of(std::string_view text);
+
+}  // namespace report_format
