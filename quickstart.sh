@@ -11,8 +11,6 @@ build=$root/build/quickstart
 stage=$root/build/quickstart-stage
 report_dir=$root/quickstart-report
 profile=quickstart
-report_list=quota_usage,file_owner,volume_usage,share_list,file_group
-report_list+=,duplicate_file,large_file,least_modify,most_modify
 log_dir=''
 
 fail() {
@@ -76,13 +74,12 @@ write_configuration() {
     share_name "$folder"
     printf '[%s]\npath = %s\n' "$name" "$folder" >>"$stage/usr/vorn/etc/share.conf"
   done
-  cat >>"$stage/usr/vorn/etc/vornreport.conf" <<CONF
+  in_sandbox -- /usr/vorn/bin/vornctl profile add "$profile" --report-dir "$report_dir"
+}
 
-[$profile]
-report_list = $report_list
-volume_history = true
-report_dir = $report_dir
-CONF
+# The product in its place; the machine's own /tmp, so that a folder in it can be reported on.
+in_sandbox() { # [SANDBOX-OPTION...] -- COMMAND...
+  "$root/tools/sandbox.sh" --stage "$stage" --tmp /tmp "$@"
 }
 
 # The user who called sudo gets what was made for them.
@@ -147,9 +144,8 @@ fi
 DESTDIR=$stage cmake --install "$build" >/dev/null
 write_configuration
 start_log
-# The machine's own /tmp, so that a folder in it can be reported on.
-"$root/tools/sandbox.sh" --stage "$stage" --tmp /tmp --log "$log_dir/socket" -- \
-  /usr/vorn/bin/vornreport --report "$profile" >"$stage/output" 2>&1 || true
+in_sandbox --log "$log_dir/socket" -- /usr/vorn/bin/vornreport --report "$profile" \
+  >"$stage/output" 2>&1 || true
 stop_log
 # Quotas are rare; the page says it when there are none.
 sed '/src\/rep_quota_usage:/d' "$log_dir/lines" >&2

@@ -16,6 +16,7 @@ and is not counted. Peers alternate within a round, so that whatever else the ma
 them all; the CPU time, in brackets, tells how busy a machine was when it is far from the other.
 """
 import argparse
+import json
 import os
 import random
 import resource
@@ -32,8 +33,6 @@ from gather import EXTENSIONS, FIND, ROOT, WORDS
 
 SHARES = 8
 OWNERS = 5
-REPORTS = ('quota_usage,file_owner,volume_usage,share_list,file_group,duplicate_file,large_file,'
-           'least_modify,most_modify')
 # Peak memory not from getrusage: that counts this interpreter, which the program was forked from.
 WATCH = r'''
 import re, resource, subprocess, sys, time
@@ -149,6 +148,8 @@ class Bench:
         self.files, self.rounds = arguments.files, arguments.rounds
         self.work = Path(work).resolve()
         self.stage = self.work / 'stage'
+        formats = json.loads((arguments.build / 'report_format.json').read_text())
+        self.all = ','.join(report['name'] for report in formats['reports'])
         subprocess.run(['cmake', '--install', str(arguments.build)], check=True,
                        stdout=subprocess.DEVNULL, env=os.environ | {'DESTDIR': str(self.stage)})
         self.config = self.stage / 'usr/vorn/etc/vornreport.conf'
@@ -199,7 +200,7 @@ class Bench:
         script = ROOT / 'bench/pipelines.sh'
         find, shell, once, report = self.compare(
             lambda: self.timed(*command), lambda: self.timed(script, tree, pipes),
-            lambda: self.timed(script, tree, pipes, 'once'), lambda: self.report(shares, REPORTS))
+            lambda: self.timed(script, tree, pipes, 'once'), lambda: self.report(shares, self.all))
         yield f'find, {self.files} files', find, ''
         yield 'pipelines.sh', shell, f'{shell / find:.2f} x find'
         yield 'pipelines.sh, one list for all', once, f'{once / find:.2f} x find'
@@ -214,7 +215,7 @@ class Bench:
             make_index(folder, ((f'{place}/{name}', name, size, age)
                                 for place, name, size, age, _ in facts(count)), str(count))
             runs.append(lambda folder=folder: self.report(
-                [('rows', folder, folder / 'index.db')], REPORTS))
+                [('rows', folder, folder / 'index.db')], self.all))
         one, ten = self.compare(*runs)
         yield f'all nine reports, {self.files} rows', one, ''
         yield ('ten times the rows', ten,

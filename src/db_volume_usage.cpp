@@ -6,6 +6,7 @@
 #include <memory>
 #include <new>
 
+#include "facts/run_facts.hpp"
 #include "vorn/paths.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/handles.hpp"
@@ -122,6 +123,13 @@ bool add_nameless(QAZLLNode** list, std::unique_ptr<VolumeUsageSample> sample) {
   return true;
 }
 
+void tell_lost_sample(const char* volume) {
+  record_incident(
+      "history_lost", volume,
+      std::string("the sample of ") + volume + " can't be stored in the history; the log says why",
+      AlreadyLogged::kYes);
+}
+
 // Whether `now` and an older sample give an estimate; then `days` is it.
 bool estimate(const VolumeUsageNode& node, const VolumeUsageSample& now,
               const VolumeUsageSample& then, int32_t& days) {
@@ -186,6 +194,7 @@ int32_t VornQazDBVolumeUsageInsert(const char* profile, const char* volume, cons
   const DbHandle db = open_history();
   auto escaped = std::make_unique<EscapedSample>();
   if (!db || !escape_sample(db.get(), profile, volume, percent, sampleDate, *escaped)) {
+    tell_lost_sample(volume);
     return 0;
   }
   FixedText<4096> sql;
@@ -197,8 +206,34 @@ int32_t VornQazDBVolumeUsageInsert(const char* profile, const char* volume, cons
   ResultHandle result;
   if (!execute(db.get(), sql.c_str(), result)) {
     REPORT_LOG_ERR(kModule, __LINE__, "Failed to insert volume usage DB, sql=%s\n", sql.c_str());
+    tell_lost_sample(volume);
   }
   return 0;
+}
+
+std::optional<StoredSamples> VolumeUsageSamples(int64_t since) {
+  const DbHandle db = open_history();
+  if (!db) {
+    return std::nullopt;
+  }
+  FixedText<4096> sql;
+  sql.format(
+      "select volume, sizeUse, sampleDate from %s where profile='%s' and cast(sampleDate as "
+      "integer) >= %lld; ",
+      kTable, "global", static_cast<long long>(since));
+  ResultHandle result;
+  if (!execute(db.get(), sql.c_str(), result)) {
+    REPORT_LOG_ERR(kModule, __LINE__, "Failed to select volume usage DB, sql=%s\n", sql.c_str());
+    return std::nullopt;
+  }
+  StoredSamples samples;
+  VORNDBRow* row = nullptr;
+  while (result && VORNDBFetchRow(result.get(), &row) != -1) {
+    samples[field(result.get(), row, "volume")].push_back(
+        {std::strtoll(field(result.get(), row, "sampleDate"), nullptr, 10),
+         to_u64(field(result.get(), row, "sizeUse"))});
+  }
+  return samples;
 }
 
 int32_t VornQazDBVolumeUsageSelect(const char* profile, QAZLLNode** list) {

@@ -3,8 +3,12 @@
 #pragma once
 
 #include <cstdint>
+#include <map>
+#include <optional>
 #include <string>
+#include <vector>
 
+#include "report_format/facts.hpp"
 #include "vorn/database.h"
 #include "vorn/list.h"
 #include "vornreport/fixed_text.hpp"
@@ -52,6 +56,12 @@ int32_t VornQazDBVolumeUsageSelect(const char* profile, QAZLLNode** list);
 // Removes the oldest dates beyond the newest 1000, five at most a call. 0.
 int32_t VornQazDBVolumeUsageRotate(void);
 }
+
+// The samples that the profile "global" has stored since `since` (seconds since the epoch), by the
+// name under which a volume is stored: its mount path cut at 31 bytes. Nothing (logged) when the
+// history can't be read.
+using StoredSamples = std::map<std::string, std::vector<report_format::Sample>>;
+std::optional<StoredSamples> VolumeUsageSamples(int64_t since);
 
 // Runs one statement and drops its rows. -1 for an empty one; otherwise 0 whatever happened.
 int32_t VolumeUsageDBExec(const char* sql);

@@ -22,6 +22,7 @@
 #include <string>
 #include <utility>
 
+#include "facts/run_facts.hpp"
 #include "report_frame.hpp"
 #include "vorn/report.h"
 #include "vorn/user.h"
@@ -73,7 +74,7 @@ bool open_report(const ReportArgs& args, GroupReport& report) {
     REPORT_LOG_ERR_NESTED(kModule, __LINE__, "get csv dir failed");
     return false;
   }
-  report.csv_path.format("%s/%s.csv", csv_dir, "file_group");
+  report.csv_path.format("%s/%s.csv", csv_dir, report_format::kFileGroup.name);
   report.csv = open_report_file(report.csv_path.c_str(), "w+", kModule, __LINE__);
   if (!report.csv) {
     return false;
@@ -81,8 +82,8 @@ bool open_report(const ReportArgs& args, GroupReport& report) {
   std::fputs("Group, Share, Size\n", report.csv.get());
   report.ctx.data_fp = report.data.get();
   report.ctx.csv_fp = report.csv.get();
-  report.ctx.js_limit = 100;
-  report.ctx.csv_limit = 10000;
+  report.ctx.js_limit = report_format::kFileGroup.page_limit;
+  report.ctx.csv_limit = report_format::kFileGroup.csv_limit;
   report.ctx.profile_hash = args.profile_hash;
   return true;
 }
@@ -163,6 +164,7 @@ bool write_sections(GroupReport& report, const VLIBCSzHash* profile_hash) {
     return false;
   }
   std::fputs("\n}</script>\n", report.ctx.data_fp);
+  run_facts().rows[report_format::kFileGroup.name] = {report.ctx.row_count, report.ctx.shown_count};
   return true;
 }
 
@@ -193,6 +195,7 @@ int FileGroupRowWriter(void* context, int /*columns*/, char** values, char** /*n
     g_previous_user.reset();
   }
   std::fflush(ctx->data_fp);
+  ++ctx->shown_count;
   ++ctx->row_count;
   return 0;
 }

@@ -8,16 +8,13 @@ namespace {
 constexpr ReportColumn kColumns[] = {owner_column(0), field_column(1), field_column(2),
                                      field_column(3)};
 
-constexpr StatisticsReport kFileOwner{
-    .name = "file_owner",
+constexpr StatisticsReport kFileOwnerReport{
+    .format = report_format::kFileOwner,
     .module = "src/rep_file_owner",
     .sql =
         "select owner,share,count(id) as c,sum(size) as s from file_stat group by owner, share "
         "order by owner,s desc,c desc;",
-    .variable = "vornFileOwnerData",
     .csv_header = "Owner\tShare\tFile Count\tSize(Byte)",
-    .js_limit = 0,
-    .csv_limit = 0,
     .share_paths = SharePaths::kLeftOut,
     .columns = kColumns,
 };
@@ -25,7 +22,7 @@ constexpr StatisticsReport kFileOwner{
 }  // namespace
 
 int32_t file_owner_db(ReportArgs* args) {
-  return run_statistics_report(kFileOwner, args);
+  return run_statistics_report(kFileOwnerReport, args);
 }
 
 }  // namespace vornreport

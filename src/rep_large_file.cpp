@@ -7,14 +7,11 @@ namespace {
 
 constexpr ReportColumn kColumns[] = {raw_column(0), path_column(1), field_column(2)};
 
-constexpr StatisticsReport kLargeFile{
-    .name = "large_file",
+constexpr StatisticsReport kLargeFileReport{
+    .format = report_format::kLargeFile,
     .module = "src/rep_large_file",
     .sql = "select share,path,size from file_stat order by size desc limit 0, 10000;",
-    .variable = "vornLargeFileData",
     .csv_header = "Share\tFile\tSize(Byte)",
-    .js_limit = 200,
-    .csv_limit = 10000,
     .share_paths = SharePaths::kImported,
     .columns = kColumns,
 };
@@ -22,7 +19,7 @@ constexpr StatisticsReport kLargeFile{
 }  // namespace
 
 int32_t large_file_db(ReportArgs* args) {
-  return run_statistics_report(kLargeFile, args);
+  return run_statistics_report(kLargeFileReport, args);
 }
 
 }  // namespace vornreport

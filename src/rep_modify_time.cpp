@@ -8,30 +8,24 @@ namespace {
 constexpr ReportColumn kColumns[] = {raw_column(0), path_column(1), field_column(2),
                                      time_column(3)};
 
-constexpr StatisticsReport kLeastModify{
-    .name = "least_modify",
+constexpr StatisticsReport kLeastModifyReport{
+    .format = report_format::kLeastModify,
     .module = "src/rep_modify_time",
     .sql =
         "select share,path,size,mtime from file_stat where mtime < strftime('%s','now') - "
         "60*60*24*90 order by mtime asc limit 0, 10000;",
-    .variable = "vornLeastModifyData",
     .csv_header = "Share\tFile\tSize(Byte)\tModify Time",
-    .js_limit = 200,
-    .csv_limit = 10000,
     .share_paths = SharePaths::kLeftOut,
     .columns = kColumns,
 };
 
-constexpr StatisticsReport kMostModify{
-    .name = "most_modify",
+constexpr StatisticsReport kMostModifyReport{
+    .format = report_format::kMostModify,
     .module = "src/rep_modify_time",
     .sql =
         "select share,path,size,mtime from file_stat where mtime > strftime('%s','now') - "
         "60*60*24*7 order by mtime desc limit 0, 10000;",
-    .variable = "vornMostModifyData",
     .csv_header = "Share\tFile\tSize(Byte)\tModify Time",
-    .js_limit = 200,
-    .csv_limit = 10000,
     .share_paths = SharePaths::kImported,
     .columns = kColumns,
 };
@@ -39,11 +33,11 @@ constexpr StatisticsReport kMostModify{
 }  // namespace
 
 int32_t least_modify_db(ReportArgs* args) {
-  return run_statistics_report(kLeastModify, args);
+  return run_statistics_report(kLeastModifyReport, args);
 }
 
 int32_t most_modify_db(ReportArgs* args) {
-  return run_statistics_report(kMostModify, args);
+  return run_statistics_report(kMostModifyReport, args);
 }
 
 }  // namespace vornreport

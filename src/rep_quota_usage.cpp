@@ -23,6 +23,7 @@ constexpr char kModule[] = "src/rep_quota_usage";
 // Generous: a million users on a slow directory service; but not for ever.
 constexpr CommandLimits kToolLimits{.seconds = 600, .bytes = uint64_t{256} << 20};
 constexpr size_t kLongestName = 127;
+constexpr uint64_t kKiB = 1024;
 
 unsigned long long print_u64(uint64_t value) {
   return value;
@@ -79,6 +80,10 @@ void add_user_line(const UserLine& line, QuotaVolume& volume, const char* path,
   }
   if (is_wanted) {
     QuotaUserInsert(volume.users, user);
+    ++volume.filteredUsers;
+    if (run_facts().may_tell(user.name)) {
+      volume.tally.add(path, user.name, user.used * kKiB, user.quota * kKiB);
+    }
   }
   report_trace(kModule, __LINE__, "('%s','%s',%llu, %llu)\n\n", path, user.name.c_str(),
                print_u64(user.used), print_u64(user.quota));
@@ -162,7 +167,6 @@ void write_data_entry(FILE* data, const QuotaVolume& volume, const char* id) {
 }
 
 void write_table_entry(FILE* data, const QuotaVolume& volume, const char* id) {
-  constexpr uint64_t kKiB = 1024;
   std::fprintf(data, "'%s' : [\n", id);
   const char* separator = "";
   for (const auto& [used, user] : volume.users) {
@@ -177,6 +181,25 @@ void write_table_entry(FILE* data, const QuotaVolume& volume, const char* id) {
 
 // --- Running the tool ---------------------------------------------------------------------------
 
+// Of a volume that has quotas.
+void tell_failure(const char* volume) {
+  record_incident(
+      "quota_failed", volume,
+      std::string("the quotas of ") + volume + " can't be read; run repquota on it to see why",
+      AlreadyLogged::kYes);
+}
+
+void note_volume(const QuotaVolume& volume) {
+  RunFacts& facts = run_facts();
+  RowCounts& rows = facts.rows[report_format::kQuotaUsage.name];
+  rows.rows += volume.filteredUsers;
+  rows.shown += volume.users.size();
+  if (!facts.quotas) {
+    facts.quotas.emplace();
+  }
+  facts.quotas->add(volume.tally);
+}
+
 void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSzHash* user_hash) {
   std::array<char, 8192> quoted{};
   if (VLIBCEncShParam(record.path, quoted.data(), quoted.size()) < 0 || is_unset(quoted.data())) {
@@ -188,12 +211,16 @@ void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSz
   // Twice: the first run only tells whether the volume has quotas.
   if (run_limited(kModule, command.c_str(), kToolLimits) != 0) {
     REPORT_LOG_ERR_NESTED(kModule, __LINE__, "volume=%s get quota failed", record.path);
+    if (VORNVolumeHasQuotas(record.path) != 0) {
+      tell_failure(record.path);
+    }
     return;
   }
   report_trace(kModule, __LINE__, "run cmd=%s\n\n", command.c_str());
   FileHandle output = open_limited(kModule, command.c_str(), kToolLimits);
   if (!output) {
     REPORT_LOG_ERR(kModule, __LINE__, "run cmd failed, cmd=%s\n", command.c_str());
+    tell_failure(record.path);
     return;
   }
   constexpr unsigned kKiBShift = 10;
@@ -206,9 +233,11 @@ void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSz
   // Half a table, of a tool that was ended at its limits, is not shown as a whole one.
   const bool is_whole = std::fclose(output.release()) == 0;
   if (is_whole && volume != nullptr && QAZLLadd(list, volume->data, nullptr) == 0) {
+    note_volume(*quota_volume_of(volume));
     QAZLLfree(&volume, [](void* /*data*/) {});
   } else {
     QAZLLfree(&volume, QuotaFreeVolume);
+    tell_failure(record.path);
   }
 }
 
@@ -316,6 +345,8 @@ int32_t quota_usage(ReportArgs* args) {
     return -1;
   }
   report_trace(kModule, __LINE__, "run quota usage %s\n\n", args->profile);
+  run_facts().quotas.emplace();
+  run_facts().rows[report_format::kQuotaUsage.name] = {};
   QAZLLNode* list = nullptr;
   int32_t result = -1;
   if (QuotaUsageGetData(args->profile, args->profile_hash, &list, args->user_hash) == 0 &&

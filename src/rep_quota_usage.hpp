@@ -6,6 +6,8 @@
 #include <map>
 #include <string>
 
+#include "facts/run_facts.hpp"
+#include "report_format/reports.hpp"
 #include "vorn/list.h"
 #include "vornreport/fixed_text.hpp"
 #include "vornreport/report_args.hpp"
@@ -22,7 +24,7 @@ struct QuotaUser {
 // The users of a volume by usage; those of equal usage in the tool's order. Only users of the
 // filter can be shown, and of those the smallest 100, so no more are kept.
 using QuotaUsers = std::multimap<uint64_t, QuotaUser>;
-inline constexpr size_t kMostQuotaUsers = 100;
+inline constexpr size_t kMostQuotaUsers = report_format::kQuotaUsage.page_limit;
 
 struct QuotaVolume {
   FixedText<16> name;    // mount path, cut at 15 bytes
@@ -30,6 +32,8 @@ struct QuotaVolume {
   uint64_t maxQuota;     // KiB: the largest quota seen; totalKiB from the first user without one
   uint64_t maxUserUsed;  // KiB: the largest usage of a user in the filter
   QuotaUsers users;
+  uint64_t filteredUsers;  // of which `users` are the smallest
+  QuotaTally tally;        // of those of them that may be told of
 };
 
 // The volume of a list element.

@@ -7,15 +7,12 @@ namespace {
 
 constexpr ReportColumn kColumns[] = {raw_column(0), share_volume_column(0), field_column(1)};
 
-constexpr StatisticsReport kShareList{
-    .name = "share_list",
+constexpr StatisticsReport kShareListReport{
+    .format = report_format::kShareList,
     .module = "src/rep_share_list",
     .sql = "select share,sum(size) from file_stat group by share order by sum(size) desc;",
-    .variable = "vornShareListData",
     // One column short of the rows: readers of the file count on the two names.
     .csv_header = "Share\tSize",
-    .js_limit = 0,
-    .csv_limit = 0,
     .share_paths = SharePaths::kLeftOut,
     .columns = kColumns,
 };
@@ -23,7 +20,7 @@ constexpr StatisticsReport kShareList{
 }  // namespace
 
 int32_t share_list_db(ReportArgs* args) {
-  return run_statistics_report(kShareList, args);
+  return run_statistics_report(kShareListReport, args);
 }
 
 }  // namespace vornreport

@@ -1,12 +1,14 @@
 #include "rep_volume_usage.hpp"
 
-#include <strings.h>
-
+#include <algorithm>
 #include <array>
 #include <memory>
 #include <new>
 #include <utility>
 
+#include "facts/run_facts.hpp"
+#include "report_format/reports.hpp"
+#include "report_format/values.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/handles.hpp"
@@ -110,7 +112,7 @@ int32_t write_block(const QAZLLNode* list, const char* opening, WriteVolume writ
 
 bool wants_history(const VLIBCSzHash* profile_hash) {
   const char* value = VLIBCSzHashGetValue(profile_hash, "volume_history");
-  return value != nullptr && strcasecmp(value, "true") == 0;
+  return value != nullptr && report_format::is_true(value);
 }
 
 }  // namespace
@@ -148,6 +150,7 @@ int32_t VolumeUsageEnumVolumes(QAZLLNode** list) {
     REPORT_LOG_ERR(kModule, __LINE__, "no mounted volume\n");
     return 0;
   }
+  note_volumes(volumes.get());
   for (const VORNMountVolInfo* volume = volumes.get(); volume != nullptr; volume = volume->next) {
     if (VolumeUsageAddVolume(volume, list) < 0) {
       REPORT_LOG_ERR(kModule, __LINE__, "parsing command failed\n");
@@ -225,7 +228,7 @@ int32_t VolumeUsageWriteCsv(const char* profile, const VLIBCSzHash* profileHash,
     return -1;
   }
   PathText path;
-  path.format("%s/%s.csv", csv_dir, "volume_usage");
+  path.format("%s/%s.csv", csv_dir, report_format::kVolumeUsage.name);
   FileHandle csv = open_report_file(path.c_str(), "w+", kModule, __LINE__, LogForm::kSimple);
   if (!csv) {
     return -1;
@@ -285,7 +288,9 @@ int32_t volume_usage(ReportArgs* args) {
       return -1;
     }
   }
-  VolumeUsageWriteCurrent(profile, args->profile_hash, volumes.head);
+  const int32_t shown = VolumeUsageWriteCurrent(profile, args->profile_hash, volumes.head);
+  const auto rows = static_cast<uint64_t>(std::max(shown, 0));
+  run_facts().rows[report_format::kVolumeUsage.name] = {rows, rows};
   if (with_history) {
     VolumeUsageWriteHistory(profile, args->profile_hash, volumes.head);
   }

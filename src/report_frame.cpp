@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <utility>
 
+#include "facts/run_facts.hpp"
 #include "vorn/report.h"
 #include "vorn/user.h"
 #include "vorn/volume.h"
@@ -89,7 +90,7 @@ bool resolve_values(const report_row_ctx& ctx, char* const* query_values, RowVal
 void write_data_row(const report_row_ctx& ctx, const RowValues& row) {
   if (ctx.row_count == 0) {
     std::fprintf(ctx.data_fp, "<script type='text/javascript'>\nvar %s = [\n",
-                 ctx.report->variable);
+                 ctx.report->format.variable);
   } else {
     std::fputs(",\n", ctx.data_fp);
   }
@@ -147,7 +148,7 @@ bool open_files(const StatisticsReport& report, const ReportArgs& args, ReportFi
     REPORT_LOG_ERR_NESTED(report.module, __LINE__, "get csv dir failed");
     return false;
   }
-  files.csv_path.format("%s/%s.csv", csv_dir, report.name);
+  files.csv_path.format("%s/%s.csv", csv_dir, report.format.name);
   files.csv = open_report_file(files.csv_path.c_str(), "a", report.module, __LINE__);
   return files.csv != nullptr;
 }
@@ -157,8 +158,8 @@ report_row_ctx make_context(const StatisticsReport& report, const ReportArgs& ar
   report_row_ctx ctx{};
   ctx.data_fp = files.data.get();
   ctx.csv_fp = files.csv.get();
-  ctx.js_limit = report.js_limit;
-  ctx.csv_limit = report.csv_limit;
+  ctx.js_limit = report.format.page_limit;
+  ctx.csv_limit = report.format.csv_limit;
   ctx.filter_user = args.user_hash;
   ctx.volume_path_hash = args.volume_hash;
   ctx.share_path_hash = args.share_hash;
@@ -252,6 +253,7 @@ int report_row_writer(void* context, int /*columns*/, char** values, char** name
   }
   if (within(ctx->js_limit, ctx->row_count)) {
     write_data_row(*ctx, row);
+    ++ctx->shown_count;
   }
   if (within(ctx->csv_limit, ctx->row_count)) {
     write_csv_row(*ctx, row);
@@ -279,6 +281,9 @@ int32_t run_statistics_report(const StatisticsReport& report, const ReportArgs* 
       std::fprintf(files.csv.get(), "%s\n", report.csv_header);
     }
     result = write_rows(report, db.get(), ctx, is_embedded);
+    if (!is_embedded) {
+      run_facts().rows[report.format.name] = {ctx.row_count, ctx.shown_count};
+    }
   }
   db.reset();
   const bool data_kept =

@@ -18,6 +18,7 @@
 #include <cstdio>
 #include <span>
 
+#include "report_format/reports.hpp"
 #include "vorn/text.h"
 #include "vornreport/report_args.hpp"
 
@@ -79,13 +80,10 @@ int report_row_writer(void* context, int columns, char** values, char** names) n
 
 // One report.
 struct StatisticsReport {
-  const char* name;    // registry name and name of the CSV file
-  const char* module;  // in log lines
+  const report_format::ReportFormat& format;  // name, variable, limits
+  const char* module;                         // in log lines
   const char* sql;
-  const char* variable;    // JavaScript variable of the page
   const char* csv_header;  // without line feed
-  uint64_t js_limit;       // rows for the page; 0: all
-  uint64_t csv_limit;      // rows for the CSV file; 0: all
   SharePaths share_paths;
   std::span<const ReportColumn> columns;
   RowWriter row_writer = report_row_writer;
@@ -106,6 +104,7 @@ struct report_row_ctx {
   QAZLLNode** dup_list;
   QAZLLNode** dup_group_list;
   const StatisticsReport* report;  // the record whose rows are written
+  uint64_t shown_count;            // rows written to the data file
 };
 
 // Runs one report. 0; -1 on failure, which is logged: what was written by then stays, and the CSV

@@ -1,7 +1,11 @@
 #include "file_gathering.hpp"
 
 #include <cstdio>
+#include <string>
 
+#include "facts/progress.hpp"
+#include "facts/run_facts.hpp"
+#include "facts/tallies.hpp"
 #include "index_import.hpp"
 #include "module.hpp"
 #include "share_walk.hpp"
@@ -52,6 +56,50 @@ bool prepare(Gathering& gathering, const VLIBCSzHash* profile_hash) {
   return true;
 }
 
+// What goes into the database meanwhile is counted for this share.
+class CountedShare {
+ public:
+  CountedShare(const char* share, const char* path) {
+    tallies().begin_share(share, path);
+    progress_share(share);
+  }
+  ~CountedShare() { tallies().end_share(); }
+  CountedShare(const CountedShare&) = delete;
+  CountedShare& operator=(const CountedShare&) = delete;
+};
+
+void tell_missing(const std::string& share) {
+  record_incident("share_missing", share,
+                  "share " + share +
+                      " is missing from the report: its folder can't be read, or lies on a file "
+                      "system that is not walked; the log says which",
+                  AlreadyLogged::kYes);
+}
+
+void tell_refused_index(const std::string& share) {
+  tallies().share()->begin_again();
+  record_incident("index_refused", share,
+                  "the file index of share " + share +
+                      " can't be used, so its folders were walked; the log says why",
+                  AlreadyLogged::kYes);
+}
+
+// `found`: its top folder could be read.
+void tell_walk(ShareTally& share, bool found) {
+  if (!found) {
+    share.missing();
+  }
+  if (share.is_missing()) {
+    tell_missing(share.name());
+  } else if (!share.is_whole()) {
+    const std::string count = std::to_string(share.unreadables());
+    record_incident("share_part", share.name() + ": " + count,
+                    "files or folders of share " + share.name() + " can't be read: " + count +
+                        "; the log names them",
+                    AlreadyLogged::kYes);
+  }
+}
+
 // True when the share was walked, false when it was skipped or came from its index.
 bool gather_share(const Gathering& gathering, const char* share, const VLIBCSzHash* profile_hash) {
   if (is_unset(share)) {
@@ -66,8 +114,12 @@ bool gather_share(const Gathering& gathering, const char* share, const VLIBCSzHa
   PathText path;
   if (VORNSharePathGet(share, path.data(), PathText::size()) < 0) {
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "cannot get share path, share=%s", share);
+    const CountedShare counted(share, "");
+    tallies().share()->missing();
+    tell_missing(share);
     return false;
   }
+  const CountedShare counted(share, path.c_str());
   sqlite3* db = gathering.db.get();
   const VLIBCSzHash* types = gathering.file_types.get();
   if (VORNShareFileIndexIsEnabled(share) != 0) {
@@ -75,11 +127,13 @@ bool gather_share(const Gathering& gathering, const char* share, const VLIBCSzHa
     if (ReportFileIndexImport(share, path.c_str(), db, types) >= 0) {
       return false;
     }
+    tell_refused_index(share);
   }
   report_trace(kGatheringModule, __LINE__, "stat share=%s\n", share);
   begin_transaction(db);
-  ReportShareWalk(db, share, path.c_str(), types);
+  const bool found = ReportShareWalk(db, share, path.c_str(), types) == 0;
   commit_transaction(db);
+  tell_walk(*tallies().share(), found);
   return true;
 }
 

@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <cstdlib>
 
+#include "facts/tallies.hpp"
 #include "module.hpp"
 #include "transaction.hpp"
 #include "vorn/report.h"
@@ -71,6 +72,7 @@ int ReportFileIndexRow(void* context, int /*columns*/, char** values, char** nam
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "add db failed");
     return -1;
   }
+  tallies().file(info, RowSource::kIndex);
   return 0;
 }
 

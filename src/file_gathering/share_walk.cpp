@@ -14,6 +14,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "facts/tallies.hpp"
 #include "module.hpp"
 #include "vorn/share.h"
 #include "vornreport/error_log.hpp"
@@ -43,6 +44,7 @@ class Walk {
 
   int top(const char* folder) {
     path_.format("%s", folder);
+    top_length_ = std::strlen(folder);
     struct stat status {};
     if (stat(folder, &status) != 0) {
       return stat_failed();
@@ -52,9 +54,10 @@ class Walk {
       return stat_failed();
     }
     if (!is_walked_kind(VORNGetFSType(folder, 0))) {
+      not_walked();
       return 0;
     }
-    return read_folder(open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC), std::strlen(folder),
+    return read_folder(open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC), top_length_,
                        status.st_dev);
   }
 
@@ -100,6 +103,9 @@ class Walk {
       errno = ESTALE;
       return stat_failed();
     }
+    if (length > top_length_ && tally_ != nullptr) {
+      tally_->folder();
+    }
     int error = 0;
     while (const dirent* entry = next_entry(folder.get(), error)) {
       add_entry(fd, *entry, length, device);
@@ -133,6 +139,9 @@ class Walk {
       return;
     }
     if (entry.d_type != DT_DIR && entry.d_type != DT_REG) {
+      if (tally_ != nullptr) {
+        tally_->other();
+      }
       return;
     }
     const size_t child_length = append(length, name);
@@ -165,7 +174,10 @@ class Walk {
     const FileInfo info{share_, path_.c_str(), name.data(), label, &status};
     if (ReportDBAddFile(db_, &info) < 0) {
       REPORT_LOG_ERR(kGatheringModule, __LINE__, "Failed to add to db [%s].\n", path_.c_str());
+      count_unreadable();
+      return;
     }
+    tallies().file(info, RowSource::kWalk);
   }
 
   // Puts "/name" behind the first `length` bytes of path_. Its new length; what doesn't fit is cut.
@@ -191,17 +203,33 @@ class Walk {
       mark_report_data_lost();
     }
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Failed to opendir [%s].", path_.c_str());
+    count_unreadable();
     return -1;
   }
 
   int stat_failed() {
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Failed to stat [%s].", path_.c_str());
+    count_unreadable();
     return -1;
+  }
+
+  void count_unreadable() {
+    if (tally_ != nullptr) {
+      tally_->unreadable();
+    }
+  }
+
+  void not_walked() {
+    if (tally_ != nullptr) {
+      tally_->missing();
+    }
   }
 
   sqlite3* db_;
   const char* share_;
   const VLIBCSzHash* types_;
+  ShareTally* tally_ = tallies().share();  // null when nobody counts
+  size_t top_length_ = 0;
   PathText path_;     // of the folder or entry being looked at
   bool cut_ = false;  // path_ is no real path: its end is missing
 };

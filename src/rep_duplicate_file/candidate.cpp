@@ -1,9 +1,7 @@
 #include "candidate.hpp"
 
 #include <fcntl.h>
-#include <linux/openat2.h>
 #include <sys/stat.h>
-#include <sys/syscall.h>
 #include <unistd.h>
 #include <xxhash.h>
 
@@ -16,6 +14,7 @@
 #include <string_view>
 #include <unordered_set>
 
+#include "below_share.hpp"
 #include "module.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
@@ -52,32 +51,6 @@ const char* interned(const char* text) {
   return texts.emplace(cut(text)).first->c_str();
 }
 
-// Opens a gathered file as the walk found it: below its share's folder and through no link, which a
-// user may have put in its way since. Doesn't wait for the
-// writer of a fifo. Errors as open().
-int open_gathered(const dup_file_node& file) {
-  constexpr uint64_t kFlags = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
-  const std::string_view folder = file.share_folder != nullptr ? file.share_folder : "";
-  const std::string_view path = file.path;
-  const Descriptor top(folder.empty() ? -1 : open(file.share_folder, O_PATH | O_CLOEXEC));
-  if (top.get() < 0 || !path.starts_with(folder) || path.size() <= folder.size() + 1) {
-    return open(file.path.c_str(), static_cast<int>(kFlags));
-  }
-  open_how how{};
-  how.flags = kFlags;
-  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
-  const char* below = file.path.c_str() + folder.size();
-  while (*below == '/') {
-    ++below;
-  }
-  const auto opened = static_cast<int>(syscall(SYS_openat2, top.get(), below, &how, sizeof how));
-  if (opened < 0 && (errno == ENOSYS || errno == EPERM)) {
-    // A container that knows no openat2: only a link in the last place is refused then.
-    return openat(top.get(), below, static_cast<int>(kFlags));
-  }
-  return opened;
-}
-
 void log_open_failure(const dup_file_node& file) {
   if (errno == ENOENT) {
     report_trace(kDuplicateModule, __LINE__, "open file failed, file=%s,(%d)%m\n",
@@ -94,7 +67,9 @@ void read_sample(const dup_file_node& file, std::array<char, kSampleSize>& sampl
   const uint64_t length = std::min(file.size, kSampleSize);
   const uint64_t offset = file.size <= kSampleSize ? 0 : file.size / 2 / kSampleSize * kSampleSize;
   sample.fill(0);
-  const Descriptor opened(open_gathered(file));
+  // Doesn't wait for the writer of a fifo.
+  const Descriptor opened(
+      open_below_share(file.share_folder, file.path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY));
   if (opened.get() < 0) {
     log_open_failure(file);
     return;

@@ -5,6 +5,8 @@
 #include <utility>
 #include <vector>
 
+#include "facts/duplicate_tally.hpp"
+#include "facts/run_facts.hpp"
 #include "module.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
@@ -20,6 +22,21 @@ int32_t g_data_group = 1;  // of the next group for the page
 int32_t g_csv_group = 1;   // of the next group for the CSV file
 uint64_t g_digested = 0;   // files for which a digest was about to be computed
 uint64_t g_grouped = 0;    // files placed into groups
+
+// What the report that is being made has found.
+DuplicateTally g_tally(/*by_content=*/true);
+RowCounts g_rows;
+
+void count_groups(const QAZLLNode* groups) {
+  for (; groups != nullptr; groups = groups->next) {
+    const dup_file_node* first = file_of(groups);
+    for (const dup_file_node* file = first; file != nullptr; file = file->next) {
+      g_tally.file(file->share_folder, file->path.c_str());
+      ++g_rows.rows;
+    }
+    g_tally.end_group(first->size);
+  }
+}
 
 // The candidates of a bucket, and for each the later ones with an equal sample, found by look-up:
 // comparing every pair's samples would be a million millions for a million files.
@@ -124,6 +141,16 @@ void write_csv_member(FILE* csv, const dup_file_node& file) {
 
 }  // namespace
 
+void begin_content_groups() {
+  g_tally = DuplicateTally(/*by_content=*/true);
+  g_rows = {};
+}
+
+void end_content_groups() {
+  run_facts().duplicates = g_tally.facts();
+  run_facts().rows[report_format::kDuplicateFile.name] = g_rows;
+}
+
 int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups,
                        QAZLLNode** candidates) {
   if (profile_hash == nullptr || groups == nullptr || candidates == nullptr) {
@@ -138,6 +165,7 @@ int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups,
     } else {
       Bucket(*candidates).find_groups(groups);
       if (*groups != nullptr) {
+        count_groups(*groups);
         write_data_groups(*groups, kMostDataGroups, GroupsAre::kContinued);
         write_csv_groups(profile_hash, *groups, GroupsAre::kContinued);
       }
@@ -163,6 +191,7 @@ int write_data_groups(const QAZLLNode* groups, int limit, GroupsAre close) {
       const dup_file_node* first = file_of(groups);
       for (const dup_file_node* file = first; file != nullptr; file = file->next) {
         write_data_member(data.get(), *file, g_data_group == 1 && file == first);
+        ++g_rows.shown;
       }
     }
     result = g_data_group;
@@ -182,7 +211,7 @@ int write_csv_groups(const VLIBCSzHash* profile_hash, const QAZLLNode* groups, G
   if (csv_dir == nullptr) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "get csv dir failed");
   } else {
-    path.format("%s/%s.csv", csv_dir, "duplicate_file");
+    path.format("%s/%s.csv", csv_dir, report_format::kDuplicateFile.name);
     csv = open_report_file(path.c_str(), "a", kDuplicateModule, __LINE__, LogForm::kSimple);
   }
   if (csv && groups == nullptr) {

@@ -2,13 +2,18 @@
 #pragma once
 
 #include "candidate.hpp"
+#include "report_format/reports.hpp"
 #include "vorn/list.h"
 #include "vorn/text.h"
 
 namespace vornreport {
 
 // The page shows this many groups; the CSV file all.
-inline constexpr int kMostDataGroups = 200;
+inline constexpr int kMostDataGroups = static_cast<int>(report_format::kDuplicateFile.page_limit);
+
+// Begin and end the groups of one report: what it finds goes to the facts.
+void begin_content_groups();
+void end_content_groups();
 
 // Whether more groups may follow those of this call; when not, block and CSV file are closed.
 enum class GroupsAre : int { kContinued = 0, kComplete = 1 };

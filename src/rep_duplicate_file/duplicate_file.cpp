@@ -1,12 +1,16 @@
 #include "rep_duplicate_file/duplicate_file.hpp"
 
-#include <strings.h>
-
+#include <cstdlib>
+#include <optional>
 #include <string>
 #include <string_view>
 
 #include "content_groups.hpp"
+#include "facts/duplicate_tally.hpp"
+#include "facts/run_facts.hpp"
 #include "module.hpp"
+#include "report_format/reports.hpp"
+#include "report_format/values.hpp"
 #include "report_frame.hpp"
 #include "vorn/list.h"
 #include "vorn/report.h"
@@ -27,6 +31,9 @@ struct Grouping {
   std::string name;
 };
 Grouping g_grouping;
+// What the report that is being made has found; only by name and size, where groups arrive row by
+// row.
+std::optional<DuplicateTally> g_tally;
 
 constexpr size_t kLongestSize = 127;
 constexpr size_t kLongestName = 4095;
@@ -41,7 +48,7 @@ std::string_view cut(const char* text, size_t longest) {
 
 bool compares_content(const VLIBCSzHash* profile_hash) {
   const char* value = VLIBCSzHashGetValue(profile_hash, "duplicate_compare");
-  return value != nullptr && strcasecmp(value, "true") == 0;
+  return value != nullptr && report_format::is_true(value);
 }
 
 void decide_match(const VLIBCSzHash* profile_hash) {
@@ -75,11 +82,19 @@ void collect_row(const report_row_ctx& ctx, char* const* values) {
   }
 }
 
+// The group that the rows before made.
+void end_group() {
+  if (g_tally) {
+    g_tally->end_group(std::strtoull(g_grouping.size.c_str(), nullptr, 10));
+  }
+}
+
 // Name-and-size mode: the query's order puts the members of a group one after another.
 void number_row(char* const* values) {
   const std::string_view size = cut(text_of(values, kSize), kLongestSize);
   const std::string_view name = cut(text_of(values, kName), kLongestName);
   if (g_grouping.size != size || g_grouping.name != name) {
+    end_group();
     g_grouping.size = size;
     g_grouping.name = name;
     ++g_grouping.number;
@@ -94,7 +109,7 @@ void write_data_row(const report_row_ctx& ctx, char* const* values) {
   if (ctx.row_count == 0) {
     std::fprintf(ctx.data_fp,
                  "<script type='text/javascript'>\nvar vornDuplicateHashMatch = 0;\nvar %s = [\n",
-                 ctx.report->variable);
+                 ctx.report->format.variable);
   } else {
     std::fputs(",\n", ctx.data_fp);
   }
@@ -135,8 +150,13 @@ int duplicate_row_writer(void* context, int /*columns*/, char** values, char** n
     return 0;
   }
   number_row(values);
+  if (g_tally) {
+    g_tally->file(VLIBCSzHashGetValue(ctx->share_path_hash, text_of(values, kShare)),
+                  text_of(values, kPath));
+  }
   if (within(ctx->js_limit)) {
     write_data_row(*ctx, values);
+    ++ctx->shown_count;
   }
   if (within(ctx->csv_limit)) {
     write_csv_row(*ctx, values);
@@ -145,42 +165,49 @@ int duplicate_row_writer(void* context, int /*columns*/, char** values, char** n
   return 0;
 }
 
-constexpr char kVariable[] = "vornDuplicateFileData";
 constexpr char kHeader[] = "Duplicate Group\tShare\tFile\tSize(Byte)\tModify Time";
 
 constexpr StatisticsReport kByNameAndSize{
-    .name = "duplicate_file",
+    .format = report_format::kDuplicateFile,
     .module = kDuplicateModule,
     .sql =
         "select share,path,size,mtime,filename from file_stat except select "
         "share,path,size,mtime,filename from file_stat group by filename,size having "
         "count(id)=1 order by size desc,filename;",
-    .variable = kVariable,
     .csv_header = kHeader,
-    .js_limit = 200,  // groups
-    .csv_limit = 0,
     .share_paths = SharePaths::kImported,
     .columns = {},
     .row_writer = duplicate_row_writer,
 };
 
 constexpr StatisticsReport kBySize{
-    .name = "duplicate_file",
+    .format = report_format::kDuplicateFile,
     .module = kDuplicateModule,
     .sql =
         "select share,path,size,mtime,filename from file_stat except select "
         "share,path,size,mtime,filename from file_stat group by size having count(id)=1 order "
         "by size desc;",
-    .variable = kVariable,
     .csv_header = kHeader,
-    .js_limit = 500,  // without effect: the rows are collected, not written
-    .csv_limit = 0,
     .share_paths = SharePaths::kImported,
     .columns = {},
     .row_writer = duplicate_row_writer,
 };
 
+int32_t report_by_name_and_size(ReportArgs& args) {
+  g_tally.emplace(/*by_content=*/false);
+  const int32_t result = duplicate_file_db(&args);
+  end_group();
+  if (result < 0) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "duplicate_file_db failed");
+  } else {
+    run_facts().duplicates = g_tally->facts();
+  }
+  g_tally.reset();
+  return result < 0 ? -1 : 0;
+}
+
 int32_t report_by_content(ReportArgs& args) {
+  begin_content_groups();
   args.embedded = 1;  // header, closing tag and CSV finishing belong to the group writers
   if (duplicate_file2_db(&args) < 0) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "duplicate_file_db failed");
@@ -192,6 +219,7 @@ int32_t report_by_content(ReportArgs& args) {
   // Both lists are empty now: these only close the block and finish the CSV file.
   write_data_groups(*args.dup_group_list, kMostDataGroups, GroupsAre::kComplete);
   write_csv_groups(args.profile_hash, *args.dup_group_list, GroupsAre::kComplete);
+  end_content_groups();
   return 0;
 }
 
@@ -214,13 +242,8 @@ int32_t duplicate_file(ReportArgs* args) {
   QAZLLNode* groups = nullptr;
   args->dup_list = &candidates;
   args->dup_group_list = &groups;
-  int32_t result = 0;
-  if (compares_content(args->profile_hash)) {
-    result = report_by_content(*args);
-  } else if (duplicate_file_db(args) < 0) {
-    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "duplicate_file_db failed");
-    result = -1;
-  }
+  const int32_t result = compares_content(args->profile_hash) ? report_by_content(*args)
+                                                              : report_by_name_and_size(*args);
   release_bucket(&groups, &candidates);
   args->dup_list = nullptr;
   args->dup_group_list = nullptr;

@@ -22,6 +22,9 @@ int clean_action(char** args);
 // into `out_path`. The number of reports run minus one, or -1.
 int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, char* out_path,
                        int out_size);
+// Closes the facts of the run: writes them as a block of the data file and as report.json into the
+// dated working folder. False, logged, when a part of that failed; the run's data is lost then.
+bool close_facts(const VLIBCSzHash* profile_hash, const char* data_path);
 // Completes the page and moves it into the dated working folder. The number of selected reports;
 // 0 when none is known; -1 on failure.
 int build_report_html(const char* profile, const VLIBCSzHash* profile_hash, const char* data_path);

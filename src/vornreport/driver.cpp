@@ -5,6 +5,7 @@
 #include <csignal>
 
 #include "actions.hpp"
+#include "facts/run_facts.hpp"
 #include "sigterm.hpp"
 #include "temp_files.hpp"
 #include "vorn/report.h"
@@ -30,6 +31,7 @@ int run(int argc, char** argv) {
   getopt_long_only(argc, argv, "", kOptions, nullptr);
   argv += optind;
   VornQazSetEnv();
+  listen_for_incidents();
   switch (gACT) {
     case kReport:
       setup_signal(SIGTERM);

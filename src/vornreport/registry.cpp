@@ -6,8 +6,8 @@
 //      its texts in reportUI/template/lang/.
 #include "vornreport/registry.hpp"
 
+#include <algorithm>
 #include <array>
-#include <cstring>
 #include <string_view>
 
 #include "rep_duplicate_file/duplicate_file.hpp"
@@ -18,21 +18,40 @@
 #include "rep_quota_usage.hpp"
 #include "rep_share_list.hpp"
 #include "rep_volume_usage.hpp"
+#include "report_format/reports.hpp"
 
 namespace vornreport {
 namespace {
 
-constexpr std::array<ReportEntry, 9> kRegistry{{
-    {"quota_usage", ReportSource::kSystem, quota_usage, nullptr},
-    {"file_owner", ReportSource::kStatistics, file_owner_db, nullptr},
-    {"volume_usage", ReportSource::kSystem, volume_usage, volume_usage_collect_data},
-    {"share_list", ReportSource::kStatistics, share_list_db, nullptr},
-    {"file_group", ReportSource::kStatistics, file_group_db, nullptr},
-    {"duplicate_file", ReportSource::kStatistics, duplicate_file, nullptr},
-    {"large_file", ReportSource::kStatistics, large_file_db, nullptr},
-    {"least_modify", ReportSource::kStatistics, least_modify_db, nullptr},
-    {"most_modify", ReportSource::kStatistics, most_modify_db, nullptr},
-}};
+constexpr ReportEntry entry(const report_format::ReportFormat& format, ReportSource source,
+                            ReportFunction report, CollectFunction collect = nullptr) {
+  ReportEntry made{{}, source, report, collect};
+  std::string_view(format.name).copy(made.name, sizeof made.name - 1);
+  return made;
+}
+
+constexpr std::array kRegistry{
+    entry(report_format::kQuotaUsage, ReportSource::kSystem, quota_usage),
+    entry(report_format::kFileOwner, ReportSource::kStatistics, file_owner_db),
+    entry(report_format::kVolumeUsage, ReportSource::kSystem, volume_usage,
+          volume_usage_collect_data),
+    entry(report_format::kShareList, ReportSource::kStatistics, share_list_db),
+    entry(report_format::kFileGroup, ReportSource::kStatistics, file_group_db),
+    entry(report_format::kDuplicateFile, ReportSource::kStatistics, duplicate_file),
+    entry(report_format::kLargeFile, ReportSource::kStatistics, large_file_db),
+    entry(report_format::kLeastModify, ReportSource::kStatistics, least_modify_db),
+    entry(report_format::kMostModify, ReportSource::kStatistics, most_modify_db),
+};
+
+// Everyone else goes by the table of formats.
+constexpr bool is_table_of_formats() {
+  return std::equal(kRegistry.begin(), kRegistry.end(), report_format::kReports.begin(),
+                    report_format::kReports.end(),
+                    [](const ReportEntry& entry, const report_format::ReportFormat* format) {
+                      return std::string_view(entry.name) == format->name;
+                    });
+}
+static_assert(is_table_of_formats());
 
 // Selection looks for a name anywhere in the list, so a name inside another would be selected with
 // it.
@@ -57,7 +76,7 @@ std::span<const ReportEntry> report_registry() {
 }
 
 bool is_selected(const ReportEntry& entry, const char* report_list) {
-  return std::strstr(report_list, entry.name) != nullptr;
+  return report_format::is_selected(entry.name, report_list);
 }
 
 }  // namespace vornreport

@@ -6,13 +6,18 @@
 #include <string_view>
 
 #include "actions.hpp"
+#include "facts/progress.hpp"
+#include "facts/run_facts.hpp"
+#include "facts/tallies.hpp"
 #include "file_gathering/file_gathering.hpp"
 #include "module.hpp"
 #include "profile.hpp"
+#include "report_format/reports.hpp"
 #include "shell.hpp"
 #include "sigterm.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
+#include "vorn/user.h"
 #include "vorn/volume.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/registry.hpp"
@@ -72,6 +77,36 @@ bool load_volumes_and_shares(LookUps& look_ups) {
   return true;
 }
 
+// Without quotas on any volume there is nothing to report, which the page says by itself; a volume
+// that has them has had its own incident.
+void tell_failed_report(const char* name) {
+  const bool is_empty_quota = std::string_view(name) == report_format::kQuotaUsage.name &&
+                              run_facts().rows.contains(name) && !report_data_lost();
+  if (!is_empty_quota) {
+    run_facts().failed.insert(name);
+    record_incident("report_failed", name,
+                    std::string("the report ") + name + " failed; the log says why",
+                    AlreadyLogged::kYes);
+  }
+}
+
+// The names of those who own files, as far as they may be told.
+void note_owners(const VLIBCSzHash* users) {
+  RunFacts& facts = run_facts();
+  facts.owners.emplace();
+  for (const ShareTally& share : tallies().shares()) {
+    for (const auto& [place, amount] : share.owners()) {
+      VORNUser* user = nullptr;
+      const bool is_known = VORNUserGetByUID(place.first, &user) >= 0;
+      const UserHandle owned(user);
+      if (is_known && user != nullptr && !is_unset(user->name) && facts.may_tell(user->name) &&
+          VLIBCSzHashGetValue(users, user->name) != nullptr) {
+        (*facts.owners)[place.first] = user->name;
+      }
+    }
+  }
+}
+
 // The number of reports run minus one.
 int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
                          const char* report_list, const LookUps& look_ups) {
@@ -90,8 +125,11 @@ int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
                     nullptr,
                     0};
     report_trace(kDriverModule, 280, "##### inject report=%s\n\n", entry.name);
+    progress_report(entry.name);
     // One failing report does not stop the others; it has logged why.
-    entry.report(&args);
+    if (entry.report(&args) < 0) {
+      tell_failed_report(entry.name);
+    }
   }
   return result;
 }
@@ -104,6 +142,10 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
   // another matter: it never becomes a page.
   create_report_data(profile, profile_hash, data_path.data(), PathText::size());
   report_trace(kDriverModule, 363, "########## report.tmp=%s\n\n", data_path.c_str());
+  progress_phase(report_format::Phase::kAssembling);
+  if (!report_data_lost()) {
+    close_facts(profile_hash, data_path.c_str());
+  }
   if (report_data_lost() || build_report_html(profile, profile_hash, data_path.c_str()) < 1) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 366, "create template failed");
     VornQazReportCleanTmp(profile, profile_hash);
@@ -114,6 +156,7 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
     VornQazReportCleanTmp(profile, profile_hash);
     return -1;
   }
+  progress_phase(report_format::Phase::kPublishing);
   publish_report(profile, profile_hash);
   VornQazStatusUpdate(profile, "success");
   return 0;
@@ -147,14 +190,31 @@ int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, cha
     REPORT_LOG_ERR_NESTED(kDriverModule, 241, "Failed to setting language");
     return -1;
   }
+  run_facts().language = language.data();
   run_command(kDriverModule, 244, VORN_PATH_TEMPLATE_SCRIPT " lang %s %s", out_path,
               language.data());
   gather_when_needed(profile, profile_hash, report_list);
   if (!load_volumes_and_shares(look_ups)) {
     return -1;
   }
-  return run_selected_reports(profile, profile_hash, report_list, look_ups);
+  const int result = run_selected_reports(profile, profile_hash, report_list, look_ups);
+  note_owners(look_ups.users.get());
+  return result;
 }
+
+namespace {
+
+int count_selected(const VLIBCSzHash* profile_hash) {
+  const char* report_list = set_value(profile_hash, "report_list");
+  const auto entries = report_registry();
+  return report_list == nullptr ? 0
+                                : static_cast<int>(std::count_if(
+                                      entries.begin(), entries.end(), [&](const auto& entry) {
+                                        return is_selected(entry, report_list);
+                                      }));
+}
+
+}  // namespace
 
 int report_action(char** args) {
   if (args == nullptr) {
@@ -177,8 +237,11 @@ int report_action(char** args) {
     return -1;
   }
   const char* stat_db = set_value(hash.get(), "real_path_stat_db");
-  remove_when_terminated(stat_db);
+  remove_when_terminated(stat_db, profile);
+  begin_facts(profile, hash.get());
+  progress_begin(profile, count_selected(hash.get()));
   const int result = make_report(profile, hash.get());
+  progress_end();
   if (stat_db != nullptr) {
     unlink(stat_db);
   }

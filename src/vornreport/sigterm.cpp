@@ -35,6 +35,7 @@ struct DoomedFiles {
   PathText stat_db_journal;
   PathText profile_db;
   PathText profile_db_journal;
+  PathText progress;
   PathText data;
   PathText body;
   PathText scratch;
@@ -171,8 +172,8 @@ void send_message(int error) {
 void remove_files() {
   const PathText* const files[] = {&g_files.stat_db,    &g_files.stat_db_journal,
                                    &g_files.profile_db, &g_files.profile_db_journal,
-                                   &g_files.data,       &g_files.body,
-                                   &g_files.scratch};
+                                   &g_files.progress,   &g_files.data,
+                                   &g_files.body,       &g_files.scratch};
   for (const PathText* file : files) {
     if (!file->empty()) {
       unlink(file->c_str());
@@ -228,7 +229,7 @@ void sigterm_handler(int signo) {
   _exit(1);
 }
 
-void remove_when_terminated(const char* stat_db) {
+void remove_when_terminated(const char* stat_db, const char* profile) {
   // The handler may read while this writes: a half-written name must not be unlinked, so the names
   // are complete before they are seen. SIGTERM waits meanwhile.
   sigset_t set;
@@ -241,6 +242,10 @@ void remove_when_terminated(const char* stat_db) {
   if (!is_unset(stat_db)) {
     g_files.profile_db.format("%s", stat_db);
     g_files.profile_db_journal.format("%s-journal", stat_db);
+  }
+  g_files.progress.clear();
+  if (!is_unset(profile)) {
+    g_files.progress.format("%s/%s", VORN_PATH_PROGRESS, profile);
   }
   sigprocmask(SIG_SETMASK, &before, nullptr);
 }

@@ -13,7 +13,8 @@ int setup_signal(int signo);
 // Does nothing for any other signal than SIGTERM; else never returns.
 void sigterm_handler(int signo);
 
-// A statistics database to remove, with its journal, when SIGTERM ends the run; null for none.
-void remove_when_terminated(const char* stat_db);
+// A statistics database to remove, with its journal, and the profile whose progress is told, when
+// SIGTERM ends the run; null for none.
+void remove_when_terminated(const char* stat_db, const char* profile);
 
 }  // namespace vornreport

@@ -1,4 +1,5 @@
 """What the reports must hold, computed from a tree: for tests that compare to the byte."""
+import json
 import os
 import re
 import time
@@ -37,11 +38,23 @@ def local_time(seconds):
     return time.strftime('%Y-%m-%d %H:%M:%S', time.localtime(seconds))
 
 
+FACTS = SCRIPT + b'var vornFacts = '
+
+
 def data_blocks(folder):
-    """All that the reports of a run appended to the page."""
+    """All that the reports of a run appended to the page, without the facts behind it."""
     page = (folder / 'report.html').read_bytes()
     page = re.split(rb"\nvar vornLang = '[\w-]+';\n</script>\n", page, maxsplit=1)[1]
-    return page.split(b'</template>\n</head>\n')[0]
+    return page.split(b'</template>\n</head>\n')[0].split(FACTS)[0]
+
+
+def facts(folder):
+    """The facts of a report, which stand in two places alike."""
+    text = (folder / 'report.json').read_bytes()
+    page = (folder / 'report.html').read_bytes()
+    block = page.split(FACTS)[1].split(b';\n</script>\n')[0]
+    assert block + b'\n' == text and b'<' not in text and text.isascii(), text
+    return json.loads(text)
 
 
 def data_rows(page, variable):

@@ -3,6 +3,7 @@
 Nothing here uses the program's own code: outputs are read by small readers of their own.
 """
 import ctypes
+import json
 import os
 import re
 import shutil
@@ -18,6 +19,8 @@ ROOT = Path(__file__).resolve().parents[2]
 BUILD = Path(os.environ.get('VORN_BUILD', ROOT / 'build'))
 PROGRAM = '/usr/vorn/bin/vornreport'
 SCRIPTS = 'usr/vorn/vornreport/reportUI'
+FORMAT = json.loads((BUILD / 'report_format.json').read_text())
+ALL = ','.join(report['name'] for report in FORMAT['reports'])  # the whole list of reports
 LIMIT = 30  # seconds that no run of these tests comes near
 
 
@@ -149,7 +152,9 @@ class Machine:
 
     def leftovers(self):
         """What a run that has ended must not leave: temporary files, databases, partial reports."""
-        found = list(self.tmp.glob('vornreport_*')) + list((self.vorn / 'var/stat').iterdir())
+        found = list(self.tmp.glob('vornreport_*')) + [
+            path for folder in ('stat', 'progress') if (self.vorn / 'var' / folder).exists()
+            for path in (self.vorn / 'var' / folder).iterdir()]
         return found + list(self.reports.glob('*/.*partial'))
 
     def stop_at(self, call):

@@ -127,9 +127,14 @@ TEST_F(ActionsTest, ReportRunsItsStepsInOrder) {
     }
   }
   EXPECT_EQ(shown, expected);
+  const std::string facts = support::read_file(folder_.path("it's final/report.json"));
+  EXPECT_EQ(facts.find('\n'), facts.size() - 1);
   EXPECT_EQ(support::read_file(folder_.path("it's final/report.html")),
-            "header \nlang en\n</script>\n</script>\nheader share_list\n"
-            "body \nbody share_list\nbody large_file\ntail \n");
+            "header \nlang en\n</script>\n</script>\n<script type='text/javascript'>\n"
+            "var vornFacts = " +
+                facts.substr(0, facts.size() - 1) +
+                ";\n</script>\nheader share_list\n"
+                "body \nbody share_list\nbody large_file\ntail \n");
   EXPECT_FALSE(support::exists(folder_.path("stat.db.p1")));
   EXPECT_FALSE(support::exists(data_));
   EXPECT_FALSE(support::exists(body));

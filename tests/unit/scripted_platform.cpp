@@ -232,6 +232,39 @@ void VORNMountVolInfoFree(VORNMountVolInfo* volumes) {
   }
 }
 
+int VORNVolumeOfPath(const char* path, char* mount_path, size_t size) {
+  const std::string text = path;
+  for (const auto& [folder, volume] : platform.volumes_of) {
+    if (text == folder || text.starts_with(folder + "/")) {
+      return copied(volume, mount_path, size);
+    }
+  }
+  return copied("/", mount_path, size);
+}
+
+int VORNVolumeHasQuotas(const char* mount_path) {
+  return platform.quotas.count(mount_path) != 0 ? 1 : 0;
+}
+
+int VornQazGetHostName(char* out, size_t size) {
+  return copied("files", out, size);
+}
+
+int VornQazGetTimeZone(char* out, size_t size) {
+  return copied("Europe/Berlin", out, size);
+}
+
+int VornQazProgressUpdate(const char* /*profile*/, const char* text) {
+  platform.progress.emplace_back(text);
+  return 0;
+}
+
+void VornQazProgressEnd(const char* profile) {
+  platform.progress.push_back(std::string("end ") + profile);
+}
+
+void VornQazSetIncidentSink(VornIncidentSink /*sink*/) {}
+
 int VornQazGetTimeSecond(char* out, size_t size) {
   return copied("1700000000", out, size);
 }

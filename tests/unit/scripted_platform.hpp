@@ -30,6 +30,9 @@ struct ScriptedPlatform {
     unsigned long long total_size;
   };
   std::vector<Volume> mounted;
+  TextMap volumes_of;            // folder to mount path, for what lies in it; else "/"
+  std::set<std::string> quotas;  // mount paths of volumes that keep them
+  std::vector<std::string> progress;
   std::map<std::string, std::string> digests;  // path to MD5 text; "2" or "-1": that result
   std::set<std::string> unselected;            // shares that the profile leaves out
   int fs_kind = 1;

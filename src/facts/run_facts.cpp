@@ -1,0 +1,112 @@
+#include "facts/run_facts.hpp"
+
+#include <algorithm>
+#include <ctime>
+
+#include "facts/forecast.hpp"
+#include "report_format/values.hpp"
+#include "vorn/report.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/handles.hpp"
+
+namespace vornreport {
+namespace {
+
+constexpr char kModule[] = "src/facts";
+constexpr size_t kMostQuotas = 20;
+
+}  // namespace
+
+void QuotaTally::add(std::string volume, std::string user, uint64_t used, uint64_t quota) {
+  if (quota == 0) {
+    return;
+  }
+  report_format::QuotaFacts facts;
+  facts.volume = std::move(volume);
+  facts.user = std::move(user);
+  facts.used = used;
+  facts.quota = quota;
+  facts.percent = static_cast<double>(used) * 100.0 / static_cast<double>(quota);
+  facts.level = quota_level(facts.percent, nullptr);
+  pressing_ += facts.level != report_format::Level::kOk ? 1 : 0;
+  keep(std::move(facts));
+}
+
+void QuotaTally::add(const QuotaTally& other) {
+  pressing_ += other.pressing_;
+  for (const report_format::QuotaFacts& facts : other.users_) {
+    keep(facts);
+  }
+}
+
+void QuotaTally::keep(report_format::QuotaFacts facts) {
+  const auto place =
+      std::upper_bound(users_.begin(), users_.end(), facts,
+                       [](const auto& one, const auto& two) { return one.percent > two.percent; });
+  users_.insert(place, std::move(facts));
+  users_.resize(std::min(users_.size(), kMostQuotas));
+}
+
+RunFacts& run_facts() {
+  static RunFacts facts;
+  return facts;
+}
+
+void begin_facts(const char* profile, const VLIBCSzHash* profile_hash) {
+  RunFacts& facts = run_facts();
+  facts.profile = profile;
+  facts.started = std::time(nullptr);
+  const char* limit_user = set_value(profile_hash, "limit_user");
+  ListHandle names(VLIBCSzListAlloc(kPlatformSlots));
+  if (limit_user == nullptr || !names) {
+    return;
+  }
+  with_address(names, [&](VLIBCSzList** list) { return VLIBCStrTok(limit_user, ",", list); });
+  facts.limit_user.emplace();
+  for (int i = 0; i < VLIBCSzListCount(names.get()); ++i) {
+    facts.limit_user->insert(VLIBCSzListGet(names.get(), i));
+  }
+}
+
+void note_volumes(const VORNMountVolInfo* volumes) {
+  std::vector<MeasuredVolume>& noted = run_facts().volumes;
+  noted.clear();
+  const int64_t now = std::time(nullptr);
+  for (; volumes != nullptr; volumes = volumes->next) {
+    if (!is_unset(volumes->path)) {
+      noted.push_back({volumes->path, volumes->total_size, volumes->free_size, now});
+    }
+  }
+}
+
+void record_incident(const char* kind, const std::string& what, const std::string& text,
+                     AlreadyLogged logged) {
+  std::vector<report_format::Incident>& incidents = run_facts().incidents;
+  const report_format::IncidentKind* known = report_format::find_incident_kind(kind);
+  const std::string told = report_format::facts_text(what);
+  if (known == nullptr ||
+      std::any_of(incidents.begin(), incidents.end(), [&](const report_format::Incident& before) {
+        return before.kind == kind && before.what == told;
+      })) {
+    return;
+  }
+  incidents.push_back({known->level, kind, told, report_format::facts_text(text)});
+  if (logged == AlreadyLogged::kNo) {
+    REPORT_LOG_ERR(kModule, __LINE__, "%s\n", text.c_str());
+  }
+}
+
+void listen_for_incidents() {
+  VornQazSetIncidentSink([](const char* kind, const char* what, const char* text) {
+    record_incident(kind, what, text, AlreadyLogged::kYes);
+  });
+}
+
+bool sums_are_doubtful() {
+  const std::vector<report_format::Incident>& incidents = run_facts().incidents;
+  return std::any_of(incidents.begin(), incidents.end(), [](const auto& incident) {
+    return report_format::find_incident_kind(incident.kind)->spoils_sums;
+  });
+}
+
+}  // namespace vornreport

@@ -1,0 +1,274 @@
+"""The facts of a run against independent counts, and page, mail and vornctl telling the same."""
+import collections
+import email
+import email.policy
+import json
+import os
+import signal
+import sqlite3
+import subprocess
+import time
+
+from expected import facts
+from harness import ALL, FORMAT, ROOT, ProductTest, make_files, needs_root
+from server import DAY, SHARES, USERS, Server
+
+MIB = 1 << 20
+
+
+class MailServer:
+    """A mail server on loopback; mails() are those that it was given."""
+
+    def __init__(self, test, folder):
+        self.folder = folder
+        folder.mkdir()
+        self.process = subprocess.Popen(
+            ['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py',
+             folder], stdout=subprocess.PIPE, text=True)
+        test.addCleanup(self.end)
+        self.port = int(self.process.stdout.readline())
+
+    def end(self):
+        self.process.send_signal(signal.SIGTERM)
+        self.process.wait()
+        self.process.stdout.close()
+
+    def mails(self):
+        files = sorted(self.folder.glob('*.eml'), key=lambda path: int(path.stem))
+        return [email.message_from_bytes(path.read_bytes(), policy=email.policy.default)
+                for path in files]
+
+
+def plain(mail):
+    return mail.get_body(('plain',)).get_content()
+
+
+def amounts(rows):
+    """Key to [files, bytes] of rows of keys and sizes."""
+    sums = collections.defaultdict(lambda: [0, 0])
+    for key, size in rows:
+        sums[key][0] += 1
+        sums[key][1] += size
+    return sums
+
+
+@needs_root
+class PreparedServer(ProductTest):
+    """Four volumes, quotas and half a year of history."""
+
+    def test_facts_against_independent_counts(self):
+        server = Server(self.m, self)
+        server.history(days=180)
+        users = {uid: name for name, uid in ({'root': 0} | USERS).items()}
+        folder = server.root / 'projects/CAD'
+        os.symlink('/etc/passwd', folder / 'link')
+        os.mkfifo(folder / 'pipe')
+        os.link(next(path for path in folder.rglob('*') if path.is_file() and not path.is_symlink()),
+                folder / 'second name.iso')
+        make_files(folder, {'@eaDir/left out': 5, 'sparse.bin': 1 << 40})
+        stranger = folder / 'stranger'
+        stranger.write_bytes(b'x' * 100)
+        os.chown(stranger, 3999, -1)
+        self.m.profile('p', report_list=ALL, limit_user='anna,bjoern,john-doe')
+        before = int(time.time())
+        run = self.m.run('--report', 'p')
+        self.assertEqual((run.status, self.m.status('p')), (0, 'success'), run.log_lines)
+        report = self.m.report_folders('p')[-1]
+        found = facts(report)
+
+        # What is in each share, by a walk of our own.
+        shares, owners, types = {}, collections.defaultdict(list), collections.defaultdict(list)
+        duplicates = collections.defaultdict(set)
+        for volume, names in SHARES.items():
+            for share in names:
+                top = server.root / volume / share
+                count = {'name': share, 'path': f'/srv/{volume}/{share}', 'volume': f'/srv/{volume}',
+                         'files': 0, 'folders': 0, 'bytes': 0, 'allocated': 0, 'unreadable': 0,
+                         'other': 0, 'whole': True, 'grown': None, 'samples': None}
+                for path, folders, files in os.walk(os.fsencode(top)):
+                    folders[:] = [name for name in folders if name != b'@eaDir']
+                    count['folders'] += len(folders)
+                    for name in files:
+                        status = os.lstat(os.path.join(path, name))
+                        if not os.path.isfile(os.path.join(path, name)) or os.path.islink(
+                                os.path.join(path, name)):
+                            count['other'] += 1
+                            continue
+                        count['files'] += 1
+                        count['bytes'] += status.st_size
+                        count['allocated'] += status.st_blocks * 512 // status.st_nlink
+                        owners[users.get(status.st_uid)].append(((share, f'/srv/{volume}'),
+                                                                 status.st_size))
+                        types[share].append(status.st_size)
+                        duplicates[name, status.st_size].add((status.st_dev, status.st_ino))
+                shares[share] = count
+        self.assertEqual({share['name']: share for share in found['shares']}, shares)
+        self.assertEqual([share['bytes'] for share in found['shares']],
+                         sorted((share['bytes'] for share in shares.values()), reverse=True))
+
+        # Owners: of the three that may be told of, wherever they have files.
+        told = {'anna', 'bjoern', 'john-doe'}
+        self.assertEqual({owner['name'] for owner in found['owners']}, told)
+        for owner in found['owners']:
+            places = amounts(owners[owner['name']])
+            self.assertEqual({(place['share'], place['volume']): [place['files'], place['bytes']]
+                              for place in owner['places']}, places)
+            self.assertEqual([owner['files'], owner['bytes']],
+                             [sum(column) for column in zip(*places.values())])
+        self.assertEqual({volume: sum(kind['files'] for kind in found['types'] for part in kind['shares']
+                                      if part['share'] == volume and kind['files'] >= 0) > 0
+                          for volume in shares}, dict.fromkeys(shares, True))
+        for share, sizes in types.items():
+            parts = [part for kind in found['types'] for part in kind['shares']
+                     if part['share'] == share]
+            self.assertEqual([sum(part['files'] for part in parts),
+                              sum(part['bytes'] for part in parts)], [len(sizes), sum(sizes)])
+
+        # Duplicates: names and sizes that several files have; a file of two names is one.
+        groups = collections.Counter()
+        rows = (report / 'csv/duplicate_file.csv').read_text(errors='replace').splitlines()[1:]
+        numbers = {row.split('\t')[0] for row in rows}
+        reclaimable = sum((len(inodes) - 1) * size
+                          for (name, size), inodes in duplicates.items())
+        self.assertEqual(found['duplicates']['reclaimable'], reclaimable)
+        self.assertEqual(found['duplicates']['groups'], len(numbers))
+        self.assertEqual(found['duplicates']['mode'], 'name')
+
+        # Quotas, by the tool itself.
+        table = subprocess.check_output(['repquota', server.root / 'home'], text=True,
+                                        stderr=subprocess.DEVNULL)
+        quotas = []
+        for line in table.split('\n-', 1)[1].split('\n')[1:]:
+            words = line.split()
+            name = users.get(int(words[0][1:]), '') if words and words[0].startswith('#') else \
+                words and words[0]
+            if words and int(words[3]) and name in told:
+                quotas.append(['/srv/home', name, int(words[2]) * 1024, int(words[3]) * 1024])
+        quotas.sort(key=lambda row: -row[2] / row[3])
+        self.assertEqual([[row[key] for key in ('volume', 'user', 'used', 'quota')]
+                          for row in found['quotas']], quotas)
+        self.assertEqual([row['level'] for row in found['quotas']],
+                         ['critical' if used > quota else 'warning' if used >= .9 * quota else 'ok'
+                          for _, _, used, quota in quotas])
+
+        # Volumes, as df has them, with their samples.
+        for volume in found['volumes']:
+            if not volume['path'].startswith('/srv/'):
+                continue
+            status = os.statvfs(server.root / volume['path'][5:])
+            used = (status.f_blocks - status.f_bfree) * status.f_frsize
+            self.assertEqual((volume['used'], volume['free'], volume['size']),
+                             (used, status.f_bavail * status.f_frsize,
+                              used + status.f_bavail * status.f_frsize))
+            self.assertAlmostEqual(volume['percent'], used * 100 / volume['size'])
+            self.assertEqual(volume['samples'][-1][1], used)
+            self.assertEqual(len(volume['samples']), 30)  # of every third day, and today's
+        self.assertEqual(found['volumes'][0]['path'], '/srv/projects')
+        self.assertEqual([found[key] for key in ('format', 'profile', 'complete', 'incidents', 'ages')],
+                         [1, 'p', True, [], None])
+        self.assertTrue(before <= found['started'] <= found['finished'] <= time.time())
+        self.assertEqual([entry['name'] for entry in found['reports']], ALL.split(','))
+        large = next(entry for entry in found['reports'] if entry['name'] == 'large_file')
+        self.assertEqual(large, {'name': 'large_file', 'rows': sum(s['files'] for s in shares.values()),
+                                 'shown': 200, 'limit': 200, 'csv': 'csv/large_file.csv', 'ok': True})
+        for entry in found['attention']:
+            values = FORMAT['attention'][entry['code']]
+            self.assertEqual((entry['section'], set(entry['values'])),
+                             (values['section'], set(values['values'])))
+
+
+# Name of a volume to what it is to show: how its history went (day before now to part of the
+# present use), and how much of it is used now.
+SHAPES = {
+    'flat': ({day: 1 for day in range(1, 180)}, .60),
+    'jump': ({day: .5 if day > 3 else 1 for day in range(1, 90)}, .60),
+    'plateau': ({day: .7 + .3 * min(1, (160 - day) / 90) for day in range(1, 160)}, .60),
+    'fresh': ({minute / 1440: 1 - minute / 100 for minute in range(3, 30, 3)}, .60),
+    'grows': ({day: 1 - day / 100 for day in range(1, 40)}, .75),
+    'full': ({day: 1 - day / 300 for day in range(1, 40)}, 1),
+}
+SIZE = 16 * MIB
+
+
+class Shapes(ProductTest):
+    """Histories that two samples alone would tell wrong."""
+
+    def new_machine(self):
+        machine = super().new_machine()
+        for name in SHAPES:
+            machine.options += ['--tmpfs', SIZE, f'/tmp/{name}']
+            with machine.shares.open('a') as file:
+                file.write(f'[{name}]\npath = /tmp/{name}\n')
+        return machine
+
+    def prepare(self):
+        now = int(time.time())
+        rows = []
+        for name, (parts, use) in SHAPES.items():
+            for day, part in parts.items():
+                used = int(SIZE * use * part)
+                rows.append(('global', f'/tmp/{name}', used, SIZE - used, f'{used * 100 / SIZE:f}'[:7],
+                             int(now - day * DAY)))
+        # Two seconds ago there was a little less.
+        used = int(SIZE * SHAPES['flat'][1]) - 500 * 1024
+        rows.append(('global', '/tmp/flat', used, SIZE - used, '57.0000', now - 2))
+        with sqlite3.connect(self.m.vorn / 'etc/vornreport.db') as db:
+            db.executescript((self.m.vorn / 'vornreport/sql/vornreport.sql').read_text())
+            db.executemany('INSERT INTO VolumeUsage VALUES (?, ?, ?, ?, ?, ?)',
+                           [tuple(map(str, row)) for row in rows])
+        db.close()
+
+    def run_report(self, command):
+        fill = ''.join(f'head -c {int(SIZE * use)} /dev/zero >/tmp/{name}/file 2>/dev/null\n'
+                       for name, (_, use) in SHAPES.items())
+        return self.m.shell(fill + command)
+
+    def test_mail_and_status_tell_the_shapes_right(self):
+        self.prepare()
+        server = MailServer(self, self.m.base / 'mails')
+        languages = sorted(path.stem for path in (ROOT / 'reportUI/template/lang').glob('*.json'))
+        for language in languages:
+            self.m.profile(language, report_list='volume_usage', language=language, mail_to='a@b.example',
+                           smtp_url=f'smtp://127.0.0.1:{server.port}')
+        run = self.run_report(''.join(f'/usr/vorn/bin/vornreport --report {language}\n'
+                                      for language in languages)
+                              + 'echo "<<<"; /usr/vorn/bin/vornctl status --json en\n'
+                              + 'echo "<<<"; /usr/vorn/bin/vornctl status en\n')
+        self.assertEqual(run.err, '')
+        mails = server.mails()
+        self.assertEqual(len(mails), len(languages))
+        for language, mail in zip(languages, mails):
+            with self.subTest(language):
+                found = facts(self.m.report_folders(language)[-1])
+                volumes = {volume['path']: volume for volume in found['volumes']}
+                states = {name: volumes[f'/tmp/{name}']['forecast']['state'] for name in SHAPES}
+                self.assertEqual(states, {'flat': 'steady', 'jump': 'steady', 'plateau': 'steady',
+                                          'fresh': 'short', 'grows': 'growing', 'full': 'full'})
+                levels = {name: volumes[f'/tmp/{name}']['level'] for name in SHAPES}
+                self.assertEqual(levels, {'flat': 'ok', 'jump': 'ok', 'plateau': 'ok', 'fresh': 'ok',
+                                          'grows': 'warning', 'full': 'critical'})
+                jump = volumes['/tmp/jump']['forecast']['jump']
+                self.assertAlmostEqual(jump['bytes'], SIZE * .3, delta=MIB)
+                self.assertEqual([entry['code'] for entry in found['attention']
+                                  if entry['values']['volume'].startswith('/tmp/')],
+                                 ['volume_full', 'volume_fills'])
+                self.check_mail(mail, language, volumes)
+        whole, table = run.out.split('<<<\n')[1:]
+        status, = json.loads(whole)
+        self.assertEqual(status['volume']['path'], '/tmp/full')
+        self.assertIn('/tmp/full', table)
+
+    def check_mail(self, mail, language, volumes):
+        texts = json.loads((ROOT / f'reportUI/template/lang/{language}.json').read_text())
+        text = plain(mail)
+        first = texts['attention']['volume_full'].replace('{volume}', '/tmp/full')
+        self.assertTrue(mail['subject'].startswith(first), mail['subject'])
+        self.assertTrue(text.startswith(first), text)
+        grows = volumes['/tmp/grows']['forecast']
+        outlook = texts['facts']['fillsDays']
+        for key, value in (('n', 'days'), ('low', 'days_low'), ('high', 'days_high')):
+            outlook = outlook.replace('{%s}' % key, str(grows[value]))
+        self.assertIn(texts['attention']['volume_fills'].replace('{volume}', '/tmp/grows')
+                      .replace('{outlook}', outlook), text)
+        for name in ('flat', 'jump', 'plateau', 'fresh'):  # nothing to worry about
+            self.assertNotIn(f'/tmp/{name}', text)

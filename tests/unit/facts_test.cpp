@@ -1,0 +1,415 @@
+// The facts of a run: what is counted, what may be told, what deserves attention, and the file.
+#include "report_format/facts.hpp"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <nlohmann/json.hpp>
+
+#include "facts/assemble.hpp"
+#include "facts/attention.hpp"
+#include "facts/duplicate_tally.hpp"
+#include "facts/progress.hpp"
+#include "facts/run_facts.hpp"
+#include "facts/tallies.hpp"
+#include "fixture.hpp"
+#include "report_format/attention.hpp"
+#include "report_format/run_state.hpp"
+#include "vornreport/handles.hpp"
+
+namespace vornreport {
+namespace {
+
+using report_format::AttentionValue;
+using report_format::Facts;
+using report_format::Level;
+
+constexpr int64_t kNow = 1'700'000'000;
+constexpr int64_t kDay = 86400;
+constexpr char kAll[] = "share_list,file_owner,file_group,quota_usage,duplicate_file,least_modify";
+
+class FactsTest : public UnitTest {
+ protected:
+  FactsTest() {
+    run_facts() = RunFacts();
+    run_facts().started = kNow;
+    tallies().clear();
+    source_.now = kNow;
+    source_.report_list = kAll;
+    source_.has_walked = true;
+  }
+  ~FactsTest() override { tallies().clear(); }
+
+  struct File {
+    const char* path;
+    uint64_t size;
+    uid_t owner = 0;
+    const char* type = "image";
+    dev_t device = 1;
+    nlink_t links = 1;
+    int64_t mtime = kNow;
+  };
+  static void count(const File& file, RowSource source = RowSource::kWalk) {
+    struct stat status {};
+    status.st_size = static_cast<off_t>(file.size);
+    status.st_uid = file.owner;
+    status.st_dev = file.device;
+    status.st_nlink = file.links;
+    status.st_mtime = file.mtime;
+    status.st_blocks = static_cast<blkcnt_t>((file.size + 511) / 512);
+    tallies().file({"s", file.path, "", file.type, &status}, source);
+  }
+  static void share(const char* name, const char* path, const std::vector<File>& files) {
+    tallies().begin_share(name, path);
+    for (const File& file : files) {
+      count(file);
+    }
+    tallies().end_share();
+  }
+
+  Facts facts() { return assemble_facts(run_facts(), tallies(), source_); }
+
+  // The codes of the attention list with their first values, the worst first.
+  std::string attention() {
+    std::string all;
+    for (const report_format::Attention& entry : facts().attention) {
+      all += std::string(word_of(entry.level)) + " " + entry.code;
+      const AttentionValue& first = entry.values.front().second;
+      all +=
+          " " +
+          (std::holds_alternative<std::string>(first) ? std::get<std::string>(first)
+                                                      : std::to_string(std::get<int64_t>(first))) +
+          "\n";
+    }
+    return all;
+  }
+
+  FactsSource source_;
+};
+
+TEST_F(FactsTest, SumsByShareVolumeOwnerAndType) {
+  platform.volumes_of = {{"/srv/a/nested", "/srv/a/nested"}};
+  share("a", "/srv/a",
+        {{"/srv/a/1", 1000, 1, "image", 1},
+         {"/srv/a/2", 500, 2, "text", 1},
+         {"/srv/a/nested/3", 7, 1, "image", 2},
+         {"/srv/a/link", 4096, 1, "text", 1, 3}});
+  tallies().begin_share("b", "/srv/b");
+  count({"/srv/b/1", 100'000, 2, "text", 9}, RowSource::kIndex);
+  tallies().share()->folder();
+  tallies().share()->other();
+  tallies().share()->unreadable();
+  tallies().end_share();
+  run_facts().owners = {{1, "anna"}};  // nobody may tell of the other
+
+  const Facts found = facts();
+  ASSERT_EQ(found.shares->size(), 2U);
+  const report_format::ShareFacts& b = found.shares->at(0);
+  EXPECT_EQ(
+      std::tuple(b.name, b.files, b.folders, b.bytes, b.allocated, b.unreadable, b.other, b.whole),
+      std::tuple("b", 1U, 1U, 100'000U, 100'000U, 1U, 1U, false));
+  const report_format::ShareFacts& a = found.shares->at(1);
+  EXPECT_EQ(std::tuple(a.name, a.volume, a.files, a.bytes, a.allocated, a.whole),
+            std::tuple("a", "/", 4U, 5603U, 1024U + 512 + 512 + 4096 / 3, true));
+  ASSERT_EQ(found.owners->size(), 1U);
+  const report_format::OwnerFacts& anna = found.owners->front();
+  EXPECT_EQ(std::tuple(anna.name, anna.files, anna.bytes), std::tuple("anna", 3U, 5103U));
+  ASSERT_EQ(anna.places.size(), 2U);
+  EXPECT_EQ(anna.places[0].volume + " " + anna.places[1].volume, "/ /srv/a/nested");
+  ASSERT_EQ(found.types->size(), 2U);
+  const report_format::TypeFacts& text = found.types->front();
+  EXPECT_EQ(
+      std::tuple(text.type, text.files, text.bytes, text.shares[0].share, text.shares[1].bytes),
+      std::tuple("text", 3U, 104'596U, "b", 4596U));
+}
+
+TEST_F(FactsTest, SumsOfSparseFilesStayAtTheGreatestNumber) {
+  share("a", "/srv/a", {{"/srv/a/1", INT64_MAX}, {"/srv/a/2", INT64_MAX}, {"/srv/a/3", 5}});
+  EXPECT_EQ(facts().shares->front().bytes, UINT64_MAX);
+  share("b", "/srv/b", {{"/srv/b/1", 1}});
+  EXPECT_EQ(facts().types->front().bytes, UINT64_MAX);
+}
+
+TEST_F(FactsTest, TellsOnlyWhatWasAskedFor) {
+  share("a", "/srv/a", {{"/srv/a/1", 1, 1, "image", 1, 1, kNow - 100 * kDay}});
+  run_facts().owners = {{1, "anna"}};
+  source_.report_list = "large_file,volume_usage";
+  const Facts found = facts();
+  EXPECT_TRUE(found.shares);
+  EXPECT_FALSE(found.owners || found.types || found.ages || found.quotas || found.duplicates);
+  EXPECT_EQ(attention(), "");
+  ASSERT_EQ(found.reports.size(), 2U);
+  EXPECT_EQ(found.reports[0].name, "volume_usage");
+  source_.has_walked = false;
+  EXPECT_FALSE(facts().shares);
+}
+
+TEST_F(FactsTest, LimitOfUsers) {
+  HashHandle profile(VLIBCSzHashAlloc(8));
+  with_address(profile,
+               [](VLIBCSzHash** h) { return VLIBCSzHashSetValue(h, "limit_user", "anna,chen"); });
+  begin_facts("p1", profile.get());
+  EXPECT_TRUE(run_facts().may_tell("chen"));
+  EXPECT_FALSE(run_facts().may_tell("bjoern"));
+  run_facts().limit_user.reset();
+  EXPECT_TRUE(run_facts().may_tell("bjoern"));
+}
+
+TEST_F(FactsTest, VolumesStandByUrgency) {
+  const uint64_t kSize = 1000;
+  platform.volume_ids = {{"/used", "u"}, {"/full", "f"}, {"/most", "m"}, {"/fine", "ok"}};
+  run_facts().volumes = {{"/fine", kSize, 990, kNow},
+                         {"/most", kSize, 20, kNow},
+                         {"/full", kSize, 0, kNow},
+                         {"/used", kSize, 130, kNow},
+                         {"/none", 0, 0, kNow}};
+  const Facts found = facts();
+  std::string order;
+  for (const report_format::VolumeFacts& volume : found.volumes) {
+    order += volume.path + " " + volume.id + " " + word_of(volume.level) + "\n";
+  }
+  EXPECT_EQ(order, "/full f critical\n/most m critical\n/used u warning\n/fine ok ok\n/none  ok\n");
+  EXPECT_EQ(attention(),
+            "critical volume_full /full\ncritical volume_used /most\nwarning volume_used /used\n");
+}
+
+// A volume that fills up soon is told by its days, unless its use alone is the worse news.
+TEST_F(FactsTest, SamplesBelongToTheirVolume) {
+  const std::string begin = "/volumes/with/one/beginning/31b";  // what the history keeps
+  ASSERT_EQ(begin.size(), 31U);
+  std::vector<report_format::Sample> rising;
+  for (int day = 30; day > 0; --day) {
+    rising.push_back({kNow - day * kDay, static_cast<uint64_t>(700'000 - day * 5000)});
+  }
+  source_.samples = {{"/grows", rising}, {begin, rising}};
+  run_facts().volumes = {{"/grows", 1'000'000, 300'000, kNow},
+                         {begin + "-a", 1'000'000, 300'000, kNow},
+                         {begin + "-b", 1'000'000, 300'000, kNow}};
+  const Facts found = facts();
+  EXPECT_EQ(found.volumes[0].path, "/grows");
+  EXPECT_EQ(found.volumes[0].forecast.days, 60);
+  EXPECT_EQ(found.volumes[1].forecast.state, report_format::ForecastState::kShort);
+  EXPECT_EQ(found.volumes[2].samples.size(), 1U);
+  EXPECT_EQ(attention(), "warning volume_fills /grows\n");
+}
+
+TEST_F(FactsTest, QuotasNearestToTheirLimit) {
+  QuotaTally tally;
+  QuotaTally other;
+  for (uint64_t i = 1; i <= 30; ++i) {
+    (i % 2 == 0 ? tally : other).add("/", "u" + std::to_string(i), 80 + i, 100);
+  }
+  tally.add("/", "unlimited", 1'000'000, 0);
+  tally.add(other);
+  ASSERT_EQ(tally.users().size(), 20U);
+  EXPECT_EQ(tally.users().front().user, "u30");
+  EXPECT_EQ(tally.users().back().user, "u11");
+  EXPECT_EQ(tally.pressing(), 21U);
+  run_facts().quotas = tally;
+  EXPECT_EQ(attention(),
+            "critical quota_over u30\ncritical quota_over u29\ncritical quota_over u28\n"
+            "critical quota_more 18\n");
+  run_facts().quotas.emplace();
+  run_facts().quotas->add("/", "anna", 90, 100);
+  run_facts().quotas->add("/", "bjoern", 89, 100);
+  EXPECT_EQ(attention(), "warning quota_near anna\n");
+}
+
+TEST_F(FactsTest, NoSuperlativeOfADoubtfulSum) {
+  share("small", "/srv/a", {{"/srv/a/1", 1, 1, "image", 1, 1, kNow - 91 * kDay}});
+  share("large", "/srv/b", {{"/srv/b/old", 5, 1, "image", 1, 1, kNow - 90 * kDay}});
+  run_facts().owners = {{1, "anna"}};
+  run_facts().duplicates = {{.by_content = true, .groups = 2, .files = 5, .reclaimable = 77}};
+  const std::string rest = "ok duplicates_confirmed 77\nok data_oldest 1692137600\n";
+  EXPECT_EQ(attention(), "ok share_largest large\nok owner_most anna\n" + rest);
+  record_incident("quota_failed", "/", "said", AlreadyLogged::kYes);
+  EXPECT_EQ(attention(), "ok share_largest large\nok owner_most anna\n" + rest);
+  record_incident("share_part", "small: 1", "said", AlreadyLogged::kYes);
+  EXPECT_EQ(attention(), rest);
+}
+
+TEST_F(FactsTest, IncidentsAreToldOnce) {
+  const std::string printed_text = printed([] {
+    record_incident("share_missing", "a\xff", "share a\xff is missing");
+    record_incident("share_missing", "a\xff", "share a\xff is missing");
+    record_incident("index_refused", "a", "said elsewhere", AlreadyLogged::kYes);
+    record_incident("no_such_kind", "a", "unheard of");
+  });
+  const std::string log = support::syslog_text();
+  EXPECT_NE(log.find("is missing"), std::string::npos);
+  EXPECT_EQ(log.find("is missing"), log.rfind("is missing"));
+  EXPECT_EQ(printed_text.find("said elsewhere"), std::string::npos);
+  const Facts found = facts();
+  ASSERT_EQ(found.incidents.size(), 2U);
+  EXPECT_EQ(found.incidents[0].what, "a\\xff");
+  EXPECT_FALSE(found.complete);
+  run_facts().incidents.erase(run_facts().incidents.begin());
+  EXPECT_TRUE(facts().complete);
+}
+
+TEST_F(FactsTest, DuplicatesCountPhysicalFilesOnce) {
+  const std::string top = folder_.path();
+  for (const char* name : {"one", "two", "other"}) {
+    support::write_file(folder_.path(name), "12345");
+  }
+  ASSERT_EQ(link(folder_.path("one").c_str(), folder_.path("linked").c_str()), 0);
+  ASSERT_EQ(symlink(folder_.path("two").c_str(), folder_.path("points").c_str()), 0);
+  DuplicateTally tally(/*by_content=*/false);
+  const auto group = [&](const std::vector<const char*>& names) {
+    for (const char* name : names) {
+      tally.file(top.c_str(), folder_.path(name).c_str());
+    }
+    tally.end_group(5);
+  };
+  group({"one", "linked"});  // one file
+  EXPECT_EQ(tally.facts().reclaimable, 0U);
+  group({"one", "two", "linked", "one"});  // two
+  EXPECT_EQ(tally.facts().reclaimable, 5U);
+  group({"gone", "points", "other"});  // what can't be looked at counts by its path
+  tally.end_group(5);                  // nothing
+  EXPECT_EQ(std::tuple(tally.facts().groups, tally.facts().files, tally.facts().reclaimable),
+            std::tuple(3U, 6U, 15U));
+}
+
+TEST_F(FactsTest, ProgressIsWrittenTenTimesASecondAtMost) {
+  progress_begin("p1", 9);
+  for (uint64_t files = 1; files <= 1'000'000; ++files) {
+    progress_file(files);
+  }
+  for (int i = 0; i < 100; ++i) {
+    progress_share("s");
+  }
+  progress_end();
+  ASSERT_LE(platform.progress.size(), 30U);  // over well under two seconds
+  EXPECT_EQ(platform.progress.back(), "end p1");
+  const auto first = report_format::progress_of(platform.progress.front());
+  ASSERT_TRUE(first);
+  EXPECT_EQ(first->reports, 9);
+  const auto last = report_format::progress_of(platform.progress[platform.progress.size() - 2]);
+  ASSERT_TRUE(last);
+  EXPECT_EQ(last->share, "s");
+}
+
+// --- The file ---------------------------------------------------------------------------------
+
+Facts full_facts() {
+  Facts facts;
+  facts.host = "files";
+  facts.profile = "p1";
+  facts.started = kNow;
+  facts.complete = false;
+  facts.incidents = {{report_format::IncidentLevel::kError, "share_missing", "</script>", "x"}};
+  report_format::VolumeFacts volume;
+  volume.path =
+      "/srv/b\xc3\xbc"
+      "cher";
+  volume.size = UINT64_MAX;
+  volume.percent = 93.25;
+  volume.level = Level::kCritical;
+  volume.forecast = {report_format::ForecastState::kGrowing, 24, 19, 33, 1 << 30, 30, {}};
+  volume.forecast.jump = {kNow, -5};
+  volume.samples = {{kNow, 7}, {kNow + 1, 8}};
+  volume.grown_by = {{{"owner", "s", "anna", -3, {}}}};
+  facts.volumes = {volume};
+  facts.shares.emplace().push_back({});
+  facts.shares->front().grown.emplace().last = {kNow, -1, -2};
+  facts.owners.emplace().push_back({"anna", 1, 2, {}, {{"s", "/", 1, 2}}});
+  facts.types.emplace().push_back({"t", 1, 2, {}, {{"s", 1, 2}}});
+  facts.ages.emplace().push_back({"0-7", 1, 2});
+  facts.quotas.emplace().push_back({"/", "anna", 1, 2, 50, Level::kWarning, {}});
+  facts.duplicates = {{true, 1, 2, 3}};
+  facts.attention = {{Level::kWarning, "volume_used", {{"volume", "/"}, {"percent", 1.5}}, "x"},
+                     {Level::kOk, "share_largest", {{"bytes", int64_t{5}}}, "y"}};
+  facts.reports = {{"large_file", 300, 200, 200, "csv/large_file.csv", false}};
+  return facts;
+}
+
+TEST(FactsFile, ReadsWhatItWrites) {
+  const std::string line = report_format::to_line(full_facts());
+  EXPECT_EQ(line.find_first_of("<\n\xc3"), std::string::npos);
+  const std::optional<Facts> read = report_format::facts_of(line);
+  ASSERT_TRUE(read);
+  EXPECT_EQ(report_format::to_line(*read), line);
+  EXPECT_EQ(read->volumes[0].size, UINT64_MAX);
+  EXPECT_EQ(read->volumes[0].forecast.jump->bytes, -5);
+  EXPECT_EQ(std::get<double>(*read->attention[0].find("percent")), 1.5);
+  EXPECT_TRUE(read->duplicates->by_content);
+  EXPECT_EQ(read->incidents[0].what, "</script>");
+  EXPECT_EQ(report_format::started_of(line), kNow);
+}
+
+// Every key is there from the start, null where nothing is known.
+TEST(FactsFile, HasEveryKey) {
+  const auto json = nlohmann::json::parse(report_format::to_line(full_facts()));
+  const auto keys = [](const nlohmann::json& object) {
+    std::string all;
+    for (const auto& [key, value] : object.items()) {
+      all += key + " ";
+    }
+    return all;
+  };
+  EXPECT_EQ(keys(json),
+            "ages attention complete duplicates finished format host incidents language owners "
+            "profile quotas reports shares started time_zone types volumes ");
+  EXPECT_EQ(keys(json["volumes"][0]),
+            "explained filled_by forecast free grown_by id level outside path percent samples size "
+            "used ");
+  EXPECT_EQ(keys(json["volumes"][0]["forecast"]),
+            "days days_high days_low jump per_day state window ");
+  EXPECT_EQ(keys(json["shares"][0]),
+            "allocated bytes files folders grown name other path samples unreadable volume whole ");
+  EXPECT_EQ(keys(json["quotas"][0]), "forecast level percent quota used user volume ");
+  EXPECT_TRUE(json["volumes"][0]["explained"].is_null());
+  EXPECT_EQ(json["duplicates"]["mode"], "content");
+  EXPECT_EQ(json["volumes"][0]["samples"][1], nlohmann::json({kNow + 1, 8}));
+}
+
+// It may come from elsewhere: whatever stands in it, a reader gets its own defaults or nothing.
+TEST(FactsFile, SurvivesForeignTexts) {
+  for (const char* text :
+       {"", "[]", "{}", "null", "{\"format\":2}", "{\"format\":1", "\xff", "{\"format\":\"1\"}"}) {
+    EXPECT_FALSE(report_format::facts_of(text)) << text;
+  }
+  const std::string deep(100'000, '[');
+  EXPECT_FALSE(report_format::facts_of("{\"format\":1,\"volumes\":" + deep));
+  const auto facts = report_format::facts_of(
+      "{\"format\":1,\"started\":-1.5,\"host\":7,\"volumes\":[3,{\"size\":-1,\"samples\":[[1],"
+      "[2,3],4],\"forecast\":\"x\",\"level\":\"awful\"}],\"shares\":{},\"attention\":[{\"values\":"
+      "[]}],\"reports\":null,\"quotas\":7,\"new\":{}}");
+  ASSERT_TRUE(facts);
+  EXPECT_EQ(facts->started, 0);
+  ASSERT_EQ(facts->volumes.size(), 2U);
+  EXPECT_EQ(facts->volumes[1].size, 0U);
+  EXPECT_EQ(facts->volumes[1].samples[1].used, 3U);
+  EXPECT_EQ(facts->volumes[1].level, Level::kOk);
+  for (const auto& [text, started] : std::vector<std::pair<std::string, std::optional<int64_t>>>{
+           {"{\"a\":{\"started\":5},\"started\":6,\"rest\":", 6},
+           {"{\"a\":[{\"started\":5}]}", {}},
+           {"{\"started\":\"5\",\"b\":7}", {}},
+           {"{\"started\":-5}", {}},
+           {"[\"started\",5]", {}},
+           {deep, {}}}) {
+    EXPECT_EQ(report_format::started_of(text), started) << text.substr(0, 40);
+  }
+}
+
+TEST(RunState, ReadsWhatItWrites) {
+  using namespace report_format;
+  const RunStatus status = status_of(status_text({kSuccess, "2026-11-21_04-00-02", 3}));
+  EXPECT_EQ(std::tuple(status.word, status.report, status.incidents),
+            std::tuple("success", "2026-11-21_04-00-02", 3));
+  EXPECT_EQ(status_text({kFail, "", 0}), "fail\n");
+  EXPECT_EQ(status_of("fail").word, "fail");
+  EXPECT_EQ(status_of("success\nnew = 1\nincidents = x\n").incidents, 0);
+  Progress progress{Phase::kReporting, "s\"\n\xff", 7, "large_file", 3, 9};
+  const auto read = progress_of(progress_text(progress));
+  ASSERT_TRUE(read);
+  EXPECT_EQ(std::tuple(read->phase, read->files, read->report, read->number, read->reports),
+            std::tuple(Phase::kReporting, 7U, "large_file", 3, 9));
+  for (const char* text : {"", "7", "{}", "{\"phase\":\"odd\"}", "{\"phase\":7}"}) {
+    EXPECT_FALSE(progress_of(text)) << text;
+  }
+}
+
+}  // namespace
+}  // namespace vornreport
