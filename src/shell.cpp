@@ -19,6 +19,7 @@
 
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
+#include "vornreport/report_data.hpp"
 
 namespace vornreport {
 namespace {
@@ -224,8 +225,9 @@ void run_command(const char* module, int line, const char* format, ...) {
   std::vsnprintf(command.data(), CommandText::size(), format, args);
   va_end(args);
   report_trace(module, line, "run cmd=%s\n\n", command.c_str());
-  if (const pid_t child = start_command(module, command.c_str(), kInherited); child > 0) {
-    await_command(child);
+  const pid_t child = start_command(module, command.c_str(), kInherited);
+  if (child < 0 || await_command(child) != 0) {
+    mark_report_data_lost();
   }
 }
 

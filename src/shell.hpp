@@ -10,8 +10,8 @@ namespace vornreport {
 
 // Formats a command (cut at 4095 bytes: a cut one ends inside a quoted word, which the shell
 // refuses), traces "run cmd=..." with the stable `line` and runs it with /bin/sh as system(3) does,
-// waiting for its end; the standard streams are flushed first. The exit status is not looked at:
-// what a command should have left behind is judged by the finished page.
+// waiting for its end; the standard streams are flushed first. One that failed or couldn't be
+// started prints nothing here and skips no later step, but the run's data counts as lost.
 [[gnu::format(printf, 3, 4)]] void run_command(const char* module, int line, const char* format,
                                                ...);
 

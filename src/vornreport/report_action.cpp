@@ -79,15 +79,9 @@ bool load_volumes_and_shares(LookUps& look_ups) {
 
 // Without quotas on any volume there is nothing to report, which the page says by itself; a volume
 // that has them has had its own incident.
-void tell_failed_report(const char* name) {
-  const bool is_empty_quota = std::string_view(name) == report_format::kQuotaUsage.name &&
-                              run_facts().rows.contains(name) && !report_data_lost();
-  if (!is_empty_quota) {
-    run_facts().failed.insert(name);
-    record_incident("report_failed", name,
-                    std::string("the report ") + name + " failed; the log says why",
-                    AlreadyLogged::kYes);
-  }
+bool found_no_quotas(std::string_view name) {
+  return name == report_format::kQuotaUsage.name && run_facts().quotas &&
+         run_facts().quotas->users().empty() && !report_data_lost();
 }
 
 // The names of those who own files, as far as they may be told.
@@ -127,7 +121,7 @@ int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
     report_trace(kDriverModule, 280, "##### inject report=%s\n\n", entry.name);
     progress_report(entry.name);
     // One failing report does not stop the others; it has logged why.
-    if (entry.report(&args) < 0) {
+    if (entry.report(&args) < 0 && !found_no_quotas(entry.name)) {
       tell_failed_report(entry.name);
     }
   }
@@ -146,12 +140,13 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
   if (!report_data_lost()) {
     close_facts(profile_hash, data_path.c_str());
   }
-  if (report_data_lost() || build_report_html(profile, profile_hash, data_path.c_str()) < 1) {
+  const int sections = build_report_html(profile, profile_hash, data_path.c_str());
+  if (report_data_lost() || sections < 1) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 366, "create template failed");
     VornQazReportCleanTmp(profile, profile_hash);
     return -1;
   }
-  if (correct_report_dir(profile, profile_hash) < 0) {
+  if (correct_report_dir(profile, profile_hash) < 0 || report_data_lost()) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 370, "correct dir failed");
     VornQazReportCleanTmp(profile, profile_hash);
     return -1;

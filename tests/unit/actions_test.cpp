@@ -240,7 +240,29 @@ TEST_F(ActionsTest, LostDataNeverBecomesAPage) {
                : 1;
   });
   EXPECT_EQ(support::wait_child(child), 0);
-  EXPECT_FALSE(support::exists(folder_.path("date/report.html")));
+  EXPECT_FALSE(support::exists(folder_.path("it's final")));
+}
+
+// A call of the script that fails, whichever, prints nothing and skips nothing; but what it should
+// have written is missing.
+TEST_F(ActionsTest, AFailedCommandLosesTheRunsData) {
+  for (const std::string word : {"header", "lang", "body", "tail", "mv"}) {
+    const pid_t child = support::fork_child([&] {
+      support::write_file(
+          kScript, "#!/bin/sh\n[ \"$1\" != " + word + " ] || exit 1\necho \"$1 $3\" >> \"$2\"\n");
+      chmod(kScript, 0755);
+      if (word == "mv") {
+        platform.real_paths["real_path_date_final"] = folder_.path("no/such/folder");
+      }
+      const int result = run(report_action, {"p1"});
+      const char* told = word == "mv" ? "correct dir failed" : "create template failed";
+      return result == -1 && output_.find(told) != std::string::npos &&
+                     output_.find("/bin/cp -rfp") != std::string::npos
+                 ? 0
+                 : 1;
+    });
+    EXPECT_EQ(support::wait_child(child), 0) << word;
+  }
 }
 
 TEST_F(ActionsTest, CollectCountsTheSelectedReports) {
