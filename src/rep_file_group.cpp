@@ -75,7 +75,8 @@ bool open_report(const ReportArgs& args, GroupReport& report) {
     return false;
   }
   report.csv_path.format("%s/%s.csv", csv_dir, report_format::kFileGroup.name);
-  report.csv = open_report_file(report.csv_path.c_str(), "w+", kModule, __LINE__);
+  report.csv = open_report_file(report.csv_path.c_str(), "w+", kModule, __LINE__, LogForm::kNested,
+                                Costs::kReport);
   if (!report.csv) {
     return false;
   }
@@ -213,8 +214,9 @@ int32_t file_group_db(ReportArgs* args) {
   bool done = open_report(*args, report) && write_sections(report, args->profile_hash);
   done = close_report_file(std::move(report.data), report.data_path.c_str(), kModule, __LINE__) &&
          done;
-  done =
-      close_report_file(std::move(report.csv), report.csv_path.c_str(), kModule, __LINE__) && done;
+  done = close_report_file(std::move(report.csv), report.csv_path.c_str(), kModule, __LINE__,
+                           Costs::kReport) &&
+         done;
   std::fflush(nullptr);
   if (done) {
     VornQazCsvFile(report.csv_path.c_str());

@@ -229,7 +229,8 @@ int32_t VolumeUsageWriteCsv(const char* profile, const VLIBCSzHash* profileHash,
   }
   PathText path;
   path.format("%s/%s.csv", csv_dir, report_format::kVolumeUsage.name);
-  FileHandle csv = open_report_file(path.c_str(), "w+", kModule, __LINE__, LogForm::kSimple);
+  FileHandle csv =
+      open_report_file(path.c_str(), "w+", kModule, __LINE__, LogForm::kSimple, Costs::kReport);
   if (!csv) {
     return -1;
   }
@@ -243,7 +244,8 @@ int32_t VolumeUsageWriteCsv(const char* profile, const VLIBCSzHash* profileHash,
     std::fprintf(csv.get(), "\"%s\", \"%llu\" ,\"%s%%\", \"%s\"\n", node.name.c_str(), size,
                  now.percent.c_str(), days.c_str());
   }
-  const bool kept = close_report_file(std::move(csv), path.c_str(), kModule, __LINE__);
+  const bool kept =
+      close_report_file(std::move(csv), path.c_str(), kModule, __LINE__, Costs::kReport);
   std::fflush(nullptr);
   if (!kept) {
     return -1;
@@ -294,7 +296,9 @@ int32_t volume_usage(ReportArgs* args) {
   if (with_history) {
     VolumeUsageWriteHistory(profile, args->profile_hash, volumes.head);
   }
-  VolumeUsageWriteCsv(profile, args->profile_hash, volumes.head);
+  if (VolumeUsageWriteCsv(profile, args->profile_hash, volumes.head) < 0) {
+    tell_failed_report(report_format::kVolumeUsage.name);  // which the result doesn't say
+  }
   return 0;
 }
 

@@ -12,6 +12,12 @@ namespace {
 
 bool g_data_lost = false;
 
+void lose(Costs costs) {
+  if (costs == Costs::kRun) {
+    mark_report_data_lost();
+  }
+}
+
 }  // namespace
 
 PathText report_data_path() {
@@ -21,7 +27,7 @@ PathText report_data_path() {
 }
 
 FileHandle open_report_file(const char* path, const char* mode, const char* module, int line,
-                            LogForm form) {
+                            LogForm form, Costs costs) {
   FileHandle file(std::fopen(path, mode));
   if (!file) {
     if (form == LogForm::kNested) {
@@ -29,12 +35,13 @@ FileHandle open_report_file(const char* path, const char* mode, const char* modu
     } else {
       REPORT_LOG_ERR(module, line, "open file=%s failed\n", path);
     }
-    mark_report_data_lost();
+    lose(costs);
   }
   return file;
 }
 
-bool close_report_file(FileHandle file, const char* path, const char* module, int line) {
+bool close_report_file(FileHandle file, const char* path, const char* module, int line,
+                       Costs costs) {
   if (!file) {
     return true;
   }
@@ -48,7 +55,7 @@ bool close_report_file(FileHandle file, const char* path, const char* module, in
     errno = error;  // what the close says after a failed write is beside the point
   }
   REPORT_LOG_ERR_NESTED(module, line, "write file=%s failed, the report would be incomplete", path);
-  mark_report_data_lost();
+  lose(costs);
   return false;
 }
 
@@ -64,7 +71,7 @@ bool is_storage_failure(int result) {
   const int primary = result & 0xFF;
   return primary == SQLITE_FULL || primary == SQLITE_IOERR || primary == SQLITE_CORRUPT ||
          primary == SQLITE_READONLY || primary == SQLITE_CANTOPEN || primary == SQLITE_NOTADB ||
-         primary == SQLITE_NOMEM;
+         primary == SQLITE_NOMEM || primary == SQLITE_BUSY || primary == SQLITE_LOCKED;
 }
 
 }  // namespace vornreport

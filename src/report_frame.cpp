@@ -149,7 +149,8 @@ bool open_files(const StatisticsReport& report, const ReportArgs& args, ReportFi
     return false;
   }
   files.csv_path.format("%s/%s.csv", csv_dir, report.format.name);
-  files.csv = open_report_file(files.csv_path.c_str(), "a", report.module, __LINE__);
+  files.csv = open_report_file(files.csv_path.c_str(), "a", report.module, __LINE__,
+                               LogForm::kNested, Costs::kReport);
   return files.csv != nullptr;
 }
 
@@ -288,8 +289,8 @@ int32_t run_statistics_report(const StatisticsReport& report, const ReportArgs* 
   db.reset();
   const bool data_kept =
       close_report_file(std::move(files.data), files.data_path.c_str(), report.module, __LINE__);
-  const bool csv_kept =
-      close_report_file(std::move(files.csv), files.csv_path.c_str(), report.module, __LINE__);
+  const bool csv_kept = close_report_file(std::move(files.csv), files.csv_path.c_str(),
+                                          report.module, __LINE__, Costs::kReport);
   std::fflush(nullptr);
   if (!data_kept || !csv_kept) {
     return -1;

@@ -14,16 +14,20 @@ namespace vornreport {
 // The data file's path for this process.
 PathText report_data_path();
 
-// Opens a file for appending or writing and logs "open file=%s failed" at `module`
-// and `line` when that fails. The run's data counts as lost then: the run has made the file's
-// folder itself.
+// What a file that can't be opened or written costs: the whole run, whose page would lack a part,
+// or the one report whose CSV file it is.
+enum class Costs : uint8_t { kRun, kReport };
+
+// Opens a file for appending or writing and logs "open file=%s failed" at `module` and `line` when
+// that fails.
 enum class LogForm : uint8_t { kSimple, kNested };
 FileHandle open_report_file(const char* path, const char* mode, const char* module, int line,
-                            LogForm form = LogForm::kNested);
+                            LogForm form = LogForm::kNested, Costs costs = Costs::kRun);
 
-// Closes a file that rows went to. When a write or the close failed (a full disk), logs it, marks
-// the run's data as lost and returns false. An empty handle is fine.
-bool close_report_file(FileHandle file, const char* path, const char* module, int line);
+// Closes a file that rows went to. When a write or the close failed (a full disk), logs it and
+// returns false. An empty handle is fine.
+bool close_report_file(FileHandle file, const char* path, const char* module, int line,
+                       Costs costs = Costs::kRun);
 
 // Reports run on after one of them lost data, but a page made from what is left must never look
 // complete: the report action asks here before it assembles one. Never reset; a process makes one
@@ -31,8 +35,8 @@ bool close_report_file(FileHandle file, const char* path, const char* module, in
 void mark_report_data_lost();
 bool report_data_lost();
 
-// Whether a failed SQLite call means that data was lost (full disk, I/O error, no memory), rather
-// than that one statement was wrong. `result` is the call's result code.
+// Whether a failed SQLite call means that data was lost (full disk, I/O error, no memory, a lock
+// that others keep), rather than that one statement was wrong. `result` is the call's result code.
 bool is_storage_failure(int result);
 
 }  // namespace vornreport

@@ -96,6 +96,13 @@ void record_incident(const char* kind, const std::string& what, const std::strin
   }
 }
 
+void tell_failed_report(const char* name) {
+  run_facts().failed.insert(name);
+  record_incident("report_failed", name,
+                  std::string("the report ") + name + " failed; the log says why",
+                  AlreadyLogged::kYes);
+}
+
 void listen_for_incidents() {
   VornQazSetIncidentSink([](const char* kind, const char* what, const char* text) {
     record_incident(kind, what, text, AlreadyLogged::kYes);

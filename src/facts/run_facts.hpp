@@ -81,6 +81,9 @@ enum class AlreadyLogged : bool { kNo, kYes };
 void record_incident(const char* kind, const std::string& what, const std::string& text,
                      AlreadyLogged logged = AlreadyLogged::kNo);
 
+// Records that a report failed; it has logged why.
+void tell_failed_report(const char* name);
+
 // From now on what the platform notices is recorded too.
 void listen_for_incidents();
 

@@ -212,8 +212,10 @@ int write_csv_groups(const VLIBCSzHash* profile_hash, const QAZLLNode* groups, G
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "get csv dir failed");
   } else {
     path.format("%s/%s.csv", csv_dir, report_format::kDuplicateFile.name);
-    csv = open_report_file(path.c_str(), "a", kDuplicateModule, __LINE__, LogForm::kSimple);
+    csv = open_report_file(path.c_str(), "a", kDuplicateModule, __LINE__, LogForm::kSimple,
+                           Costs::kReport);
   }
+  const bool opened = csv != nullptr;
   if (csv && groups == nullptr) {
     if (close == GroupsAre::kContinued) {
       REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
@@ -230,7 +232,12 @@ int write_csv_groups(const VLIBCSzHash* profile_hash, const QAZLLNode* groups, G
     }
     result = 0;
   }
-  if (!close_report_file(std::move(csv), path.c_str(), kDuplicateModule, __LINE__)) {
+  const bool kept =
+      close_report_file(std::move(csv), path.c_str(), kDuplicateModule, __LINE__, Costs::kReport);
+  if (!kept || !opened) {
+    tell_failed_report(report_format::kDuplicateFile.name);
+  }
+  if (!kept) {
     return -1;
   }
   if (close == GroupsAre::kComplete && g_csv_group > 1) {
