@@ -1,5 +1,6 @@
 #include "file_gathering.hpp"
 
+#include <cerrno>
 #include <cstdio>
 #include <string>
 
@@ -8,6 +9,7 @@
 #include "facts/tallies.hpp"
 #include "index_import.hpp"
 #include "module.hpp"
+#include "share_overlap.hpp"
 #include "share_walk.hpp"
 #include "transaction.hpp"
 #include "vorn/report.h"
@@ -125,6 +127,7 @@ bool gather_share(const Gathering& gathering, const char* share, const VLIBCSzHa
   if (VORNShareFileIndexIsEnabled(share) != 0) {
     report_trace(kGatheringModule, __LINE__, "use file index db, share=%s\n", share);
     if (ReportFileIndexImport(share, path.c_str(), db, types) >= 0) {
+      note_index_share(share);
       return false;
     }
     tell_refused_index(share);
@@ -135,6 +138,22 @@ bool gather_share(const Gathering& gathering, const char* share, const VLIBCSzHa
   commit_transaction(db);
   tell_walk(*tallies().share(), found);
   return true;
+}
+
+// Where the shares lie that are going to be gathered; what is wrong with one is told at its turn.
+void note_selected_shares(const Gathering& gathering, const VLIBCSzHash* profile_hash) {
+  const int before = errno;
+  forget_share_folders();
+  const int count = VLIBCSzListCount(gathering.shares.get());
+  for (int i = 0; i < count; ++i) {
+    const char* share = VLIBCSzListGet(gathering.shares.get(), i);
+    PathText path;
+    if (!is_unset(share) && VornQazMatchShare(profile_hash, share) != 0 &&
+        VORNSharePathGet(share, path.data(), PathText::size()) >= 0) {
+      add_share_folder(share, path.c_str());
+    }
+  }
+  errno = before;
 }
 
 }  // namespace
@@ -152,6 +171,7 @@ int file_gathering(const char* profile, const VLIBCSzHash* profile_hash) {
   remember_gathered(profile_hash);
   report_trace(kGatheringModule, __LINE__, "stat start\n\n");
   std::fflush(nullptr);
+  note_selected_shares(gathering, profile_hash);
   int walked = 0;
   const int count = VLIBCSzListCount(gathering.shares.get());
   for (int i = 0; i < count && !report_data_lost(); ++i) {

@@ -13,9 +13,11 @@
 #include <cerrno>
 #include <cstring>
 #include <string_view>
+#include <utility>
 
 #include "facts/tallies.hpp"
 #include "module.hpp"
+#include "share_overlap.hpp"
 #include "vorn/share.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
@@ -57,55 +59,105 @@ class Walk {
       not_walked();
       return 0;
     }
-    return read_folder(open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC), top_length_,
-                       status.st_dev);
+    DirHandle opened = open_folder(open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!opened) {
+      return open_failed();
+    }
+    // Replaced between the look and the open: its kind was not the one that was judged.
+    struct stat now {};
+    if (fstat(dirfd(opened.get()), &now) != 0) {
+      return stat_failed();
+    }
+    if (now.st_dev != status.st_dev) {
+      errno = ESTALE;
+      return stat_failed();
+    }
+    note_overlap(now);
+    return read_folder(std::move(opened), top_length_, now.st_dev);
   }
 
  private:
   // A folder at path_ (`length` bytes), the entry `name` of its parent.
   int subfolder(int parent, const char* name, size_t length, dev_t parent_device) {
-    struct stat status {};
     if (cut_) {
       errno = ENAMETOOLONG;
       return stat_failed();
     }
+    // Once more when another file system stands there than the one that was judged: a folder that
+    // is mounted on demand is only mounted by the first look into it.
+    Opened opened = open_subfolder(parent, name, parent_device);
+    if (opened.result == Look::kReplaced) {
+      opened = open_subfolder(parent, name, parent_device);
+    }
+    switch (opened.result) {
+      case Look::kNotWalked:
+        return 0;
+      case Look::kOpened:
+        return read_folder(std::move(opened.folder), length, opened.device);
+      case Look::kUnreadable:
+        return open_failed();
+      case Look::kReplaced:
+        errno = ESTALE;
+        break;
+      case Look::kUnknown:
+        break;
+    }
+    return stat_failed();
+  }
+
+  enum class Look : uint8_t { kOpened, kNotWalked, kReplaced, kUnreadable, kUnknown };
+  struct Opened {
+    Look result;
+    DirHandle folder;
+    dev_t device = 0;
+  };
+
+  // Looks at a folder, judges its file system and opens it; errno says why it isn't open.
+  Opened open_subfolder(int parent, const char* name, dev_t parent_device) {
+    struct stat status {};
     if (fstatat(parent, name, &status, kNoFollow) != 0) {
-      return stat_failed();
+      return {Look::kUnknown, nullptr};
     }
     if (!S_ISDIR(status.st_mode)) {
       errno = ENOTDIR;
-      return stat_failed();
+      return {Look::kUnknown, nullptr};
     }
     // One device is one file system, so its kind is known from the parent.
     if (status.st_dev != parent_device && !is_walked_kind(VORNGetFSType(path_.c_str(), 0))) {
-      return 0;
+      return {Look::kNotWalked, nullptr};
     }
-    return read_folder(openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC),
-                       length, status.st_dev);
+    DirHandle folder =
+        open_folder(openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (!folder) {
+      return {Look::kUnreadable, nullptr};
+    }
+    struct stat opened {};
+    if (fstat(dirfd(folder.get()), &opened) != 0) {
+      return {Look::kUnknown, nullptr};
+    }
+    if (opened.st_dev != status.st_dev) {
+      return {Look::kReplaced, nullptr};
+    }
+    note_overlap(opened);
+    return {Look::kOpened, std::move(folder), opened.st_dev};
   }
 
   // Takes over `fd`, which is negative when the open failed.
-  int read_folder(int fd, size_t length, dev_t device) {
-    const DirHandle folder(fd < 0 ? nullptr : fdopendir(fd));
-    if (!folder) {
-      const int failed = open_failed();
-      if (fd >= 0) {
-        close(fd);
-      }
-      return failed;
+  static DirHandle open_folder(int fd) {
+    DirHandle folder(fd < 0 ? nullptr : fdopendir(fd));
+    if (!folder && fd >= 0) {
+      const int error = errno;
+      close(fd);
+      errno = error;
     }
-    struct stat opened {};
-    // Replaced between the look and the open: its kind was not the one that was judged.
-    if (fstat(fd, &opened) != 0) {
-      return stat_failed();
-    }
-    if (opened.st_dev != device) {
-      errno = ESTALE;
-      return stat_failed();
-    }
+    return folder;
+  }
+
+  int read_folder(DirHandle folder, size_t length, dev_t device) {
     if (length > top_length_ && tally_ != nullptr) {
       tally_->folder();
     }
+    const int fd = dirfd(folder.get());
     int error = 0;
     while (const dirent* entry = next_entry(folder.get(), error)) {
       add_entry(fd, *entry, length, device);
@@ -118,6 +170,12 @@ class Walk {
       }
     }
     return error == 0 ? 0 : open_failed();
+  }
+
+  void note_overlap(const struct stat& folder) {
+    if (tally_ != nullptr) {
+      note_share_folder(folder.st_dev, folder.st_ino, share_);
+    }
   }
 
   // Null at the end of the folder with `error` 0, or when it can't be read on, with errno and

@@ -31,25 +31,32 @@ struct GatheredDatabase {
 };
 GatheredDatabase g_gathered;
 
+// Somebody who reads the database for a moment must not cost a share.
+constexpr int kLockWaitMs = 10'000;
+
 constexpr size_t kQuotedSize = 4096;
 constexpr size_t kStatementSize = 8192;
 using QuotedText = std::array<char, kQuotedSize>;
 
-// `text` quoted as SQLite's "%q" does it; null when it doesn't fit. A text cut between the two
-// halves of a doubled quote would end its literal early and let a file name speak SQL.
+// `text` with its quotes doubled, as SQLite's "%q" does it, cut where the buffer ends; but never
+// between the two halves of a doubled quote: the one left would end its literal early and let a
+// file name speak SQL. ("%q" itself gives an empty text there.)
 const char* quote(const char* text, QuotedText& buffer) {
-  if (text == nullptr) {
-    return "";
-  }
-  const std::string_view whole(text);
-  const auto quotes = static_cast<size_t>(std::count(whole.begin(), whole.end(), '\''));
-  if (whole.size() + quotes >= buffer.size()) {
-    return nullptr;
-  }
-  if (quotes == 0) {
+  if (std::strchr(text, '\'') == nullptr && std::strlen(text) < buffer.size()) {
     return text;
   }
-  return sqlite3_snprintf(static_cast<int>(buffer.size()), buffer.data(), "%q", text);
+  size_t end = 0;
+  for (; *text != '\0'; ++text) {
+    const size_t taken = *text == '\'' ? 2 : 1;
+    if (end + taken >= buffer.size()) {
+      break;
+    }
+    buffer[end] = *text;
+    buffer[end + taken - 1] = *text;
+    end += taken;
+  }
+  buffer[end] = '\0';
+  return buffer.data();
 }
 
 // The INSERT statement of one file, as snprintf would write it, cut at the same byte; put together
@@ -135,6 +142,43 @@ void check_gathered_database(const char* path) {
   }
 }
 
+// SQLite's own sum() fails a whole query when sparse files of exbibytes exceed 64 bits. This one
+// stays at the greatest number; of no number at all it is NULL, as SQLite's.
+struct Sum {
+  sqlite3_int64 value;
+  bool has_values;
+};
+
+void add_to_sum(sqlite3_context* context, int /*count*/, sqlite3_value** values) {
+  auto* sum = static_cast<Sum*>(sqlite3_aggregate_context(context, sizeof(Sum)));
+  if (sum == nullptr) {
+    sqlite3_result_error_nomem(context);
+    return;
+  }
+  if (sqlite3_value_type(values[0]) == SQLITE_NULL) {
+    return;
+  }
+  sum->has_values = true;
+  const sqlite3_int64 value = sqlite3_value_int64(values[0]);
+  if (__builtin_add_overflow(sum->value, value, &sum->value)) {
+    sum->value = value < 0 ? INT64_MIN : INT64_MAX;
+  }
+}
+
+void end_sum(sqlite3_context* context) {
+  const auto* sum = static_cast<const Sum*>(sqlite3_aggregate_context(context, 0));
+  if (sum != nullptr && sum->has_values) {
+    sqlite3_result_int64(context, sum->value);
+  } else {
+    sqlite3_result_null(context);
+  }
+}
+
+int define_sum(sqlite3* db) {
+  return sqlite3_create_function_v2(db, "sum", 1, SQLITE_UTF8 | SQLITE_DETERMINISTIC, nullptr,
+                                    nullptr, add_to_sum, end_sum, nullptr);
+}
+
 void log_exec_failure(const char* sql, const char* message) {
   REPORT_LOG_ERR(kGatheringModule, __LINE__, "Exec sql:[%s] error: %s\n\n", sql,
                  message != nullptr ? message : "");
@@ -163,6 +207,11 @@ SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash) {
     if (is_storage_failure(opened)) {
       mark_report_data_lost();
     }
+    return nullptr;
+  }
+  sqlite3_busy_timeout(raw, kLockWaitMs);
+  if (define_sum(raw) != SQLITE_OK) {
+    mark_report_data_lost();
     return nullptr;
   }
   check_gathered_database(path);
@@ -202,12 +251,10 @@ int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo) {
   static QuotedText type_buffer;
   static InsertStatement statement;
   const char* path = quote(pFileInfo->szPath, path_buffer);
-  const char* name = quote(pFileInfo->szName, name_buffer);
-  const char* type = quote(pFileInfo->szType, type_buffer);
-  if (path == nullptr || name == nullptr || type == nullptr) {
-    log_exec_failure("INSERT INTO file_stat", sqlite3_errstr(SQLITE_TOOBIG));
-    return -1;
-  }
+  // An index may lack a name, which shows as "%q" shows it.
+  const char* name =
+      pFileInfo->szName != nullptr ? quote(pFileInfo->szName, name_buffer) : "(NULL)";
+  const char* type = pFileInfo->szType != nullptr ? quote(pFileInfo->szType, type_buffer) : "";
   // One longer than its buffer is cut inside a literal, and SQLite refuses it.
   const char* sql = statement.make(*pFileInfo, path, name, type);
   VornQazSetEnv();

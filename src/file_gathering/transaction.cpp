@@ -1,6 +1,7 @@
 #include "transaction.hpp"
 
 #include "module.hpp"
+#include "vorn/report.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
@@ -8,6 +9,7 @@
 namespace vornreport {
 
 void begin_transaction(sqlite3* db) {
+  VornQazSetEnv();
   char* message = nullptr;
   sqlite3_exec(db, "BEGIN TRANSACTION", nullptr, nullptr, &message);
   const SqliteText owned(message);
@@ -17,6 +19,7 @@ void begin_transaction(sqlite3* db) {
 }
 
 void commit_transaction(sqlite3* db) {
+  VornQazSetEnv();
   char* message = nullptr;
   const int result = sqlite3_exec(db, "COMMIT TRANSACTION", nullptr, nullptr, &message);
   const SqliteText owned(message);

@@ -13,6 +13,7 @@
 #include <new>
 #include <string_view>
 #include <unordered_set>
+#include <vector>
 
 #include "below_share.hpp"
 #include "module.hpp"
@@ -61,28 +62,50 @@ void log_open_failure(const dup_file_node& file) {
   }
 }
 
+bool is_regular(int file) {
+  struct stat status {};
+  if (fstat(file, &status) != 0) {
+    return false;
+  }
+  if (!S_ISREG(status.st_mode)) {
+    errno = ESTALE;  // it was when it was gathered
+    return false;
+  }
+  return true;
+}
+
+enum class Try { kFirst, kLast };
+
 // The sample's bytes, zeros where there are none. Read, not mapped: a file that shrinks meanwhile
-// must not end the process.
-void read_sample(const dup_file_node& file, std::array<char, kSampleSize>& sample) {
+// must not end the process. False, silent, at a first try when somebody holds a lease on the file,
+// who gives it up within a moment.
+bool read_sample(const dup_file_node& file, std::array<char, kSampleSize>& sample, Try which) {
   const uint64_t length = std::min(file.size, kSampleSize);
   const uint64_t offset = file.size <= kSampleSize ? 0 : file.size / 2 / kSampleSize * kSampleSize;
   sample.fill(0);
   // Doesn't wait for the writer of a fifo.
+  const int before = errno;
   const Descriptor opened(
       open_below_share(file.share_folder, file.path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY));
+  if (opened.get() < 0 && errno == EWOULDBLOCK && which == Try::kFirst) {
+    errno = before;
+    return false;
+  }
   if (opened.get() < 0) {
     log_open_failure(file);
-    return;
-  }
-  struct stat status {};
-  errno = ESTALE;  // for what is no regular file any more
-  if (fstat(opened.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
-      pread(opened.get(), sample.data(), length, static_cast<off_t>(offset)) < 0) {
+  } else if (!is_regular(opened.get()) ||
+             pread(opened.get(), sample.data(), length, static_cast<off_t>(offset)) < 0) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__,
                           "map file failed, file=%s, nSeg=%llu, offset=%llu", file.path.c_str(),
                           static_cast<unsigned long long>(length),
                           static_cast<unsigned long long>(offset));
   }
+  return true;
+}
+
+void digest_sample(dup_file_node& file, const std::array<char, kSampleSize>& sample) {
+  const XXH128_hash_t digest = XXH3_128bits(sample.data(), sample.size());
+  file.sample = {digest.high64, digest.low64};
 }
 
 // False, reported, when the file's digest can't be had.
@@ -151,11 +174,18 @@ int read_fast_digests(const QAZLLNode* candidates) {
     return 0;
   }
   static std::array<char, kSampleSize> sample;
+  std::vector<dup_file_node*> leased;
   for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
     dup_file_node& file = *file_of(node);
-    read_sample(file, sample);
-    const XXH128_hash_t digest = XXH3_128bits(sample.data(), sample.size());
-    file.sample = {digest.high64, digest.low64};
+    if (read_sample(file, sample, Try::kFirst)) {
+      digest_sample(file, sample);
+    } else {
+      leased.push_back(&file);
+    }
+  }
+  for (dup_file_node* file : leased) {
+    read_sample(*file, sample, Try::kLast);
+    digest_sample(*file, sample);
   }
   return 0;
 }

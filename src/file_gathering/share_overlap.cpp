@@ -1,0 +1,74 @@
+#include "share_overlap.hpp"
+
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <climits>
+#include <cstdlib>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "facts/run_facts.hpp"
+
+namespace vornreport {
+namespace {
+
+struct ShareFolder {
+  std::string share;
+  dev_t device;
+  ino_t inode;
+  std::string real_path;
+};
+std::vector<ShareFolder> g_folders;
+
+void tell(const std::string& one, const std::string& two) {
+  const auto& [first, second] = std::minmax(one, two);
+  record_incident(
+      "share_overlap", first + ", " + second,
+      "shares " + first + " and " + second +
+          " hold the same files, so sums over shares count them twice; leave one of them "
+          "out with share_list");
+}
+
+bool lies_in(const std::string& path, const std::string& folder) {
+  return path == folder || path.starts_with(folder.ends_with('/') ? folder : folder + "/");
+}
+
+}  // namespace
+
+void forget_share_folders() {
+  g_folders.clear();
+}
+
+void add_share_folder(const char* share, const char* path) {
+  struct stat status {};
+  const std::unique_ptr<char, decltype(&std::free)> real(realpath(path, nullptr), &std::free);
+  if (real && stat(real.get(), &status) == 0) {
+    g_folders.push_back({share, status.st_dev, status.st_ino, real.get()});
+  }
+}
+
+void note_share_folder(dev_t device, ino_t inode, const char* share) {
+  for (const ShareFolder& folder : g_folders) {
+    if (folder.inode == inode && folder.device == device && folder.share != share) {
+      tell(share, folder.share);
+    }
+  }
+}
+
+void note_index_share(const char* share) {
+  const auto own = std::find_if(g_folders.begin(), g_folders.end(),
+                                [&](const ShareFolder& folder) { return folder.share == share; });
+  if (own == g_folders.end()) {
+    return;
+  }
+  for (const ShareFolder& other : g_folders) {
+    if (&other != &*own &&
+        (lies_in(other.real_path, own->real_path) || lies_in(own->real_path, other.real_path))) {
+      tell(share, other.share);
+    }
+  }
+}
+
+}  // namespace vornreport

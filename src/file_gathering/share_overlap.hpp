@@ -1,0 +1,18 @@
+// Shares that hold the same files: one folder twice, one inside the other, through bind mounts and
+// links. Sums over shares count such files twice, so it is an incident.
+#pragma once
+
+#include <sys/types.h>
+
+namespace vornreport {
+
+// Forgets all folders.
+void forget_share_folders();
+// Notes the top folder of a share that is about to be gathered.
+void add_share_folder(const char* share, const char* path);
+// The walk of `share` is in the folder (device, inode): tells when it is another share's top.
+void note_share_folder(dev_t device, ino_t inode, const char* share);
+// Tells of those whose files come from an index, which no walk passes, by their real paths.
+void note_index_share(const char* share);
+
+}  // namespace vornreport
