@@ -5,7 +5,7 @@
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
-#include <cstdlib>
+#include <cstring>
 #include <string>
 
 #include "vorn/text.h"
@@ -13,15 +13,82 @@
 namespace vornreport {
 namespace {
 
-[[gnu::format(printf, 1, 0)]] std::string format_text(const char* format, va_list args) {
-  char* text = nullptr;
-  const int length = vasprintf(&text, format, args);
-  if (length < 0) {
-    return format;
+bool is_control(unsigned char byte) {
+  constexpr unsigned char kDelete = 0x7F;
+  return byte < ' ' || byte == kDelete;
+}
+
+// `text` with its control characters as \x0a, so that no name from disk can end a line and forge
+// the next, or speak to a terminal. (Those above ASCII are two bytes in UTF-8, the first of them
+// C2.)
+void append_visible(std::string& out, const char* text) {
+  constexpr unsigned char kLead = 0xC2;
+  constexpr unsigned char kFirstAbove = 0xA0;
+  for (const char* c = text != nullptr ? text : "(null)"; *c != '\0'; ++c) {
+    const auto byte = static_cast<unsigned char>(*c);
+    const auto next = static_cast<unsigned char>(c[1]);
+    const bool is_pair = byte == kLead && next >= 0x80 && next < kFirstAbove;
+    if (!is_pair && !is_control(byte)) {
+      out += *c;
+      continue;
+    }
+    char escape[16];
+    std::snprintf(escape, sizeof escape, is_pair ? "\\x%02x\\x%02x" : "\\x%02x", byte, next);
+    out += escape;
+    c += is_pair ? 1 : 0;
   }
-  std::string result(text, static_cast<size_t>(length));
-  std::free(text);  // NOLINT(cppcoreguidelines-no-malloc): vasprintf's
-  return result;
+}
+
+// One conversion, as printf does it.
+template <typename Value>
+void append_value(std::string& out, const std::string& conversion, Value value) {
+  char text[512];  // the longest number is that of %f: 309 digits, a point, and six more
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wformat-nonliteral"  // a piece of a checked format
+  std::snprintf(text, sizeof text, conversion.c_str(), value);
+#pragma GCC diagnostic pop
+  out += text;
+}
+
+// As vsnprintf, but texts of %s come out visible. Knows the conversions that messages have: s, d,
+// u, X, f, the lengths ll and z, and m.
+[[gnu::format(printf, 1, 0)]] std::string format_text(const char* format, va_list args) {
+  const int error = errno;
+  std::string out;
+  while (*format != '\0') {
+    if (*format != '%') {
+      out += *format++;
+      continue;
+    }
+    const size_t length = std::strcspn(format + 1, "sduXfm%") + 2;
+    const std::string conversion(format, length);
+    format += length;
+    const bool is_long =
+        conversion.find("ll") != std::string::npos || conversion.find('z') != std::string::npos;
+    switch (conversion.back()) {
+      case 's':
+        append_visible(out, va_arg(args, const char*));
+        break;
+      case 'm':
+        out += std::strerror(error);
+        break;
+      case 'f':
+        append_value(out, conversion, va_arg(args, double));
+        break;
+      case '%':
+        out += '%';
+        break;
+      default:
+        if (is_long) {
+          append_value(out, conversion, va_arg(args, unsigned long long));
+        } else {
+          append_value(out, conversion, va_arg(args, unsigned));
+        }
+        break;
+    }
+  }
+  errno = error;
+  return out;
 }
 
 // The one place that builds the two channels. syslog() and printf() may change errno, and the
@@ -66,12 +133,11 @@ void REPORT_LOG_ERR_NESTED(const char* module, int line, const char* format, ...
 }
 
 void report_trace(const char* module, int line, const char* format, ...) {
-  std::printf("(%s:%d)", module, line);
   va_list args;
   va_start(args, format);
-  // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized): it is, one line above
-  std::vprintf(format, args);
+  const std::string text = format_text(format, args);
   va_end(args);
+  std::printf("(%s:%d)%s", module, line, text.c_str());
 }
 
 void report_invalid_argument(const char* module, int line, const char* condition) {

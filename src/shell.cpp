@@ -85,16 +85,21 @@ int spawn_shell(const char* command, int output, const sigset_t* mask, pid_t* ch
 pid_t start_command(const char* module, const char* command, int output) {
   std::fflush(nullptr);
   pid_t child = 0;
-  const SigtermBlocked blocked;
-  if (const int error = spawn_shell(command, output, blocked.mask_before(), &child); error != 0) {
-    const int before = errno;
-    errno = error;
-    REPORT_LOG_ERR(module, __LINE__, "cannot start /bin/sh, cmd=%s\n", command);
-    errno = before;
-    return -1;
+  int error = 0;
+  {
+    const SigtermBlocked blocked;
+    error = spawn_shell(command, output, blocked.mask_before(), &child);
+    if (error == 0) {
+      g_command_group = child;
+      return child;
+    }
   }
-  g_command_group = child;
-  return child;
+  // Not with SIGTERM blocked: a full log that nobody reads would keep both waiting for ever.
+  const int before = errno;
+  errno = error;
+  REPORT_LOG_ERR(module, __LINE__, "cannot start /bin/sh, cmd=%s\n", command);
+  errno = before;
+  return -1;
 }
 
 // Waits for the end of a started command. Its exit status as the shell gives it.
