@@ -139,6 +139,24 @@ TEST_F(Config, TwoWritersLoseNothing) {
   EXPECT_EQ(std::distance(begin(names), end(names)), 2);  // file and lock, nothing temporary
 }
 
+// Who writes back what it has read means its own changes: those of others in between stay.
+TEST_F(Config, WritingBackKeepsWhatOthersHaveChanged) {
+  const std::string before = "[p]\na = 1\nb = 1\nc = 1\nd = 1\n";
+  write_file(file, before);
+  const support::Hash owner = support::make_hash();
+  VLIBCSzHash* hash = owner.get();
+  ASSERT_EQ(VLIBCFileGetSection(file.c_str(), "p", &hash), 4);
+  hash->remove("a");
+  hash->set("b", "mine");
+  hash->set("new", "mine");
+  write_file(file, "[p]\na = other\nb = other\nc = other\nmore = other\n");  // d is gone
+  EXPECT_EQ(VLIBCFileSetSection(file.c_str(), "p", nullptr, hash, kFormat), 0);
+  EXPECT_EQ(read_file(file), "[p]\n\tb = mine\n\tc = other\n\tmore = other\n\tnew = mine\n");
+  write_file(file, "[q]\nx = 1\n");  // another section gets exactly the entries
+  EXPECT_EQ(VLIBCFileSetSection(file.c_str(), "q", nullptr, hash, kFormat), 0);
+  EXPECT_EQ(read_file(file), "[q]\n\tb = mine\n\tc = 1\n\td = 1\n\tnew = mine\n");
+}
+
 TEST_F(Config, EditsKeepWhatTheyAreNotAbout) {
   using Kind = host::SectionEdit::Kind;
   constexpr const char* kBoth = "# top\n\n# of a\n[a]\n x = 1\n# in a\ny=2\n\n# of b\n[b]\nz=3\n";

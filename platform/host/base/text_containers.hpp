@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <deque>
 #include <functional>
+#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -47,6 +48,15 @@ struct VLIBCSzHash {
   void set(std::string_view key, std::string_view value);
   bool remove(std::string_view key);
   std::vector<Entry> sorted() const;
+
+  // The section of a file that the entries were read from, as it was then: who writes them back
+  // means what is different from it.
+  struct Origin {
+    std::string file;
+    std::string section;
+    std::map<std::string, std::string, std::less<>> entries;
+  };
+  std::optional<Origin> origin;
 
   // Both the answers and the failures of `resolver` are kept for the life of the hash.
   void resolve_with(host::Resolver resolver) { resolver_ = std::move(resolver); }
