@@ -45,7 +45,7 @@ struct VLIBCSzHash {
 
   const char* find(std::string_view key) const;
   void set(std::string_view key, std::string_view value);
-  bool remove(std::string_view key);
+  void remove(std::string_view key);
   std::vector<Entry> sorted() const;
 
   // Both the answers and the failures of `resolver` are kept for the life of the hash.

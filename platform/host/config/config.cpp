@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <chrono>
 #include <cstring>
 #include <exception>
 
@@ -19,10 +18,9 @@ namespace {
 using Entries = std::vector<VLIBCSzHash::Entry>;
 
 constexpr std::size_t kLargestFile = 16U << 20U;
-constexpr std::chrono::milliseconds kLockWait = std::chrono::seconds(10);
 
 int fail(int code, int line) {
-  VLIBCErrSetEx(code, "platform/host/config.cpp", line);
+  VLIBCErrSetEx(code, "platform/host/config/config.cpp", line);
   return -1;
 }
 
@@ -121,23 +119,8 @@ std::string rewritten(const std::vector<ConfigLine>& lines, const SectionRange& 
   return text;
 }
 
-}  // namespace
-
-std::optional<std::string> read_config(const char* file) {
-  std::optional<std::string> text = read_file(file, kLargestFile);
-  if (!text) {
-    log_line("%s can't be read (%s); make it a regular file that this program may read", file,
-             std::strerror(errno));
-  }
-  return text;
-}
-
-bool config_is_readable(const char* file) {
-  return read_config(file).has_value();
-}
-
 int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
-                std::string_view format, std::chrono::milliseconds lock_wait) {
+                std::string_view format) {
   const Entries entries = hash.sorted();
   if (!valid_format(format)) {
     log_line("%s: not rewritten: the line format needs %%s twice and a line end", file);
@@ -146,7 +129,7 @@ int set_section(const char* file, std::string_view section, const VLIBCSzHash& h
   if (!entries_fit(file, format, entries)) {
     return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
-  return rewrite_config(file, lock_wait, [&](std::string_view text) -> std::optional<std::string> {
+  return rewrite_config(file, [&](std::string_view text) -> std::optional<std::string> {
     const std::vector<ConfigLine> lines = parse_lines(text);
     SectionRange range;
     const FindResult result = find_section(lines, file, section, range);
@@ -160,6 +143,21 @@ int set_section(const char* file, std::string_view section, const VLIBCSzHash& h
     }
     return rewritten(lines, range, format, entries);
   });
+}
+
+}  // namespace
+
+std::optional<std::string> read_config(const char* file) {
+  std::optional<std::string> text = read_file(file, kLargestFile);
+  if (!text) {
+    log_line("%s can't be read (%s); make it a regular file that this program may read", file,
+             std::strerror(errno));
+  }
+  return text;
+}
+
+bool config_is_readable(const char* file) {
+  return read_config(file).has_value();
 }
 
 }  // namespace host
@@ -183,7 +181,7 @@ int VLIBCFileSetSection(const char* file, const char* section, const char* new_n
     return host::fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
   try {
-    return host::set_section(file, section, *hash, line_format, host::kLockWait);
+    return host::set_section(file, section, *hash, line_format);
   } catch (const std::exception&) {
     return host::fail(VLIBC_ERR_FILE_IO, __LINE__);
   }
