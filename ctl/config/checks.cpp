@@ -11,9 +11,9 @@
 #include <numeric>
 #include <set>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "base/text_containers.hpp"
-#include "config/config.hpp"
 #include "mail/mail.hpp"
 #include "run/link.hpp"
 #include "run/old_reports.hpp"

@@ -2,9 +2,9 @@
 #include <algorithm>
 #include <memory>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "config/checks.hpp"
-#include "config/config.hpp"
 
 namespace ctl {
 namespace {

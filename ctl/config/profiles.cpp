@@ -9,15 +9,15 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
+#include "base/profile_state.hpp"
 #include "base/text_containers.hpp"
 #include "config/checks.hpp"
-#include "config/config.hpp"
 #include "run/old_reports.hpp"
-#include "run/profile_state.hpp"
 #include "run/run_lock.hpp"
 #include "run/run_paths.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"

@@ -5,9 +5,9 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "config/checks.hpp"
-#include "config/config.hpp"
 #include "config/samba.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"

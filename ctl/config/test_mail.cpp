@@ -3,9 +3,9 @@
 #include <string>
 #include <vector>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "base/text_containers.hpp"
-#include "config/config.hpp"
 #include "mail/mail.hpp"
 #include "vorn/config.h"
 #include "vorn/paths.h"

@@ -9,7 +9,7 @@
 #include <string_view>
 #include <vector>
 
-#include "config/config.hpp"
+#include "base/configuration.hpp"
 
 namespace ctl {
 

@@ -13,8 +13,8 @@
 #include <set>
 
 #include "base/ctl.hpp"
+#include "base/profile_state.hpp"
 #include "doctor/doctor.hpp"
-#include "run/profile_state.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {

@@ -9,10 +9,10 @@
 #include <cstring>
 #include <memory>
 
+#include "base/ask_program.hpp"
 #include "base/ctl.hpp"
-#include "base/process.hpp"
 #include "doctor/doctor.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 

@@ -7,11 +7,11 @@
 #include <fstream>
 
 #include "base/ctl.hpp"
+#include "base/profile_state.hpp"
 #include "doctor/doctor.hpp"
-#include "run/profile_state.hpp"
 #include "run/run_paths.hpp"
 #include "schedule/cron_times.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
 
 namespace ctl {
 namespace {

@@ -13,8 +13,8 @@
 
 #include "base/child.hpp"
 #include "base/ctl.hpp"
+#include "base/profile_state.hpp"
 #include "base/text_containers.hpp"
-#include "run/profile_state.hpp"
 #include "vorn/report.h"
 
 namespace ctl {

@@ -5,9 +5,9 @@
 #include <nlohmann/json.hpp>
 
 #include "base/ctl.hpp"
-#include "run/profile_state.hpp"
+#include "base/profile_state.hpp"
 #include "run/report_figures.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
 
 namespace ctl {
 namespace {

@@ -1,6 +1,6 @@
 // The scheduled runs of the machine: lines in cron's files that run vornreport.
-#ifndef VORN_CTL_SCHEDULES_HPP
-#define VORN_CTL_SCHEDULES_HPP
+#ifndef VORN_CTL_JOBS_HPP
+#define VORN_CTL_JOBS_HPP
 
 #include <ctime>
 #include <optional>
@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "config/config.hpp"
+#include "base/configuration.hpp"
 
 namespace ctl {
 

@@ -1,4 +1,4 @@
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
 
 #include <fcntl.h>
 #include <sys/stat.h>

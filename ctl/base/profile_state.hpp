@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "config/config.hpp"
+#include "base/configuration.hpp"
 #include "run/old_reports.hpp"
 
 namespace ctl {

@@ -1,6 +1,6 @@
 // The configuration files as vornctl reads and changes them. Every failure is thrown as a Failure.
-#ifndef VORN_CTL_CONFIG_HPP
-#define VORN_CTL_CONFIG_HPP
+#ifndef VORN_CTL_CONFIGURATION_HPP
+#define VORN_CTL_CONFIGURATION_HPP
 
 #include <optional>
 #include <string>

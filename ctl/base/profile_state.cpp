@@ -1,4 +1,4 @@
-#include "run/profile_state.hpp"
+#include "base/profile_state.hpp"
 
 #include <sqlite3.h>
 #include <sys/stat.h>

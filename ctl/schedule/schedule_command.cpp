@@ -16,9 +16,9 @@
 #include <cstring>
 
 #include "base/ctl.hpp"
-#include "run/profile_state.hpp"
+#include "base/profile_state.hpp"
 #include "schedule/cron_times.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 

@@ -1,4 +1,4 @@
-#include "base/process.hpp"
+#include "base/ask_program.hpp"
 
 #include <fcntl.h>
 #include <poll.h>

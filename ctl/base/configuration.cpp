@@ -1,4 +1,4 @@
-#include "config/config.hpp"
+#include "base/configuration.hpp"
 
 #include <algorithm>
 

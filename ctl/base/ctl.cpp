@@ -1,10 +1,11 @@
 // Texts, tables and JSON for whoever sits in front of vornctl.
+#include "base/ctl.hpp"
+
 #include <algorithm>
 #include <cstdio>
 #include <cwchar>
 #include <nlohmann/json.hpp>
 
-#include "base/ctl.hpp"
 #include "base/host_log.hpp"
 #include "vorn/base/utf8.hpp"
 
