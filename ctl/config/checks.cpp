@@ -1,6 +1,7 @@
 #include "config/checks.hpp"
 
 #include <pwd.h>
+#include <strings.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -8,15 +9,18 @@
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
+#include <nlohmann/json.hpp>
 #include <numeric>
 #include <set>
 
 #include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "report_format/reports.hpp"
+#include "report_format/values.hpp"
 #include "vorn/admin/mail.hpp"
 #include "vorn/admin/reports.hpp"
 #include "vorn/admin/runs.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/base/utf8.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"
@@ -36,16 +40,29 @@ std::string joined(const std::vector<std::string>& texts, const char* separator)
   return all;
 }
 
+// Each word must select a report, as runs take the list.
 std::string report_list_problem(const std::string& value) {
+  bool is_empty = true;
   const std::vector<std::string> names = report_names();
-  for (const std::string_view word : host::comma_words(value)) {
-    if (std::find(names.begin(), names.end(), word) == names.end()) {
+  std::string_view rest = value;
+  while (!rest.empty()) {
+    const std::size_t end =
+        std::min(rest.find_first_of(report_format::kListSeparators), rest.size());
+    const std::string_view word = rest.substr(0, end);
+    rest.remove_prefix(std::min(end + 1, rest.size()));
+    if (word.empty()) {
+      continue;
+    }
+    is_empty = false;
+    if (std::none_of(names.begin(), names.end(), [word](const std::string& name) {
+          return report_format::is_selected(name, word);
+        })) {
       const std::string near = suggestion(word, names);
       return in_quotes(word) + " is no report" +
              (near.empty() ? "; there are " + joined(names, ", ") : near);
     }
   }
-  return host::comma_words(value).empty() ? "names no report" : "";
+  return is_empty ? "names no report" : "";
 }
 
 std::string share_list_problem(const std::string& value) {
@@ -75,7 +92,9 @@ std::string users_problem(const std::string& value) {
 }
 
 std::string truth_problem(const std::string& value) {
-  return value == "true" || value == "false" ? "" : "is neither true nor false";
+  // All but true is false to a run; only this word says that it is meant.
+  const bool is_false = strcasecmp(value.c_str(), "false") == 0;
+  return report_format::is_true(value) || is_false ? "" : "is neither true nor false";
 }
 
 std::string report_dir_problem(const std::string& value) {
@@ -99,14 +118,13 @@ std::string report_dir_problem(const std::string& value) {
 }
 
 std::string language_problem(const std::string& value) {
-  constexpr std::size_t kLongestCode = 7;
   const std::vector<std::string> languages = installed_languages();
   const auto is_installed = [&](const std::string& code) {
     return std::find(languages.begin(), languages.end(), code) != languages.end();
   };
   // A regional code falls back to its language.
   const bool known = is_installed(value) || is_installed(value.substr(0, value.find('-')));
-  return known && value.size() <= kLongestCode
+  return known && report_format::is_language_code(value)
              ? ""
              : in_quotes(value) + " is not installed; there are " + joined(languages, ", ");
 }
@@ -275,13 +293,20 @@ std::vector<std::string> report_names() {
   return names;
 }
 
+// What lies beside the dictionaries, an editor's copy for instance, is none.
 std::vector<std::string> installed_languages() {
+  constexpr std::size_t kLargest = 1U << 20U;
   std::set<std::string> codes;
   std::error_code error;
   for (const auto& entry : std::filesystem::directory_iterator(VORN_PATH_TEMPLATE "/lang", error)) {
     const std::filesystem::path& path = entry.path();
-    if (path.extension() == ".json" || path.extension() == ".js") {
-      codes.insert(path.stem().string());
+    const std::string code = path.stem().string();
+    if (path.extension() != ".json" || !report_format::is_language_code(code)) {
+      continue;
+    }
+    const std::string text = host::read_file(path.string(), kLargest).value_or("");
+    if (nlohmann::json::parse(text, nullptr, false).is_object()) {
+      codes.insert(code);
     }
   }
   return {codes.begin(), codes.end()};

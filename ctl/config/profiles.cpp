@@ -11,6 +11,7 @@
 #include "base/stored_reports.hpp"
 #include "config/checks.hpp"
 #include "config/commands.hpp"
+#include "report_format/reports.hpp"
 #include "schedule/jobs.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/paths.h"
@@ -112,7 +113,7 @@ void list_profiles(bool json) {
     list.push_back(as_json(profile));
     const std::string reports = profile.value("report_list", "none");
     const bool has_all = std::all_of(all.begin(), all.end(), [&](const std::string& name) {
-      return reports.find(name) != std::string::npos;
+      return report_format::is_selected(name, reports);
     });
     table.add({profile.name, profile.value("share_list", "all"), profile.value("mail_to", "-"),
                has_all ? "all" : reports});
