@@ -8,6 +8,11 @@
 #include <string_view>
 
 #include "base/ctl.hpp"
+#include "config/commands.hpp"
+#include "doctor/commands.hpp"
+#include "run/commands.hpp"
+#include "schedule/commands.hpp"
+#include "vorn/admin/messages.hpp"
 
 namespace {
 
@@ -62,7 +67,7 @@ void run(int argc, char** argv) {
 
 // The exit status of a command that ran through, once all of its output is out.
 int finish() {
-  for (const std::string& message : ctl::take_host_messages()) {
+  for (const std::string& message : admin::take_messages()) {
     ctl::warn(message);
   }
   if (std::fflush(stdout) != 0 || std::ferror(stdout) != 0) {
@@ -84,8 +89,8 @@ int fail(const char* message, int exit_code) {
 
 int main(int argc, char** argv) try {
   std::setlocale(LC_CTYPE, "C.UTF-8");
-  unsetenv("TZ");             // runs and cron have the system's time zone, so times are told in it
-  ctl::take_host_messages();  // from here on they are collected
+  unsetenv("TZ");          // runs and cron have the system's time zone, so times are told in it
+  admin::take_messages();  // from here on they are collected
   run(argc, argv);
   return finish();
 } catch (const ctl::Failure& failure) {

@@ -1,5 +1,5 @@
-// What the commands of vornctl share. Each group of commands has a file of its own, which adds them
-// to the command line and runs them in their callbacks.
+// What the commands of vornctl share. Each command has a file of its own, which adds it to the
+// command line (see commands.hpp of its group) and runs it in its callback.
 //
 // Exit status: 0 when all went well, 1 when the command failed, 2 when the command line is wrong.
 // Results go to standard output, everything else to standard error.
@@ -31,22 +31,7 @@ class Failure : public std::runtime_error {
   int exit_code_;
 };
 
-// --- The commands -------------------------------------------------------------------------------
-
-void add_share_commands(CLI::App& app);
-void add_profile_commands(CLI::App& app);
-void add_run_command(CLI::App& app);
-void add_schedule_command(CLI::App& app);
-void add_status_command(CLI::App& app);
-void add_reports_command(CLI::App& app);
-void add_doctor_command(CLI::App& app);
-
-// Prints what can stand in the place of the last of `words`, those behind the program's name; for
-// the shells' completion.
-void complete(const CLI::App& app, std::vector<std::string> words);
-
-// Adds "test-mail" to the group `profile`.
-void add_test_mail_command(CLI::App& profile);
+// --- The command line ---------------------------------------------------------------------------
 
 // Arguments and options whose name or type is one of these are completed with what they stand for:
 // PROFILE, SHARE, SHARES, REPORTS, LANGUAGE, KEY, FOLDER, FILE.
@@ -56,10 +41,8 @@ CLI::Option* add_json_flag(CLI::App& command, bool& json);
 
 // --- The platform's messages --------------------------------------------------------------------
 
-// What the platform would have logged since the last call; main prints what nobody took. It goes to
-// no system log: the administrator sits in front of it.
-std::vector<std::string> take_host_messages();
-// The last of them as a failure, those before it printed; `otherwise` when there is none.
+// The last one since they were taken as a failure, those before it printed; `otherwise` when there
+// is none. main prints what nobody took.
 Failure host_failure(const std::string& otherwise);
 
 // --- Output -------------------------------------------------------------------------------------

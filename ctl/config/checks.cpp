@@ -1,6 +1,7 @@
 #include "config/checks.hpp"
 
 #include <pwd.h>
+#include <strings.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -8,20 +9,21 @@
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
+#include <nlohmann/json.hpp>
 #include <numeric>
 #include <set>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
-#include "base/text_containers.hpp"
-#include "config/config.hpp"
-#include "mail/mail.hpp"
-#include "run/link.hpp"
-#include "run/old_reports.hpp"
-#include "run/run_paths.hpp"
+#include "report_format/reports.hpp"
+#include "report_format/values.hpp"
+#include "vorn/admin/mail.hpp"
+#include "vorn/admin/reports.hpp"
+#include "vorn/admin/runs.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/base/utf8.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"
-#include "vornreport/registry.hpp"
 
 namespace ctl {
 namespace {
@@ -38,21 +40,34 @@ std::string joined(const std::vector<std::string>& texts, const char* separator)
   return all;
 }
 
+// Each word must select a report, as runs take the list.
 std::string report_list_problem(const std::string& value) {
+  bool is_empty = true;
   const std::vector<std::string> names = report_names();
-  for (const std::string_view word : host::comma_words(value)) {
-    if (std::find(names.begin(), names.end(), word) == names.end()) {
+  std::string_view rest = value;
+  while (!rest.empty()) {
+    const std::size_t end =
+        std::min(rest.find_first_of(report_format::kListSeparators), rest.size());
+    const std::string_view word = rest.substr(0, end);
+    rest.remove_prefix(std::min(end + 1, rest.size()));
+    if (word.empty()) {
+      continue;
+    }
+    is_empty = false;
+    if (std::none_of(names.begin(), names.end(), [word](const std::string& name) {
+          return report_format::is_selected(name, word);
+        })) {
       const std::string near = suggestion(word, names);
       return in_quotes(word) + " is no report" +
              (near.empty() ? "; there are " + joined(names, ", ") : near);
     }
   }
-  return host::comma_words(value).empty() ? "names no report" : "";
+  return is_empty ? "names no report" : "";
 }
 
 std::string share_list_problem(const std::string& value) {
   std::vector<std::string> names;
-  for (const host::Share& share : read_shares()) {
+  for (const Share& share : read_shares()) {
     names.push_back(share.name);
   }
   for (const std::string_view word : host::comma_words(value)) {
@@ -77,12 +92,14 @@ std::string users_problem(const std::string& value) {
 }
 
 std::string truth_problem(const std::string& value) {
-  return value == "true" || value == "false" ? "" : "is neither true nor false";
+  // All but true is false to a run; only this word says that it is meant.
+  const bool is_false = strcasecmp(value.c_str(), "false") == 0;
+  return report_format::is_true(value) || is_false ? "" : "is neither true nor false";
 }
 
 std::string report_dir_problem(const std::string& value) {
-  if (const char* error = host::report_dir_error(value); error != nullptr) {
-    return error;
+  if (std::string problem = admin::report_dir_problem(value); !problem.empty()) {
+    return problem;
   }
   // The run makes what is missing.
   std::filesystem::path folder(value);
@@ -101,26 +118,25 @@ std::string report_dir_problem(const std::string& value) {
 }
 
 std::string language_problem(const std::string& value) {
-  constexpr std::size_t kLongestCode = 7;
   const std::vector<std::string> languages = installed_languages();
   const auto is_installed = [&](const std::string& code) {
     return std::find(languages.begin(), languages.end(), code) != languages.end();
   };
   // A regional code falls back to its language.
   const bool known = is_installed(value) || is_installed(value.substr(0, value.find('-')));
-  return known && value.size() <= kLongestCode
+  return known && report_format::is_language_code(value)
              ? ""
              : in_quotes(value) + " is not installed; there are " + joined(languages, ", ");
 }
 
 std::string link_base_problem(const std::string& value) {
-  const char* problem = host::link_base_error(value);
-  return problem == nullptr ? "" : std::string(problem) + "; write https://server/reports";
+  const std::string problem = admin::link_base_problem(value);
+  return problem.empty() ? "" : problem + "; write https://server/reports";
 }
 
 std::string recipients_problem(const std::string& value) {
   for (const std::string_view word : host::comma_words(value)) {
-    if (!host::valid_address(word)) {
+    if (!admin::is_mail_address(word)) {
       return in_quotes(word) + " is no mail address; write name@domain";
     }
   }
@@ -128,20 +144,9 @@ std::string recipients_problem(const std::string& value) {
 }
 
 std::string sender_problem(const std::string& value) {
-  return host::valid_address(value) ? ""
-                                    : in_quotes(value) + " is no mail address; write name@domain";
-}
-
-std::string smtp_url_problem(const std::string& value) {
-  return !host::mail_host(value).empty()
+  return admin::is_mail_address(value)
              ? ""
-             : "is not smtp://host:port or smtps://host:port (a user goes into smtp_user)";
-}
-
-std::string password_file_problem(const std::string& value) {
-  std::string password;
-  const char* problem = host::password_problem(value, password);
-  return problem == nullptr ? "" : problem;
+             : in_quotes(value) + " is no mail address; write name@domain";
 }
 
 std::string no_problem(const std::string& /*value*/) {
@@ -149,20 +154,8 @@ std::string no_problem(const std::string& /*value*/) {
 }
 
 std::string schedule_problem(const std::string& value) {
-  constexpr std::size_t kLongest = 64;
-  const bool fits = value.size() <= kLongest && std::all_of(value.begin(), value.end(), [](char c) {
-                      return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
-                             (c >= '0' && c <= '9') || c == '_' || c == '-';
-                    });
-  return fits ? "" : "is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -)";
-}
-
-std::string keep_problem(const std::string& value) {
-  VLIBCSzHash hash(1);
-  hash.set("keep_reports", value);
-  const std::size_t number = host::reports_to_keep("", hash);
-  take_host_messages();  // said here in fewer words
-  return number > 0 ? "" : "is no number from 1 on";
+  return admin::is_schedule_id(value) ? ""
+                                      : "is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -)";
 }
 
 constexpr ProfileKey kKeys[] = {
@@ -177,10 +170,10 @@ constexpr ProfileKey kKeys[] = {
     {"mail_to", "--mail-to", "ADDRESSES", "Recipients of the mail", true, recipients_problem},
     {"mail_from", "--mail-from", "ADDRESS", "Sender of the mail", false, sender_problem},
     {"smtp_url", "--smtp-url", "URL", "Mail server, smtp://host:port or smtps://host:port", false,
-     smtp_url_problem},
+     admin::smtp_url_problem},
     {"smtp_user", "--smtp-user", "NAME", "User at the mail server", false, no_problem},
     {"smtp_password_file", "--smtp-password-file", "FILE", "File with that user's password", false,
-     password_file_problem},
+     admin::password_file_problem},
     {"limit_user", "--limit-user", "USERS", "Users shown one by one in file_group", true,
      users_problem},
     {"duplicate_compare", nullptr, "true|false", "true compares contents of duplicates", false,
@@ -188,7 +181,7 @@ constexpr ProfileKey kKeys[] = {
     {"volume_history", nullptr, "true|false", "true shows history and forecast of volumes", false,
      truth_problem},
     {"keep_reports", "--keep-reports", "N", "Number of reports to keep (default: all)", false,
-     keep_problem},
+     admin::keep_reports_problem},
     {"schedule_collect_id", nullptr, "", "Identifier of the schedule", false, schedule_problem},
 };
 
@@ -232,8 +225,8 @@ std::string text_problem(std::string_view text) {
 }
 
 std::string share_name_problem(std::string_view name) {
-  if (const char* error = host::share_name_error(name); error != nullptr) {
-    return error;
+  if (std::string problem = admin::share_name_problem(name); !problem.empty()) {
+    return problem;
   }
   if (name.find_first_of("[]") != std::string_view::npos) {
     return "it holds a bracket";
@@ -246,8 +239,8 @@ std::string share_name_problem(std::string_view name) {
 }
 
 std::string share_path_problem(const std::string& path) {
-  if (const char* error = host::share_path_error(path); error != nullptr) {
-    return error;
+  if (std::string problem = admin::share_path_problem(path); !problem.empty()) {
+    return problem;
   }
   if (const std::string problem = text_problem(path); !problem.empty()) {
     return "its path " + problem + "; rename the folder or bind-mount it elsewhere";
@@ -294,19 +287,26 @@ std::string checked_value(const ProfileKey& key, const std::string& value) {
 
 std::vector<std::string> report_names() {
   std::vector<std::string> names;
-  for (const vornreport::ReportEntry& entry : vornreport::report_registry()) {
-    names.emplace_back(entry.name);
+  for (const report_format::ReportFormat* report : report_format::kReports) {
+    names.emplace_back(report->name);
   }
   return names;
 }
 
+// What lies beside the dictionaries, an editor's copy for instance, is none.
 std::vector<std::string> installed_languages() {
+  constexpr std::size_t kLargest = 1U << 20U;
   std::set<std::string> codes;
   std::error_code error;
   for (const auto& entry : std::filesystem::directory_iterator(VORN_PATH_TEMPLATE "/lang", error)) {
     const std::filesystem::path& path = entry.path();
-    if (path.extension() == ".json" || path.extension() == ".js") {
-      codes.insert(path.stem().string());
+    const std::string code = path.stem().string();
+    if (path.extension() != ".json" || !report_format::is_language_code(code)) {
+      continue;
+    }
+    const std::string text = host::read_file(path.string(), kLargest).value_or("");
+    if (nlohmann::json::parse(text, nullptr, false).is_object()) {
+      codes.insert(code);
     }
   }
   return {codes.begin(), codes.end()};

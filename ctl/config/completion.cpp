@@ -2,9 +2,11 @@
 #include <algorithm>
 #include <memory>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "config/checks.hpp"
-#include "config/config.hpp"
+#include "config/commands.hpp"
+#include "vorn/admin/messages.hpp"
 
 namespace ctl {
 namespace {
@@ -20,7 +22,7 @@ Words values_of(const std::string& kind) {
       words.push_back(profile.name);
     }
   } else if (kind == "SHARE" || kind == "SHARES") {
-    for (const host::Share& share : read_shares()) {
+    for (const Share& share : read_shares()) {
       words.push_back(share.name);
     }
   } else if (kind == "REPORTS") {
@@ -153,9 +155,9 @@ void complete(const CLI::App& app, std::vector<std::string> words) try {
       print_line(candidate);
     }
   }
-  take_host_messages();  // nobody wants to read them in the middle of a command line
+  admin::take_messages();  // nobody wants to read them in the middle of a command line
 } catch (const Failure&) {
-  take_host_messages();
+  admin::take_messages();
 }
 
 }  // namespace ctl

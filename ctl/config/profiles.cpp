@@ -1,26 +1,20 @@
 // vornctl profile: what is reported, and for whom.
-#include <fcntl.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
-#include <cstring>
 #include <map>
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
-#include "base/text_containers.hpp"
+#include "base/stored_reports.hpp"
 #include "config/checks.hpp"
-#include "config/config.hpp"
-#include "run/old_reports.hpp"
-#include "run/profile_state.hpp"
-#include "run/run_lock.hpp"
-#include "run/run_paths.hpp"
-#include "schedule/schedules.hpp"
-#include "vorn/base/file_io.hpp"
+#include "config/commands.hpp"
+#include "report_format/reports.hpp"
+#include "schedule/jobs.hpp"
+#include "vorn/admin/runs.hpp"
 #include "vorn/paths.h"
-#include "vorn/report.h"
 
 namespace ctl {
 namespace {
@@ -119,7 +113,7 @@ void list_profiles(bool json) {
     list.push_back(as_json(profile));
     const std::string reports = profile.value("report_list", "none");
     const bool has_all = std::all_of(all.begin(), all.end(), [&](const std::string& name) {
-      return reports.find(name) != std::string::npos;
+      return report_format::is_selected(name, reports);
     });
     table.add({profile.name, profile.value("share_list", "all"), profile.value("mail_to", "-"),
                has_all ? "all" : reports});
@@ -196,80 +190,29 @@ void describe_set(CLI::App& group) {
 
 // --- remove -------------------------------------------------------------------------------------
 
-// The profile as the platform's calls take it.
-VLIBCSzHash as_hash(const Section& profile) {
-  VLIBCSzHash hash(profile.entries.size());
-  for (const auto& [key, value] : profile.entries) {
-    hash.set(key, value);
-  }
-  return hash;
-}
-
 // No run of the profile can begin from here to the end of the process.
 void hold(const std::string& profile) {
-  switch (host::take_profile(profile)) {
-    case host::TakeResult::taken:
+  switch (admin::hold_profile(profile)) {
+    case admin::Hold::taken:
       return;
-    case host::TakeResult::busy:
+    case admin::Hold::running:
       throw Failure(titled(profile) + " is running; try again when its run has ended");
-    case host::TakeResult::failed:
+    case admin::Hold::failed:
       throw host_failure(titled(profile) + " can't be locked");
-  }
-}
-
-// Everything of the profile's in its folder, and the folder if nothing else is in it.
-void remove_reports(const std::string& folder) {
-  const auto reports = host::stored_reports(folder, host::ReportSize::left_out);
-  if (!reports) {
-    throw host_failure(folder + " can't be read");
-  }
-  for (const host::StoredReport& report : *reports) {
-    if (report.is_whole && !host::remove_report(folder, report.name)) {
-      throw host_failure(folder + "/" + report.name + " can't be removed");
-    }
-  }
-  const host::Fd opened = host::open_report_folder(folder);  // not what its name leads to by then
-  const std::string page_parts = "/proc/self/fd/" + std::to_string(opened.get()) + "/template";
-  if ((opened && !host::remove_tree(page_parts)) ||
-      (rmdir(folder.c_str()) != 0 && errno != ENOENT)) {
-    warn(folder + " stays: " +
-         (errno == ENOTEMPTY || errno == EEXIST ? "it holds more than reports"
-                                                : std::strerror(errno)));
-  }
-}
-
-void remove_schedule(const Section& profile, VLIBCSzHash* keys) {
-  constexpr std::size_t kLargestFile = 1U << 20U;
-  const std::string id = profile.value(kScheduleKey);
-  if (id.empty()) {
-    return;
-  }
-  const std::string file = cron_file(id);
-  if (!only_runs(profile.name, host::read_file(file, kLargestFile).value_or(""))) {
-    throw Failure(file + " holds other jobs than those of " + titled(profile.name) +
-                  "; move them to a file of their own");
-  }
-  if (VornQazScheduleClean(profile.name.c_str(), &keys, kScheduleKey) < 0) {
-    throw host_failure(titled(profile.name) + " has a schedule that can't be removed");
   }
 }
 
 void remove_profile(const std::string& name, bool reports_too) {
   check_profile_name(name);
   const Section profile = read_profile(name);
-  const std::string folder = report_folder(profile);
+  const std::string folder = folder_of_reports(profile);
   hold(name);
-  VLIBCSzHash hash = as_hash(profile);
-  VLIBCSzHash* keys = &hash;
-  remove_schedule(profile, keys);
-  if (VornQazInitRealPath(name.c_str(), &keys, 0) == 0) {
-    VornQazReportCleanTmp(name.c_str(), keys);
-  }
-  if (reports_too) {
-    remove_reports(folder);
+  remove_cron_file(profile);
+  admin::forget_runs(profile);  // what can't be removed has a message
+  if (reports_too && !admin::remove_all_reports(folder)) {
+    throw host_failure(folder + " can't be emptied");
   }
   remove_section(VORN_PATH_CONFIG, name);
-  unlink((VORN_PATH_STATUS "/" + name).c_str());
   if (!reports_too && access(folder.c_str(), F_OK) == 0) {
     warn("the reports of " + titled(name) + " stay in " + folder);
   }

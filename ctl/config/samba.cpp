@@ -7,8 +7,8 @@
 #include <map>
 #include <optional>
 
+#include "base/ask_program.hpp"
 #include "base/ctl.hpp"
-#include "base/process.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/words.hpp"
 

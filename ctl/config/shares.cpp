@@ -5,13 +5,13 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "config/checks.hpp"
-#include "config/config.hpp"
+#include "config/commands.hpp"
 #include "config/samba.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"
-#include "vorn/share.h"
 
 namespace ctl {
 namespace {
@@ -46,9 +46,8 @@ void check_file_index(const NewShare& share) {
 }
 
 bool is_remote(const std::string& path) {
-  const bool remote = VORNGetFSType(path.c_str(), 0) == VORN_FS_REMOTE;
-  take_host_messages();  // a file system of unknown kind isn't worth a word here
-  return remote;
+  const auto found = admin::file_system_of(path);
+  return found && found->is_remote;
 }
 
 void add_share(NewShare share) {
@@ -64,7 +63,7 @@ void add_share(NewShare share) {
   if (!share.file_index.empty()) {
     check_file_index(share);
   }
-  for (const host::Share& other : read_shares()) {
+  for (const Share& other : read_shares()) {
     if (other.path == share.path && other.name != share.name) {
       warn(titled(other.name) + " covers " + share.path + " as well; its files will count twice");
     }
@@ -95,7 +94,7 @@ void describe_add(CLI::App& group) {
 
 // --- list ---------------------------------------------------------------------------------------
 
-std::string state_of(const host::Share& share) {
+std::string state_of(const Share& share) {
   if (!share.path_error.empty()) {
     return share.path_error;
   }
@@ -106,7 +105,7 @@ std::string state_of(const host::Share& share) {
 void list_shares(bool json) {
   nlohmann::ordered_json list = nlohmann::ordered_json::array();
   Table table({{"SHARE"}, {"FOLDER"}, {"FILE INDEX"}, {"STATE"}});
-  for (const host::Share& share : read_shares()) {
+  for (const Share& share : read_shares()) {
     const std::string state = state_of(share);
     list.push_back({{"name", share.name},
                     {"path", share.path},
@@ -188,7 +187,7 @@ std::string import_problem(const SambaShare& share, const std::vector<std::strin
 
 void import_samba(bool dry_run, UserShares user_shares) {
   std::vector<std::string> known;
-  for (const host::Share& share : read_shares()) {
+  for (const Share& share : read_shares()) {
     known.push_back(folded(share.name));
   }
   for (const SambaShare& share : samba_shares(user_shares)) {

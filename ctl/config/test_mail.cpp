@@ -3,31 +3,21 @@
 #include <string>
 #include <vector>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
-#include "base/text_containers.hpp"
-#include "config/config.hpp"
-#include "mail/mail.hpp"
-#include "vorn/config.h"
-#include "vorn/paths.h"
+#include "config/commands.hpp"
+#include "vorn/admin/mail.hpp"
+#include "vorn/admin/messages.hpp"
 
 namespace ctl {
 namespace {
 
 void send_test_mail(const std::string& name) {
-  if (!profile_exists(name)) {
-    throw Failure("there is no profile \"" + name + "\"; see: vornctl profile list");
-  }
-  VLIBCSzHash section(0);
-  VLIBCSzHash* filled = &section;
-  if (VLIBCFileGetSection(VORN_PATH_CONFIG, name.c_str(), &filled) < 0) {
-    throw host_failure("profile \"" + name + "\" can't be read");
-  }
-  const std::vector<std::string> served =
-      host::send_test_mail(name.c_str(), section, host::MailLimits{});
+  const std::vector<std::string> served = admin::send_test_mail(read_profile(name));
   for (const std::string& recipient : served) {
     print_line("sent to " + recipient);
   }
-  const std::vector<std::string> problems = take_host_messages();
+  const std::vector<std::string> problems = admin::take_messages();
   for (const std::string& problem : problems) {
     warn(problem);
   }

@@ -14,6 +14,8 @@
 #include <nlohmann/json.hpp>
 
 #include "base/ctl.hpp"
+#include "doctor/commands.hpp"
+#include "vorn/admin/messages.hpp"
 #include "vorn/base/file_io.hpp"
 
 namespace ctl {
@@ -78,7 +80,7 @@ void doctor(bool json) {
   check_clock(findings);
   check_schedules(findings, configuration);
   check_last_runs(findings, configuration);
-  take_host_messages();  // every one of them has a finding
+  admin::take_messages();  // every one of them has a finding
   json ? print_as_json(findings) : print_as_lines(findings);
   const auto is_error = [](const Finding& finding) { return finding.level == Level::error; };
   if (std::any_of(findings.all().begin(), findings.all().end(), is_error)) {

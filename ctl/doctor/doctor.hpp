@@ -9,7 +9,7 @@
 #include <string_view>
 #include <vector>
 
-#include "config/config.hpp"
+#include "base/configuration.hpp"
 
 namespace ctl {
 
@@ -42,7 +42,7 @@ class Findings {
 // What the checks look at; whatever can't be read is left out and has a finding.
 struct Configuration {
   std::vector<Section> profiles;  // without "global"
-  std::vector<host::Share> shares;
+  std::vector<Share> shares;
 };
 
 void check_product(Findings& findings);

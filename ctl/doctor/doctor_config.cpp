@@ -1,12 +1,10 @@
 // What the two configuration files say.
 #include <algorithm>
-#include <set>
 
 #include "base/ctl.hpp"
 #include "config/checks.hpp"
-#include "config/config_file.hpp"
-#include "config/config_lines.hpp"
 #include "doctor/doctor.hpp"
+#include "vorn/admin/messages.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {
@@ -20,42 +18,20 @@ void add_failure(Findings& findings, const std::string& subject, const std::stri
 // The sections of `file`, those with a broken line included. Every line that can't be understood
 // is an error, because a run does without the whole section.
 std::vector<Section> check_lines(Findings& findings, const char* file) {
-  std::vector<Section> sections;
-  const std::optional<std::string> text = host::read_config(file);
-  if (!text) {
+  auto found = admin::examine_file(file);
+  if (!found) {
     add_failure(findings, file, host_failure("can't be read").what());
-    return sections;
+    return {};
   }
-  std::set<std::string_view> names;
-  std::set<std::string_view> keys;
-  std::size_t number = 0;
-  std::size_t wrong = 0;
-  for (const host::ConfigLine& line : host::parse_lines(*text)) {
-    ++number;
-    const char* problem = line.problem;
-    if (line.kind == host::LineKind::header) {
-      keys.clear();
-      problem = names.insert(line.name).second ? nullptr : "a section of this name stands above";
-      sections.push_back({std::string(line.name), {}});
-    } else if (line.kind == host::LineKind::entry) {
-      problem = keys.insert(line.name).second ? nullptr : "this key stands in the section twice";
-      if (sections.empty()) {
-        problem = "it stands above every section";
-      } else {
-        sections.back().entries.emplace_back(line.name, line.value);
-      }
-    }
-    if (problem != nullptr) {
-      ++wrong;
-      findings.add(Level::error, file, "line " + std::to_string(number) + ": " + problem,
-                   "correct the line");
-    }
+  for (const admin::WrongLine& line : found->wrong) {
+    findings.add(Level::error, file, "line " + std::to_string(line.number) + ": " + line.problem,
+                 "correct the line");
   }
-  if (wrong == 0) {
-    findings.ok(
-        file, std::to_string(sections.size()) + (sections.size() == 1 ? " section" : " sections"));
+  const std::size_t count = found->sections.size();
+  if (found->wrong.empty()) {
+    findings.ok(file, std::to_string(count) + (count == 1 ? " section" : " sections"));
   }
-  return sections;
+  return std::move(found->sections);
 }
 
 // The number of findings.
@@ -87,7 +63,7 @@ void check_profile(Findings& findings, const Section& section) {
   int problems = 0;
   for (const auto& [key, value] : section.entries) {
     problems += check_entry(findings, subject, key, value);
-    take_host_messages();  // those about other sections have findings of their own
+    admin::take_messages();  // those about other sections have findings of their own
   }
   const std::string reports = section.value("report_list");
   if (reports.empty()) {
@@ -99,7 +75,7 @@ void check_profile(Findings& findings, const Section& section) {
 }
 
 void check_share_section(Findings& findings, const Section& section,
-                         const std::vector<host::Share>& shares) {
+                         const std::vector<Share>& shares) {
   const std::string subject = "share " + section.name;
   if (const std::string problem = share_name_problem(section.name); !problem.empty()) {
     findings.add(Level::error, subject, "it is left out: " + problem, "rename its section");
@@ -113,7 +89,7 @@ void check_share_section(Findings& findings, const Section& section,
                    near.empty() ? "remove it" : near.substr(2));
     }
   }
-  for (const host::Share& share : shares) {
+  for (const Share& share : shares) {
     if (share.name == section.name && !share.path_error.empty()) {
       findings.add(Level::error, subject, share.path_error);
     }
@@ -145,7 +121,7 @@ Configuration check_configuration(Findings& findings) {
                  "write [global] and report_list = volume_usage into " VORN_PATH_CONFIG);
   }
   const std::vector<Section> sections = check_lines(findings, VORN_PATH_SHARES);
-  configuration.shares = host::load_shares(VORN_PATH_SHARES).value_or(std::vector<host::Share>{});
+  configuration.shares = admin::read_shares().value_or(std::vector<Share>{});
   for (const Section& section : sections) {
     check_share_section(findings, section, configuration.shares);
   }
@@ -153,7 +129,7 @@ Configuration check_configuration(Findings& findings) {
     findings.add(Level::warning, "shares", "there are none, so reports on files are empty",
                  "run vornctl share add NAME PATH");
   }
-  take_host_messages();  // those lines have their findings
+  admin::take_messages();  // those lines have their findings
   return configuration;
 }
 

@@ -1,5 +1,4 @@
 // What the machine around the product gives: mail server, disk space, clock.
-#include <curl/curl.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
 
@@ -9,63 +8,29 @@
 #include <filesystem>
 #include <fstream>
 #include <map>
-#include <memory>
 #include <set>
 
 #include "base/ctl.hpp"
+#include "base/stored_reports.hpp"
+#include "base/texts.hpp"
 #include "doctor/doctor.hpp"
-#include "run/profile_state.hpp"
+#include "vorn/admin/mail.hpp"
+#include "vorn/admin/messages.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {
-namespace {
-
 // --- Mail ---------------------------------------------------------------------------------------
-
-struct CurlCleanup {
-  void operator()(CURL* curl) const { curl_easy_cleanup(curl); }
-};
-
-// Connects and waits for the greeting, as a run does before it sends. Empty when that worked.
-std::string connect_problem(const std::string& url, bool has_user) {
-  constexpr long kLimitMs = 10'000;
-  char error[CURL_ERROR_SIZE] = "";
-  const std::unique_ptr<CURL, CurlCleanup> curl(curl_easy_init());
-  if (!curl) {
-    return "no memory";
-  }
-  curl_easy_setopt(curl.get(), CURLOPT_URL, url.c_str());
-  curl_easy_setopt(curl.get(), CURLOPT_PROTOCOLS_STR, "smtp,smtps");
-  curl_easy_setopt(curl.get(), CURLOPT_PROXY, "");
-  curl_easy_setopt(curl.get(), CURLOPT_NOSIGNAL, 1L);
-  curl_easy_setopt(curl.get(), CURLOPT_QUICK_EXIT, 1L);
-  curl_easy_setopt(curl.get(), CURLOPT_CONNECT_ONLY, 1L);
-  curl_easy_setopt(curl.get(), CURLOPT_CONNECTTIMEOUT_MS, kLimitMs);
-  curl_easy_setopt(curl.get(), CURLOPT_TIMEOUT_MS, kLimitMs);
-  curl_easy_setopt(curl.get(), CURLOPT_ERRORBUFFER, static_cast<char*>(error));
-  if (has_user && url.find("//localhost") == std::string::npos &&
-      url.find("//127.") == std::string::npos) {
-    curl_easy_setopt(curl.get(), CURLOPT_USE_SSL, static_cast<long>(CURLUSESSL_ALL));
-  }
-  const CURLcode code = curl_easy_perform(curl.get());
-  if (code == CURLE_OK) {
-    return {};
-  }
-  return error[0] != '\0' ? error : curl_easy_strerror(code);
-}
-
-}  // namespace
 
 void check_mail(Findings& findings, const Configuration& configuration) {
   std::set<std::pair<std::string, bool>> asked;
   for (const Section& profile : configuration.profiles) {
-    const std::string url = profile.value("smtp_url", "smtp://localhost:25");
+    const std::string url = admin::mail_server_of(profile);
     const bool has_user = !profile.value("smtp_user").empty();
     if (profile.value("mail_to").empty() || !asked.insert({url, has_user}).second) {
       continue;
     }
     const std::string subject = "mail server " + url;
-    if (const std::string problem = connect_problem(url, has_user); problem.empty()) {
+    if (const std::string problem = admin::mail_server_problem(profile); problem.empty()) {
       findings.ok(subject, "it answers");
     } else {
       findings.add(Level::error, subject, problem,
@@ -114,7 +79,7 @@ std::uint64_t guess_statistics(const Configuration& configuration) {
   constexpr std::uint64_t kBytesPerFile = 250;  // with a path of usual length
   std::set<unsigned long> counted;
   std::uint64_t files = 0;
-  for (const host::Share& share : configuration.shares) {
+  for (const Share& share : configuration.shares) {
     struct statvfs measured {};
     if (!share.path.empty() && statvfs(share.path.c_str(), &measured) == 0 &&
         counted.insert(measured.f_fsid).second) {
@@ -129,19 +94,18 @@ Needs collect_needs(const Configuration& configuration) {
   std::uint64_t largest_page = 0;
   for (const Section& profile : configuration.profiles) {
     try {
-      const std::string folder = report_folder(profile);
-      const auto last = newest_whole(reports_in(folder, host::ReportSize::measured));
+      const std::string folder = folder_of_reports(profile);
+      const auto last = newest_whole(reports_in(folder, ReportSize::measured));
       add_need(needs, folder, last ? last->size : 0, 0);
       if (last) {
         struct stat page {};
-        const std::string path = folder + "/" + last->name + "/report.html";
-        largest_page = stat(path.c_str(), &page) != 0
+        largest_page = stat(last->page.c_str(), &page) != 0
                            ? largest_page
                            : std::max(largest_page, static_cast<std::uint64_t>(page.st_size));
       }
     } catch (const Failure& failure) {
       // The next run would end at this, too.
-      take_host_messages();
+      admin::take_messages();
     }
   }
   add_need(needs, "/tmp", largest_page, 0);

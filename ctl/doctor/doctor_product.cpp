@@ -1,5 +1,4 @@
 // What is installed: the program, the template, the history and its schema, the folders' rights.
-#include <sqlite3.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -7,12 +6,12 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 
+#include "base/ask_program.hpp"
 #include "base/ctl.hpp"
-#include "base/process.hpp"
 #include "doctor/doctor.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
+#include "vorn/admin/history.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
@@ -21,11 +20,6 @@ namespace {
 
 constexpr const char* kReinstall = "install vornreport anew";
 constexpr std::chrono::seconds kScriptLimit{10};
-
-struct CloseDb {
-  void operator()(sqlite3* db) const { sqlite3_close(db); }
-};
-using DbPtr = std::unique_ptr<sqlite3, CloseDb>;
 
 void check_program(Findings& findings) {
   if (access(kProgram, X_OK) == 0) {
@@ -72,51 +66,18 @@ void check_template(Findings& findings) {
   }
 }
 
-void check_schema(Findings& findings) {
-  constexpr std::size_t kLargestSchema = 1U << 20U;
-  const auto schema = host::read_file(VORN_PATH_HISTORY_SCHEMA, kLargestSchema);
-  if (!schema) {
-    findings.add(
-        Level::error, "schema",
-        VORN_PATH_HISTORY_SCHEMA " can't be read (" + std::string(std::strerror(errno)) + ")",
-        kReinstall);
-    return;
+void check_database(Findings& findings) {
+  if (const std::string problem = admin::schema_problem(); problem.empty()) {
+    findings.ok("schema", VORN_PATH_HISTORY_SCHEMA);
+  } else {
+    findings.add(Level::error, "schema", VORN_PATH_HISTORY_SCHEMA " " + problem, kReinstall);
   }
-  sqlite3* opened = nullptr;
-  sqlite3_open(":memory:", &opened);
-  const DbPtr db(opened);
-  if (sqlite3_exec(db.get(), schema->c_str(), nullptr, nullptr, nullptr) != SQLITE_OK) {
-    findings.add(Level::error, "schema",
-                 VORN_PATH_HISTORY_SCHEMA " is broken: " + std::string(sqlite3_errmsg(db.get())),
-                 kReinstall);
-    return;
-  }
-  findings.ok("schema", VORN_PATH_HISTORY_SCHEMA);
-}
-
-void check_history(Findings& findings) {
-  constexpr int kWaitMs = 5000;
   if (access(VORN_PATH_HISTORY_DB, F_OK) != 0) {
     findings.ok("history", "the first run makes " VORN_PATH_HISTORY_DB);
-    return;
-  }
-  sqlite3* opened = nullptr;
-  const int result = sqlite3_open_v2(VORN_PATH_HISTORY_DB, &opened, SQLITE_OPEN_READONLY, nullptr);
-  const DbPtr db(opened);
-  sqlite3_busy_timeout(db.get(), kWaitMs);
-  std::string verdict;
-  const auto note = [](void* out, int, char** values, char**) {
-    *static_cast<std::string*>(out) = values[0];
-    return 0;
-  };
-  if (result != SQLITE_OK ||
-      sqlite3_exec(db.get(), "PRAGMA quick_check(1)", note, &verdict, nullptr) != SQLITE_OK) {
-    verdict = sqlite3_errmsg(db.get());
-  }
-  if (verdict == "ok") {
+  } else if (const std::string problem = admin::history_problem(); problem.empty()) {
     findings.ok("history", VORN_PATH_HISTORY_DB);
   } else {
-    findings.add(Level::error, "history", VORN_PATH_HISTORY_DB " is broken: " + verdict,
+    findings.add(Level::error, "history", VORN_PATH_HISTORY_DB " " + problem,
                  "move it away, the next run begins a new one");
   }
 }
@@ -157,8 +118,7 @@ void check_rights(Findings& findings) {
 void check_product(Findings& findings) {
   check_program(findings);
   check_template(findings);
-  check_schema(findings);
-  check_history(findings);
+  check_database(findings);
   check_rights(findings);
 }
 

@@ -7,14 +7,17 @@
 #include <fstream>
 
 #include "base/ctl.hpp"
+#include "base/stored_reports.hpp"
+#include "base/texts.hpp"
 #include "doctor/doctor.hpp"
-#include "run/profile_state.hpp"
-#include "run/run_paths.hpp"
 #include "schedule/cron_times.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
+#include "vorn/admin/runs.hpp"
 
 namespace ctl {
 namespace {
+
+using admin::RunState;
 
 bool cron_is_running() {
   std::error_code error;
@@ -55,18 +58,16 @@ void check_job(Findings& findings, const Job& job, const Configuration& configur
 void check_leftovers(Findings& findings, const Section& profile) {
   std::string folder;
   try {
-    folder = report_folder(profile);
+    folder = folder_of_reports(profile);
   } catch (const Failure&) {
     return;
   }
-  const auto left = host::unfinished_reports(folder);
-  const std::string statistics = host::statistics_path(profile.name);
+  const auto left = admin::leftovers_of(profile);
   if (!left) {
     findings.add(Level::error, "reports of " + profile.name,
                  host_failure(folder + " can't be used; move it away").what());
-  } else if (!left->empty() || access(statistics.c_str(), F_OK) == 0) {
-    findings.add(Level::warning, "leftovers of " + profile.name,
-                 left->empty() ? statistics : left->front(),
+  } else if (!left->empty()) {
+    findings.add(Level::warning, "leftovers of " + profile.name, left->front(),
                  "the next run removes them, or " + std::string(kProgram) + " --clean " +
                      profile.name + ", which removes the schedule as well");
   }
@@ -88,8 +89,9 @@ void check_schedules(Findings& findings, const Configuration& configuration) {
   }
   for (const Section& profile : configuration.profiles) {
     const std::string id = profile.value(kScheduleKey);
-    if (!id.empty() && access(cron_file(id).c_str(), F_OK) != 0) {
-      findings.add(Level::warning, "schedule of " + profile.name, cron_file(id) + " is missing",
+    if (!id.empty() && access(admin::schedule_file(id).c_str(), F_OK) != 0) {
+      findings.add(Level::warning, "schedule of " + profile.name,
+                   admin::schedule_file(id) + " is missing",
                    "run vornctl schedule " + profile.name + " with its times, or with --clean");
     }
   }
@@ -104,7 +106,7 @@ void check_schedules(Findings& findings, const Configuration& configuration) {
 void check_last_runs(Findings& findings, const Configuration& configuration) {
   for (const Section& profile : configuration.profiles) {
     const std::string subject = "last run of " + profile.name;
-    const RunState state = run_state(profile.name);
+    const RunState state = admin::last_run(profile.name).state;
     if (state == RunState::failed || state == RunState::ended_early) {
       findings.add(Level::warning, subject, word_for(state),
                    "look into the system log, then run vornctl run " + profile.name);

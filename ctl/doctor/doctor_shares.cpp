@@ -8,12 +8,8 @@
 #include <cstring>
 #include <memory>
 
-#include "base/text_containers.hpp"
 #include "doctor/doctor.hpp"
-#include "machine/file_system.hpp"
-#include "machine/mounts.hpp"
-#include "vorn/config.h"
-#include "vorn/paths.h"
+#include "report_format/reports.hpp"
 
 namespace ctl {
 namespace {
@@ -37,41 +33,32 @@ std::string folder_problem(const std::string& path) {
   return {};
 }
 
-bool is_network_share(const std::string& share) {
-  VLIBCSzHash section(1);
-  VLIBCSzHash* filled = &section;
-  return VLIBCFileGetSection(VORN_PATH_SHARES, share.c_str(), &filled) > 0 &&
-         section.find("network") != nullptr && std::strcmp(section.find("network"), "yes") == 0;
-}
-
 // Whether runs walk what lies there; asked for after the folder has answered.
-std::string kind_problem(const std::vector<host::Mount>& mounts, const host::Share& share) {
-  const host::Mount* mount = host::mount_holding(mounts, share.path.c_str());
-  if (mount == nullptr || host::is_walked(mount->kind)) {
+std::string kind_problem(const Share& share) {
+  const auto found = admin::file_system_of(share.path);
+  if (!found || found->is_walked) {
     return {};
   }
-  if (mount->kind == VORN_FS_REMOTE) {
-    return is_network_share(share.name)
-               ? ""
-               : share.path + " is a network file system (" + mount->type +
-                     "), which is left out; write network = yes into its section";
+  if (found->is_remote) {
+    return share.network ? ""
+                         : share.path + " is a network file system (" + found->type +
+                               "), which is left out; write network = yes into its section";
   }
-  return share.path + " is on a file system that is not walked (" + mount->type +
+  return share.path + " is on a file system that is not walked (" + found->type +
          "); give the folder of one that is";
 }
 
 }  // namespace
 
 void check_shares(Findings& findings, const Configuration& configuration) {
-  const std::vector<host::Mount> mounts = host::read_own_mounts();
-  for (const host::Share& share : configuration.shares) {
+  for (const Share& share : configuration.shares) {
     if (share.path.empty()) {
       continue;  // has its finding
     }
     const std::string subject = "share " + share.name;
     const auto answer = answer_within(kFolderLimit, [&] {
       const std::string problem = folder_problem(share.path);
-      return problem.empty() ? kind_problem(mounts, share) : problem;
+      return problem.empty() ? kind_problem(share) : problem;
     });
     if (!answer) {
       findings.add(Level::error, subject, share.path + " does not answer",
@@ -93,7 +80,8 @@ void check_shares(Findings& findings, const Configuration& configuration) {
 void check_quota_tool(Findings& findings, const Configuration& configuration) {
   constexpr const char* kTool = "/sbin/repquota";
   const auto wants = [](const Section& profile) {
-    return profile.value("report_list").find("quota_usage") != std::string::npos;
+    return report_format::is_selected(report_format::kQuotaUsage.name,
+                                      profile.value("report_list"));
   };
   const auto profile =
       std::find_if(configuration.profiles.begin(), configuration.profiles.end(), wants);

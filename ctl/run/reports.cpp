@@ -11,16 +11,15 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "base/child.hpp"
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
-#include "base/text_containers.hpp"
-#include "run/profile_state.hpp"
-#include "vorn/report.h"
+#include "base/stored_reports.hpp"
+#include "base/texts.hpp"
+#include "run/commands.hpp"
+#include "vorn/admin/runs.hpp"
 
 namespace ctl {
 namespace {
-
-using Reports = std::vector<host::StoredReport>;
 
 struct Options {
   std::string profile;
@@ -34,20 +33,19 @@ struct Options {
 void list(const Options& options, const std::string& folder, const Reports& reports) {
   if (options.json) {
     auto array = nlohmann::ordered_json::array();
-    for (const host::StoredReport& report : reports) {
+    for (const admin::StoredReport& report : reports) {
       array.push_back({{"name", report.name},
                        {"made", json_time(report.made)},
                        {"bytes", report.size},
                        {"complete", report.is_whole},
-                       {"path", folder + "/" + report.name + "/report.html"}});
+                       {"path", report.page}});
     }
     print_json(array);
     return;
   }
   Table table({{"DATE"}, {"SIZE", Table::Align::right}, {"COMPLETE"}, {"PATH"}});
-  for (const host::StoredReport& report : reports) {
-    table.add({report.name, size_text(report.size), report.is_whole ? "yes" : "no",
-               folder + "/" + report.name + "/report.html"});
+  for (const admin::StoredReport& report : reports) {
+    table.add({report.name, size_text(report.size), report.is_whole ? "yes" : "no", report.page});
   }
   if (table.empty()) {
     print_line("profile " + options.profile + " has no reports in " + folder);
@@ -59,9 +57,9 @@ void list(const Options& options, const std::string& folder, const Reports& repo
 // --- Opening ------------------------------------------------------------------------------------
 
 // The newest whole report whose name begins with `date`.
-const host::StoredReport& find_report(const Options& options, const Reports& reports) {
+const admin::StoredReport& find_report(const Options& options, const Reports& reports) {
   const auto found =
-      std::find_if(reports.rbegin(), reports.rend(), [&](const host::StoredReport& report) {
+      std::find_if(reports.rbegin(), reports.rend(), [&](const admin::StoredReport& report) {
         return report.is_whole && report.name.starts_with(options.argument);
       });
   if (found != reports.rend()) {
@@ -72,19 +70,9 @@ const host::StoredReport& find_report(const Options& options, const Reports& rep
                 "; see vornctl reports " + options.profile);
 }
 
-// The link that the report's mail has; empty when it can't be made.
-std::string link_to(const Section& profile, const std::string& page) {
-  VLIBCSzHash hash(profile.entries.size());
-  for (const auto& [key, value] : profile.entries) {
-    hash.set(key, value);
-  }
-  std::array<char, 8192> link{};
-  return VornGetTargetLink(&hash, page.c_str(), link.data(), link.size()) < 0 ? "" : link.data();
-}
-
-void open_report(const Options& options, const std::string& folder, const Reports& reports) {
+void open_report(const Options& options, const Reports& reports) {
   constexpr const char* kOpener = "/usr/bin/xdg-open";
-  const std::string page = folder + "/" + find_report(options, reports).name + "/report.html";
+  const std::string page = find_report(options, reports).page;
   const bool has_display =
       std::getenv("DISPLAY") != nullptr || std::getenv("WAYLAND_DISPLAY") != nullptr;
   if (has_display && access(kOpener, X_OK) == 0) {
@@ -96,8 +84,8 @@ void open_report(const Options& options, const std::string& folder, const Report
     }
   }
   print_line(page);
-  if (const std::string link = link_to(read_profile(options.profile), page); !link.empty()) {
-    print_line(link);
+  if (const auto link = admin::link_to(read_profile(options.profile), page)) {
+    print_line(*link);
   }
 }
 
@@ -129,7 +117,7 @@ std::size_t parse_count(const std::string& text) {
 
 // The whole reports, oldest first, without the `keep` newest.
 Reports all_but_newest(Reports reports, std::size_t keep) {
-  std::erase_if(reports, [](const host::StoredReport& report) { return !report.is_whole; });
+  std::erase_if(reports, [](const admin::StoredReport& report) { return !report.is_whole; });
   reports.resize(reports.size() - std::min(keep, reports.size()));
   return reports;
 }
@@ -138,18 +126,18 @@ Reports older_than(const Options& options, Reports reports) {
   const std::time_t limit =
       std::time(nullptr) - std::chrono::seconds(parse_age(options.older_than)).count();
   // A run that is going on may be about to mail the link to the newest.
-  const bool running = run_state(options.profile) == RunState::running;
+  const bool running = admin::last_run(options.profile).state == admin::RunState::running;
   reports = all_but_newest(std::move(reports), running ? 1 : 0);
   std::erase_if(reports,
-                [limit](const host::StoredReport& report) { return report.made >= limit; });
+                [limit](const admin::StoredReport& report) { return report.made >= limit; });
   return reports;
 }
 
 void remove(const Options& options, const std::string& folder, const Reports& doomed) {
   std::uint64_t bytes = 0;
   std::size_t removed = 0;
-  for (const host::StoredReport& report : doomed) {
-    if (!options.dry_run && !host::remove_report(folder, report.name)) {
+  for (const admin::StoredReport& report : doomed) {
+    if (!options.dry_run && !admin::remove_report(folder, report.name)) {
       continue;  // a message says why
     }
     print_line((options.dry_run ? "would remove " : "removed ") + folder + "/" + report.name);
@@ -177,11 +165,11 @@ void reports(const Options& options) {
                   kWrongUsage);
   }
   const std::size_t keep = options.action == "keep" ? parse_count(options.argument) : 0;
-  const std::string folder = report_folder(read_profile(options.profile));
-  const Reports found = reports_in(
-      folder, options.action == "open" ? host::ReportSize::left_out : host::ReportSize::measured);
+  const std::string folder = folder_of_reports(read_profile(options.profile));
+  const Reports found =
+      reports_in(folder, options.action == "open" ? ReportSize::left_out : ReportSize::measured);
   if (options.action == "open") {
-    open_report(options, folder, found);
+    open_report(options, found);
   } else if (options.action == "remove") {
     remove(options, folder, older_than(options, found));
   } else if (options.action == "keep") {

@@ -13,16 +13,16 @@
 #include <string>
 
 #include "base/child.hpp"
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
-#include "base/text_containers.hpp"
-#include "run/old_reports.hpp"
-#include "run/profile_state.hpp"
+#include "base/stored_reports.hpp"
+#include "report_format/reports.hpp"
+#include "run/commands.hpp"
 #include "run/run_log.hpp"
 #include "run/run_watch.hpp"
-#include "schedule/schedules.hpp"
-#include "vorn/paths.h"
-#include "vorn/report.h"
-#include "vornreport/registry.hpp"
+#include "schedule/jobs.hpp"
+#include "vorn/admin/history.hpp"
+#include "vorn/admin/runs.hpp"
 
 namespace ctl {
 namespace {
@@ -105,15 +105,14 @@ class ProgressLine {
 // --- Starting -----------------------------------------------------------------------------------
 
 int count_reports(const std::string& report_list) {
-  int count = 0;
-  for (const auto& entry : vornreport::report_registry()) {
-    count += vornreport::is_selected(entry, report_list.c_str()) ? 1 : 0;
-  }
-  return count;
+  const auto& all = report_format::kReports;
+  return static_cast<int>(std::count_if(all.begin(), all.end(), [&](const auto* report) {
+    return report_format::is_selected(report->name, report_list);
+  }));
 }
 
 [[noreturn]] void fail_as_running(const std::string& profile) {
-  const pid_t pid = running_process(profile);
+  const pid_t pid = admin::last_run(profile).process;
   throw Failure("profile " + profile + " is running already" +
                 (pid > 0 ? " (process " + std::to_string(pid) + ")" : "") +
                 "; wait for it, vornctl status shows when it is done");
@@ -130,7 +129,7 @@ void check_start(const Options& options, const Section& profile) {
   if (count_reports(profile.value("report_list")) == 0) {
     throw Failure("profile " + profile.name + " selects no report; set its key report_list");
   }
-  if (run_state(profile.name) == RunState::running) {
+  if (admin::last_run(profile.name).state == admin::RunState::running) {
     fail_as_running(profile.name);
   }
 }
@@ -166,25 +165,24 @@ void watch(Child& child, RunWatch& run) {
 // SIGTERM ends a run at once. What it leaves is what the next run would clear up; here it is done
 // at once, and the status says how the run ended.
 void clear_up(const Section& profile, bool is_report) {
-  if (!is_report || VornQazProfileRunning(profile.name.c_str()) != 0) {
-    return;
+  if (is_report && admin::hold_profile(profile.name) == admin::Hold::taken) {
+    admin::end_killed_run(profile);  // what it can't remove has a message
   }
-  VLIBCSzHash hash(profile.entries.size());
-  for (const auto& [key, value] : profile.entries) {
-    hash.set(key, value);
-  }
-  VornQazReportCleanTmp(profile.name.c_str(), &hash);
 }
 
 // --- The outcome --------------------------------------------------------------------------------
 
+bool has_succeeded(const Section& profile) {
+  return admin::last_run(profile.name).state == admin::RunState::succeeded;
+}
+
 // "global" keeps its status from before a collection to after it, so the history tells.
 bool has_collected(const Section& profile, std::time_t start) {
   if (profile.name == "global" ||
-      profile.value("report_list").find("volume_usage") != std::string::npos) {
-    return samples_since(profile.name, start) > 0;
+      report_format::is_selected(report_format::kVolumeUsage.name, profile.value("report_list"))) {
+    return admin::samples_since(profile.name, start) > 0;
   }
-  return run_state(profile.name) == RunState::succeeded;
+  return has_succeeded(profile);
 }
 
 [[noreturn]] void fail_with_log(const std::string& what, const RunLog& log, const Child& child,
@@ -199,18 +197,18 @@ bool has_collected(const Section& profile, std::time_t start) {
   throw Failure(what + "; see " + log.command() + ", and vornctl doctor");
 }
 
-std::vector<host::StoredReport> reports_of(const Section& profile) {
-  return reports_in(report_folder(profile), host::ReportSize::left_out);
+Reports reports_of(const Section& profile) {
+  return reports_in(folder_of_reports(profile), ReportSize::left_out);
 }
 
 // The page that isn't among the reports `before`; empty when there is none. After the clock was set
 // back it isn't the last one.
-std::string new_page(const Section& profile, const std::vector<host::StoredReport>& before) {
-  for (const host::StoredReport& report : reports_of(profile)) {
+std::string new_page(const Section& profile, const Reports& before) {
+  for (const admin::StoredReport& report : reports_of(profile)) {
     const bool is_new = std::none_of(before.begin(), before.end(),
                                      [&](const auto& known) { return known.name == report.name; });
     if (is_new && report.is_whole) {
-      return report_folder(profile) + "/" + report.name + "/report.html";
+      return report.page;
     }
   }
   return "";
@@ -219,7 +217,7 @@ std::string new_page(const Section& profile, const std::vector<host::StoredRepor
 void run(const Options& options) {
   const Section profile = read_profile(options.profile);
   check_start(options, profile);
-  const auto before = options.data ? std::vector<host::StoredReport>{} : reports_of(profile);
+  const auto before = options.data ? Reports{} : reports_of(profile);
   const std::time_t start = std::time(nullptr);
   const RunLog log;
   const SignalsNoted noted;
@@ -245,7 +243,7 @@ void run(const Options& options) {
     return;
   }
   const std::string page = new_page(profile, before);
-  if (run_state(profile.name) != RunState::succeeded || page.empty()) {
+  if (!has_succeeded(profile) || page.empty()) {
     fail_with_log("the run of profile " + profile.name + " failed", log, child, watched);
   }
   print_line(page);

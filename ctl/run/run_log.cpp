@@ -10,7 +10,7 @@
 #include <string_view>
 #include <thread>
 
-#include "base/process.hpp"
+#include "base/ask_program.hpp"
 #include "vorn/base/file_io.hpp"
 
 namespace ctl {

@@ -7,7 +7,7 @@
 #include <algorithm>
 #include <vector>
 
-#include "run/run_paths.hpp"
+#include "vorn/admin/runs.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/words.hpp"
 
@@ -147,7 +147,7 @@ void RunWatch::count_files() {
   constexpr off_t kPagesLookedAt = 16;
   constexpr std::size_t kPageSizeAt = 16;
   unsigned char head[kPageSizeAt + 2];
-  const host::Fd file(open(host::statistics_path(profile_).c_str(),
+  const host::Fd file(open(admin::statistics_file(profile_).c_str(),
                            O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
   struct stat status {};
   if (phase_ != Phase::gathering || !file || fstat(file.get(), &status) != 0 ||

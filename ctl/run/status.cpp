@@ -4,10 +4,13 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "base/configuration.hpp"
 #include "base/ctl.hpp"
-#include "run/profile_state.hpp"
-#include "run/report_figures.hpp"
-#include "schedule/schedules.hpp"
+#include "base/stored_reports.hpp"
+#include "base/texts.hpp"
+#include "run/commands.hpp"
+#include "schedule/jobs.hpp"
+#include "vorn/admin/figures.hpp"
 
 namespace ctl {
 namespace {
@@ -24,12 +27,12 @@ struct NextRun {
 
 struct ProfileStatus {
   std::string name;
-  RunState state = RunState::unknown;
+  admin::RunState state = admin::RunState::unknown;
   std::string last_report;  // path of the page; empty when there is none
   std::time_t made = 0;
   std::uint64_t size = 0;
   std::optional<NextRun> next;
-  std::optional<host::FullestVolume> fullest;
+  std::optional<admin::FullestVolume> fullest;
 };
 
 std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job>& jobs,
@@ -46,12 +49,12 @@ std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job
 
 // One folder that can't be read must not hide the other profiles.
 void add_report(const Section& profile, ProfileStatus& status) try {
-  const std::string folder = report_folder(profile);
-  if (const auto report = newest_whole(reports_in(folder, host::ReportSize::measured))) {
-    status.last_report = folder + "/" + report->name + "/report.html";
+  const Reports reports = reports_in(folder_of_reports(profile), ReportSize::measured);
+  if (const auto report = newest_whole(reports)) {
+    status.last_report = report->page;
     status.made = report->made;
     status.size = report->size;
-    status.fullest = host::read_figures(status.last_report.c_str()).volume;
+    status.fullest = admin::fullest_volume(report->page);
   }
 } catch (const Failure& failure) {
   warn(failure.what());
@@ -60,16 +63,16 @@ void add_report(const Section& profile, ProfileStatus& status) try {
 ProfileStatus status_of(const Section& profile, const std::vector<Job>& jobs, std::time_t now) {
   ProfileStatus status;
   status.name = profile.name;
-  status.state = run_state(profile.name);
+  status.state = admin::last_run(profile.name).state;
   status.next = next_of(profile.name, jobs, now);
   add_report(profile, status);
   return status;
 }
 
-nlohmann::ordered_json json_of(const host::FullestVolume& volume) {
+nlohmann::ordered_json json_of(const admin::FullestVolume& volume) {
   nlohmann::ordered_json json{
       {"volume", volume.name}, {"percent", volume.percent}, {"days_to_full", nullptr}};
-  if (volume.outlook == host::Outlook::days || volume.outlook == host::Outlook::soon) {
+  if (volume.outlook == admin::Outlook::days || volume.outlook == admin::Outlook::soon) {
     json["days_to_full"] = volume.days;
   }
   return json;
@@ -98,21 +101,21 @@ void print_as_json(const std::vector<ProfileStatus>& all) {
   print_json(array);
 }
 
-std::string volume_text(const host::FullestVolume& volume) {
+std::string volume_text(const admin::FullestVolume& volume) {
   char percent[32];
   std::snprintf(percent, sizeof percent, "%.0f %%", volume.percent);
   return std::string(percent) + " of " + volume.name;
 }
 
-std::string days_text(const host::FullestVolume& volume) {
+std::string days_text(const admin::FullestVolume& volume) {
   switch (volume.outlook) {
-    case host::Outlook::days:
+    case admin::Outlook::days:
       return std::to_string(volume.days);
-    case host::Outlook::soon:
+    case admin::Outlook::soon:
       return "< 1";
-    case host::Outlook::no_growth:
+    case admin::Outlook::no_growth:
       return "not filling";
-    case host::Outlook::unknown:
+    case admin::Outlook::unknown:
       break;
   }
   return "-";

@@ -199,6 +199,9 @@ class Profiles(ControlTest):
              'keep_reports = 3\n', ''),
             ((*put, 'language', 'fr', 'keep_reports', '2'),
              before.replace('language=de', 'language = fr\nkeep_reports = 2'), ''),
+            ((*put, 'report_list', 'large_file_db;share_list', 'duplicate_compare', 'TRUE'),
+             before.replace('report_list = share_list', 'report_list = large_file_db;share_list')
+             + 'duplicate_compare = TRUE\n', ''),
             ((*put, 'language', ''), before.replace('language=de\n', ''), ''),
             (('profile', 'remove', 'p'), self.GLOBAL, ''),
             *((('profile', 'add', name), None, message) for name, message in (
@@ -206,6 +209,7 @@ class Profiles(ControlTest):
                 ('a]\n[b', 'no profile name'), ('.a', 'no profile name'))),
             *(((*put, key, value), None, message) for key, value, message in (
                 ('report_list', 'large_fiel', 'mean "large_file"'), ('report_list', '', 'empty'),
+                ('report_list', 'share_list; larg_file', '"larg_file"'),
                 ('share_list', 'photo', 'mean "photos"'), ('share_list', 'q', 'share add'),
                 ('language', 'tlh', 'there are de, en'), ('mail_to', 'a@b, c', '"c" is no mail'),
                 ('mail_from', 'a', 'no mail address'), ('smtp_url', 'http://x', 'smtp://host'),
@@ -213,6 +217,7 @@ class Profiles(ControlTest):
                 ('smtp_password_file', '/etc/passwd', 'open to every user'),
                 ('report_dir', 'r', 'not absolute'), ('report_dir', '/etc/passwd/r', 'no folder'),
                 ('link_base', 'x', 'http'), ('limit_user', 'nobody,rot', '"rot" is no user'),
+                ('language', "de-'", 'not installed'),
                 ('duplicate_compare', '1', 'true nor false'), ('keep_reports', '0', 'from 1 on'),
                 ('schedule_collect_id', 'a.b', 'identifier'), ('mail_t', 'x', 'mean "mail_to"'),
                 ('mail_from', 'a@b\nc = d', 'line break'), (b'limit_user', b'\xff', 'not UTF-8'))),
@@ -261,10 +266,14 @@ class Completion(ControlTest):
         self.m.share('photos')
         self.m.share('my docs')
         self.m.profile('weekly', report_list='share_list')
+        languages = self.m.vorn / 'vornreport/reportUI/template/lang'
+        for name, text in (('de.bak.json', '{}'), ('de.json.bak', '{}'), ('dx.json', '{'),
+                           ('dy.json', '[]'), ('dz.js', '{}'), ('da.json', '{}')):
+            (languages / name).write_text(text)
         for words, expected in (
                 ('sh', 'share'), ('share remove ', 'photos|my docs'), ('run w', 'weekly'),
                 ('share add x ', '/folders'), ('profile set weekly lang', 'language'),
-                ('profile set weekly language d', 'de'),
+                ('profile set weekly language d', 'da|de'),
                 ('profile set weekly language de volume_history ', 'true|false'),
                 ('profile add x --reports large_file,q', 'large_file,quota_usage'),
                 ('profile add x --rep', '--reports|--report-dir'), ('profile show weekly ', '')):

@@ -13,6 +13,7 @@ from pathlib import Path
 from harness import LIMIT, PROGRAM, ProductTest, Run, make_files, wait_for
 
 CTL = '/usr/vorn/bin/vornctl'
+ALONE = 'unshare', '--pid', '--fork', '--kill-child', '--mount-proc'  # sees its own processes only
 WHOLE, CUT = '<!DOCTYPE html>\n</html>\n', '<!DOCTYPE html>\n'
 
 
@@ -228,8 +229,7 @@ class Schedules(CtlTest):
                            '/var/spool/cron', '--bind', self.m.base / 'crontab', '/etc/crontab']
         self.m.profile('hourly', report_list='volume_usage')
         self.check(['schedule', 'hourly', '--data', '* * * * *'], out='--data hourly: .*\n')
-        cron = Run(self.m, ['unshare', '--pid', '--fork', '--kill-child', '--mount-proc',
-                            'cron', '-f'], None)
+        cron = Run(self.m, [*ALONE, 'cron', '-f'], None)
         self.addCleanup(cron.finish)
         self.addCleanup(cron.process.terminate)
         history = self.m.vorn / 'etc/vornreport.db'
@@ -396,6 +396,7 @@ class Doctor(CtlTest):
         line = f'* * * * * root {PROGRAM} --data weekly\n'
         for word, expected, breaks in (
                 ('', '', lambda: None),
+                ('', '', configure(report_list='large_file_db share_list', volume_history='TRUE')),
                 ('error', 'program: .*can\'t be run', lambda: place('bin/vornreport').chmod(0o644)),
                 ('error', 'template: ', lambda: place(script).unlink()),
                 ('error', 'template: ', write(script, '#!/bin/sh\nexit 3\n')),
@@ -433,7 +434,8 @@ class Doctor(CtlTest):
                 self.m.share('photos')
                 self.m.profile('weekly', report_list='share_list')
                 breaks()
-                run = self.ctl('doctor', '--json')
+                # Alone: this machine's own cron isn't the one that the doctor looks for.
+                run = Run(self.m, [*ALONE, CTL, 'doctor', '--json'], None).finish()
                 found = json.loads(run.out)
                 bad = [entry for entry in found if entry['level'] != 'ok']
                 errors = [entry for entry in bad if entry['level'] == 'error']

@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <cstring>
 
+#include "base/text_containers.hpp"
 #include "vorn/config.h"
 #include "vorn/report.h"
 #include "vorn/share.h"
@@ -114,7 +115,7 @@ int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash) {
 
 int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key) {
   record("ScheduleClean", profile, key);
-  VLIBCSzHashRemove(hash, key);
+  (*hash)->remove(key);
   return answer("ScheduleClean", platform.schedule_clean);
 }
 

@@ -12,6 +12,7 @@
 #include <ctime>
 
 #include "base/host_log.hpp"
+#include "base/text_containers.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/utf8.hpp"
 #include "vorn/report.h"
@@ -106,6 +107,19 @@ bool copy_file(int from, int to) {
   }
 }
 
+// The script block of VornQazImportSharePathHash. Its keys are computed ones, so that a share
+// named __proto__ is an entry like any other.
+std::string share_path_block(const VLIBCSzHash& share_paths) {
+  std::string block = "<script type='text/javascript'>\nvar vornSharePath = {\n";
+  const char* separator = "";
+  for (const auto& [share, path] : share_paths.sorted()) {
+    block += separator;
+    block += "['" + escape_js(share, '\'') + "'] : '" + escape_js(path, '\'') + "'";
+    separator = ",\n";
+  }
+  return block + "\n};\n</script>\n";
+}
+
 }  // namespace
 
 std::string escape_js(std::string_view text, char quote) {
@@ -137,17 +151,6 @@ std::string csv_field(std::string_view text) {
     out += is_blank(c) ? ' ' : c;
   }
   return out;
-}
-
-std::string share_path_block(const VLIBCSzHash& share_paths) {
-  std::string block = "<script type='text/javascript'>\nvar vornSharePath = {\n";
-  const char* separator = "";
-  for (const auto& [share, path] : share_paths.sorted()) {
-    block += separator;
-    block += "['" + escape_js(share, '\'') + "'] : '" + escape_js(path, '\'') + "'";
-    separator = ",\n";
-  }
-  return block + "\n};\n</script>\n";
 }
 
 }  // namespace host

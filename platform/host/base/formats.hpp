@@ -5,8 +5,6 @@
 #include <string>
 #include <string_view>
 
-#include "base/text_containers.hpp"
-
 namespace host {
 
 // As VornQazEscChar.
@@ -14,10 +12,6 @@ std::string escape_js(std::string_view text, char quote);
 
 // As VornQazFormatCsvString.
 std::string csv_field(std::string_view text);
-
-// The script block of VornQazImportSharePathHash. Its keys are computed ones, so that a share
-// named __proto__ is an entry like any other.
-std::string share_path_block(const VLIBCSzHash& share_paths);
 
 }  // namespace host
 

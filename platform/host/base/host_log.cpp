@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
+#include <utility>
 
 namespace host {
 namespace {
@@ -13,7 +14,7 @@ void to_syslog(const char* line) {
   syslog(LOG_ERR, "%s", line);
 }
 
-void (*log_sink)(const char* line) = to_syslog;
+LogSink log_sink = to_syslog;
 
 }  // namespace
 
@@ -34,8 +35,8 @@ void log_line(const char* format, ...) {
   errno = saved_errno;
 }
 
-void redirect_log(void (*sink)(const char* line)) {
-  log_sink = sink;
+LogSink redirect_log(LogSink sink) {
+  return std::exchange(log_sink, sink);
 }
 
 }  // namespace host

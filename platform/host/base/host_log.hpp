@@ -8,8 +8,9 @@ namespace host {
 // they are: control characters come out as '?', so that a problem is always one line. errno stays.
 [[gnu::format(printf, 1, 2)]] void log_line(const char* format, ...);
 
-// From now on lines go to `sink` instead, for programs that show them themselves.
-void redirect_log(void (*sink)(const char* line));
+// From now on lines go to `sink`, for programs that show them themselves. Where they went before.
+using LogSink = void (*)(const char* line);
+LogSink redirect_log(LogSink sink);
 
 }  // namespace host
 

@@ -83,14 +83,10 @@ void VLIBCSzHash::set(std::string_view key, std::string_view value) {
   }
 }
 
-bool VLIBCSzHash::remove(std::string_view key) {
-  const auto entry = entries_.find(key);
-  if (entry == entries_.end()) {
-    return false;
+void VLIBCSzHash::remove(std::string_view key) {
+  if (const auto entry = entries_.find(key); entry != entries_.end()) {
+    entries_.erase(entry);
   }
-  const bool had_value = entry->second.has_value();
-  entries_.erase(entry);
-  return had_value;
 }
 
 std::vector<VLIBCSzHash::Entry> VLIBCSzHash::sorted() const {
@@ -138,13 +134,6 @@ int VLIBCSzHashSetValue(VLIBCSzHash** hash, const char* key, const char* value) 
     (*hash)->set(key, value);
     return 0;
   });
-}
-
-int VLIBCSzHashRemove(VLIBCSzHash** hash, const char* key) {
-  if (hash == nullptr || *hash == nullptr || key == nullptr) {
-    return -1;
-  }
-  return guarded(-1, [=] { return (*hash)->remove(key) ? 1 : 0; });
 }
 
 VLIBCSzList* VLIBCSzListAlloc([[maybe_unused]] size_t slots) {

@@ -46,7 +46,7 @@ struct VLIBCSzHash {
 
   const char* find(std::string_view key) const;
   void set(std::string_view key, std::string_view value);
-  bool remove(std::string_view key);
+  void remove(std::string_view key);
   std::vector<Entry> sorted() const;
 
   // The section of a file that the entries were read from, as it was then: who writes them back

@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <chrono>
 #include <cstring>
 #include <exception>
 
@@ -19,10 +18,9 @@ namespace {
 using Entries = std::vector<VLIBCSzHash::Entry>;
 
 constexpr std::size_t kLargestFile = 16U << 20U;
-constexpr std::chrono::milliseconds kLockWait = std::chrono::seconds(10);
 
 int fail(int code, int line) {
-  VLIBCErrSetEx(code, "platform/host/config.cpp", line);
+  VLIBCErrSetEx(code, "platform/host/config/config.cpp", line);
   return -1;
 }
 
@@ -43,14 +41,14 @@ int get_section(const char* file, std::string_view section, VLIBCSzHash& hash) {
   if (result != FindResult::found) {
     return find_failure(result, __LINE__);
   }
-  hash.origin = {file, std::string(section), {}};
+  int keys = 0;
   for (std::size_t i = range.header + 1; i < range.end; ++i) {
     if (lines[i].kind == LineKind::entry) {
       hash.set(lines[i].name, lines[i].value);
-      hash.origin->entries.emplace(lines[i].name, lines[i].value);
+      ++keys;
     }
   }
-  return static_cast<int>(hash.origin->entries.size());
+  return keys;
 }
 
 // --- Rewriting ----------------------------------------------------------------------------------
@@ -121,38 +119,30 @@ std::string rewritten(const std::vector<ConfigLine>& lines, const SectionRange& 
   return text;
 }
 
-// The entries that `hash` means, now that the section holds `lines`: of a section that it was read
-// from what it has changed since, and all the rest as the section has it. Somebody else may have
-// changed that in between. The views are those of `hash` and `lines`.
-Entries meant_entries(const VLIBCSzHash& hash, const std::vector<ConfigLine>& lines,
-                      const SectionRange& range, const char* file, std::string_view section) {
-  Entries wanted = hash.sorted();
-  if (!hash.origin || hash.origin->file != file || hash.origin->section != section) {
-    return wanted;
+int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
+                std::string_view format) {
+  const Entries entries = hash.sorted();
+  if (!valid_format(format)) {
+    log_line("%s: not rewritten: the line format needs %%s twice and a line end", file);
+    return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
-  const auto& before = hash.origin->entries;
-  Entries meant;
-  for (std::size_t i = range.header + 1; i < range.end; ++i) {
-    if (lines[i].kind != LineKind::entry) {
-      continue;
-    }
-    const char* value = hash.find(lines[i].name);
-    const auto known = before.find(lines[i].name);
-    const bool is_removed = value == nullptr && known != before.end();
-    const bool is_changed = value != nullptr && (known == before.end() || known->second != value);
-    if (!is_removed) {
-      meant.emplace_back(lines[i].name, is_changed ? std::string_view(value) : lines[i].value);
-    }
+  if (!entries_fit(file, format, entries)) {
+    return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
-  for (const VLIBCSzHash::Entry& entry : wanted) {
-    const auto known = before.find(entry.first);
-    const bool is_there = std::any_of(meant.begin(), meant.end(),
-                                      [&](const auto& e) { return e.first == entry.first; });
-    if (!is_there && (known == before.end() || known->second != entry.second)) {
-      meant.push_back(entry);
+  return rewrite_config(file, [&](std::string_view text) -> std::optional<std::string> {
+    const std::vector<ConfigLine> lines = parse_lines(text);
+    SectionRange range;
+    const FindResult result = find_section(lines, file, section, range);
+    if (result == FindResult::missing) {
+      log_line("%s: section [%.*s] is missing, so it can't be rewritten", file,
+               static_cast<int>(std::min<std::size_t>(section.size(), 100)), section.data());
     }
-  }
-  return meant;
+    if (result != FindResult::found) {
+      find_failure(result, __LINE__);
+      return std::nullopt;
+    }
+    return rewritten(lines, range, format, entries);
+  });
 }
 
 }  // namespace
@@ -168,31 +158,6 @@ std::optional<std::string> read_config(const char* file) {
 
 bool config_is_readable(const char* file) {
   return read_config(file).has_value();
-}
-
-int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
-                std::string_view format, std::chrono::milliseconds lock_wait) {
-  if (!valid_format(format)) {
-    log_line("%s: not rewritten: the line format needs %%s twice and a line end", file);
-    return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
-  }
-  if (!entries_fit(file, format, hash.sorted())) {
-    return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
-  }
-  return rewrite_config(file, lock_wait, [&](std::string_view text) -> std::optional<std::string> {
-    const std::vector<ConfigLine> lines = parse_lines(text);
-    SectionRange range;
-    const FindResult result = find_section(lines, file, section, range);
-    if (result == FindResult::missing) {
-      log_line("%s: section [%.*s] is missing, so it can't be rewritten", file,
-               static_cast<int>(std::min<std::size_t>(section.size(), 100)), section.data());
-    }
-    if (result != FindResult::found) {
-      find_failure(result, __LINE__);
-      return std::nullopt;
-    }
-    return rewritten(lines, range, format, meant_entries(hash, lines, range, file, section));
-  });
 }
 
 }  // namespace host
@@ -216,7 +181,7 @@ int VLIBCFileSetSection(const char* file, const char* section, const char* new_n
     return host::fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
   try {
-    return host::set_section(file, section, *hash, line_format, host::kLockWait);
+    return host::set_section(file, section, *hash, line_format);
   } catch (const std::exception&) {
     return host::fail(VLIBC_ERR_FILE_IO, __LINE__);
   }

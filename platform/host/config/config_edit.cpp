@@ -220,9 +220,8 @@ std::optional<std::string> edited(const char* file, std::string_view text,
 
 }  // namespace
 
-int edit_section(const char* file, const SectionEdit& edit, std::chrono::milliseconds lock_wait) {
-  return rewrite_config(file, lock_wait,
-                        [&](std::string_view text) { return edited(file, text, edit); });
+int edit_section(const char* file, const SectionEdit& edit) {
+  return rewrite_config(file, [&](std::string_view text) { return edited(file, text, edit); });
 }
 
 }  // namespace host

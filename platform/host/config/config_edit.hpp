@@ -2,7 +2,6 @@
 #ifndef VORN_HOST_CONFIG_EDIT_HPP
 #define VORN_HOST_CONFIG_EDIT_HPP
 
-#include <chrono>
 #include <optional>
 #include <string>
 #include <utility>
@@ -29,8 +28,7 @@ struct SectionEdit {
 // section with exactly its entries, and every other section with those it had.
 // 0; -1 with nothing changed and one log line: the section is there already (add) or isn't (change,
 // remove), it is malformed, a name or value doesn't fit a line, or the file can't be replaced.
-int edit_section(const char* file, const SectionEdit& edit,
-                 std::chrono::milliseconds lock_wait = std::chrono::seconds(10));
+int edit_section(const char* file, const SectionEdit& edit);
 
 }  // namespace host
 

@@ -2,13 +2,10 @@
 #ifndef VORN_HOST_CONFIG_FILE_HPP
 #define VORN_HOST_CONFIG_FILE_HPP
 
-#include <chrono>
 #include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
-
-#include "vorn/config.h"
 
 namespace host {
 
@@ -18,15 +15,11 @@ std::optional<std::string> read_config(const char* file);
 bool config_is_readable(const char* file);
 
 // Puts in the place of `file` what `change` makes of its text: atomically, with the same owner and
-// mode, under a lock against a second writer, for which it waits at most `lock_wait`. A link to the
+// mode, under a lock against a second writer, for which it waits at most ten seconds. A link to the
 // file stays. 0; -1 on failure with nothing changed, one log line, and VLIBCErrGet set. `change`
 // returns nothing to leave the file as it is, after having done the latter two itself.
 using TextChange = std::function<std::optional<std::string>(std::string_view text)>;
-int rewrite_config(const char* file, std::chrono::milliseconds lock_wait, const TextChange& change);
-
-// VLIBCFileSetSection, waiting at most `lock_wait` for another writer.
-int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
-                std::string_view format, std::chrono::milliseconds lock_wait);
+int rewrite_config(const char* file, const TextChange& change);
 
 }  // namespace host
 

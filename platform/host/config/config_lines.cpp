@@ -40,7 +40,7 @@ bool check_section(const std::vector<ConfigLine>& lines, const char* file,
   for (std::size_t i = range.header + 1; i < range.end; ++i) {
     const char* problem = lines[i].problem;
     if (lines[i].kind == LineKind::entry && !keys.insert(lines[i].name).second) {
-      problem = "this key stands in the section twice";
+      problem = kRepeatedKey;
     }
     if (problem != nullptr) {
       log_malformed(file, i, problem);
@@ -114,7 +114,7 @@ FindResult find_section(const std::vector<ConfigLine>& lines, const char* file,
     }
     inside = lines[i].name == section;
     if (inside && found) {
-      log_malformed(file, i, "a section of this name stands above already");
+      log_malformed(file, i, kRepeatedSection);
       return FindResult::malformed;
     }
     if (inside) {

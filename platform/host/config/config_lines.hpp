@@ -22,6 +22,10 @@ struct ConfigLine {
   bool looks_like_a_header = false;  // of a malformed line
 };
 
+// What is wrong with a line that is well-formed by itself.
+inline constexpr const char* kRepeatedSection = "a section of this name stands above already";
+inline constexpr const char* kRepeatedKey = "this key stands in the section twice";
+
 ConfigLine parse_line(std::string_view bytes);
 std::vector<ConfigLine> parse_lines(std::string_view text);
 

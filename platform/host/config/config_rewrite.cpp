@@ -5,6 +5,7 @@
 
 #include <array>
 #include <cerrno>
+#include <chrono>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
@@ -19,7 +20,7 @@ namespace host {
 namespace {
 
 int fail(int code, int line) {
-  VLIBCErrSetEx(code, "platform/host/config_rewrite.cpp", line);
+  VLIBCErrSetEx(code, "platform/host/config/config_rewrite.cpp", line);
   return -1;
 }
 
@@ -29,8 +30,9 @@ const char* remedy(int error) {
 
 // Taken beside the file, because the file itself is replaced; never removed, because a writer that
 // waits on a removed lock file would not keep out one that made it anew.
-Fd lock_beside(const std::string& file, std::chrono::milliseconds wait) {
+Fd lock_beside(const std::string& file) {
   constexpr std::chrono::milliseconds kPause{20};
+  constexpr std::chrono::seconds kLongestWait{10};
   const std::size_t slash = file.rfind('/') + 1;
   const std::string path = file.substr(0, slash) + "." + file.substr(slash) + ".lock";
   Fd lock(open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
@@ -40,7 +42,7 @@ Fd lock_beside(const std::string& file, std::chrono::milliseconds wait) {
     fail(VLIBC_ERR_FILE_IO, __LINE__);
     return lock;
   }
-  const auto deadline = std::chrono::steady_clock::now() + wait;
+  const auto deadline = std::chrono::steady_clock::now() + kLongestWait;
   while (flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
     if (errno != EWOULDBLOCK || std::chrono::steady_clock::now() >= deadline) {
       log_line("%s is being changed by another process (lock file %s); it is unchanged, try again",
@@ -88,13 +90,12 @@ bool replace(const std::string& file, std::string_view text) {
 
 }  // namespace
 
-int rewrite_config(const char* file, std::chrono::milliseconds lock_wait,
-                   const TextChange& change) {
+int rewrite_config(const char* file, const TextChange& change) {
   const int saved_errno = errno;
   // An administrator's link to the file stays; what it leads to is what gets replaced.
   const std::unique_ptr<char, decltype(&std::free)> resolved(realpath(file, nullptr), &std::free);
   const std::string target = resolved ? resolved.get() : file;
-  const Fd lock = lock_beside(target, lock_wait);
+  const Fd lock = lock_beside(target);
   if (!lock) {
     return -1;
   }

@@ -1,7 +1,6 @@
 // The language of the page.
 #include "config/language.hpp"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <string_view>
@@ -9,16 +8,6 @@
 #include "base/host_log.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
-
-namespace host {
-
-bool is_language_code(std::string_view code) {
-  return !code.empty() && code.front() != '-' && std::all_of(code.begin(), code.end(), [](char c) {
-    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '-';
-  });
-}
-
-}  // namespace host
 
 int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size) {
   constexpr std::string_view kDefault = "en";

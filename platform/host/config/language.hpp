@@ -2,13 +2,11 @@
 #ifndef VORN_HOST_LANGUAGE_HPP
 #define VORN_HOST_LANGUAGE_HPP
 
-#include <string_view>
+#include "report_format/values.hpp"
 
 namespace host {
 
-// Whether `code` is letters, digits and '-', not beginning with one: fit for a word of a shell
-// command and for the name of a file.
-bool is_language_code(std::string_view code);
+using report_format::is_language_code;
 
 }  // namespace host
 

@@ -62,7 +62,7 @@ int clean_schedule(const char* profile, VLIBCSzHash& hash, const char* key) {
   if (id.empty()) {
     return 0;
   }
-  if (!only(id, "_-")) {
+  if (!valid_schedule_id(id)) {
     log_line(
         "profile \"%s\": %s = %.80s is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -); "
         "correct it in %s",
@@ -71,7 +71,7 @@ int clean_schedule(const char* profile, VLIBCSzHash& hash, const char* key) {
     return -1;
   }
   const int saved_errno = errno;
-  const std::string path = VORN_PATH_CRON "/vornreport-" + id;
+  const std::string path = schedule_file(id);
   struct stat status {};
   if (lstat(path.c_str(), &status) == 0) {
     if (!S_ISREG(status.st_mode) && !S_ISLNK(status.st_mode)) {
@@ -108,6 +108,14 @@ bool valid_profile(const char* profile) {
   }
   errno = EINVAL;
   return false;
+}
+
+bool valid_schedule_id(std::string_view id) {
+  return only(id, "_-");
+}
+
+std::string schedule_file(const std::string& id) {
+  return VORN_PATH_CRON "/vornreport-" + id;
 }
 
 }  // namespace host

@@ -44,12 +44,13 @@ const char* account_name_error(std::string_view name) {
   return nullptr;
 }
 
+namespace {
+
+// The name to hand out for the name service's `name`: a domain is set off by '/'.
 std::string shown_account_name(std::string name) {
   std::replace(name.begin(), name.end(), '\\', '/');
   return name;
 }
-
-namespace {
 
 struct Account {
   std::string name;  // the name service's

@@ -2,7 +2,6 @@
 #ifndef VORN_HOST_USERS_HPP
 #define VORN_HOST_USERS_HPP
 
-#include <string>
 #include <string_view>
 
 namespace host {
@@ -10,9 +9,6 @@ namespace host {
 // What keeps `name` from being handed out (see vorn/user.h), as the end of a sentence that begins
 // with "its name"; null when nothing does.
 const char* account_name_error(std::string_view name);
-
-// The name to hand out for the name service's `name`: a domain is set off by '/'.
-std::string shown_account_name(std::string name);
 
 }  // namespace host
 

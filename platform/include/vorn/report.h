@@ -75,7 +75,7 @@ void VornQazProgressEnd(const char* profile);
 // failure with one syslog line.
 int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key);
 
-// Copies the profile's language code (key `language`, default "en") into `code`. Only letters,
+// Copies the profile's language code (key `language`, default "en") into `code`. 1 to 7 letters,
 // digits and '-' pass, at most `size` - 1 bytes and not beginning with '-'; anything else is one
 // syslog line and "en", so that no report is lost over it. 0, or -1 for a null argument or a `code`
 // that "en" doesn't fit.

@@ -25,8 +25,6 @@ const char* VLIBCSzHashGetValue(const VLIBCSzHash* hash, const char* key);
 // Adds or replaces one entry. Takes the address of the hash because a platform may move it.
 // 0, or -1 for a null argument.
 int VLIBCSzHashSetValue(VLIBCSzHash** hash, const char* key, const char* value);
-// Removes one entry. 1 when it was there, 0 when not, -1 for a null argument.
-int VLIBCSzHashRemove(VLIBCSzHash** hash, const char* key);
 
 // A list of texts in the order of their adding.
 typedef struct VLIBCSzList VLIBCSzList;

@@ -1,20 +1,16 @@
-// Texts, tables and JSON for whoever sits in front of vornctl.
+#include "base/ctl.hpp"
+
 #include <algorithm>
 #include <cstdio>
 #include <cwchar>
 #include <nlohmann/json.hpp>
 
 #include "base/ctl.hpp"
-#include "base/host_log.hpp"
+#include "vorn/admin/messages.hpp"
 #include "vorn/base/utf8.hpp"
 
 namespace ctl {
 namespace {
-
-std::vector<std::string>& host_messages() {
-  static std::vector<std::string> messages;
-  return messages;
-}
 
 void append_escape(std::string& out, char32_t code) {
   char escape[12];
@@ -31,13 +27,8 @@ constexpr bool is_layout(char32_t code) {
 
 }  // namespace
 
-std::vector<std::string> take_host_messages() {
-  host::redirect_log([](const char* line) { host_messages().emplace_back(line); });
-  return std::exchange(host_messages(), {});
-}
-
 Failure host_failure(const std::string& otherwise) {
-  const std::vector<std::string> messages = take_host_messages();
+  const std::vector<std::string> messages = admin::take_messages();
   for (std::size_t i = 0; i + 1 < messages.size(); ++i) {
     warn(messages[i]);
   }

@@ -1,6 +1,6 @@
 // Programs of the system that vornctl asks.
-#ifndef VORN_CTL_PROCESS_HPP
-#define VORN_CTL_PROCESS_HPP
+#ifndef VORN_CTL_ASK_PROGRAM_HPP
+#define VORN_CTL_ASK_PROGRAM_HPP
 
 #include <chrono>
 #include <optional>

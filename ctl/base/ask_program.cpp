@@ -1,4 +1,4 @@
-#include "base/process.hpp"
+#include "base/ask_program.hpp"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -37,12 +37,12 @@ Pipe make_pipe() {
 }
 
 // A started program; it doesn't outlive its owner.
-class Child {
+class Started {
  public:
-  explicit Child(pid_t pid) : pid_(pid) {}
-  Child(const Child&) = delete;
-  Child& operator=(const Child&) = delete;
-  ~Child() {
+  explicit Started(pid_t pid) : pid_(pid) {}
+  Started(const Started&) = delete;
+  Started& operator=(const Started&) = delete;
+  ~Started() {
     if (pid_ > 0) {
       kill(pid_, SIGKILL);
       wait();
@@ -118,7 +118,7 @@ std::optional<Answer> ask_program(const std::vector<std::string>& arguments,
   if (pid == 0) {
     return std::nullopt;
   }
-  Child child(pid);
+  Started program(pid);
   out.write = {};
   error.write = {};
   Answer answer;
@@ -139,7 +139,7 @@ std::optional<Answer> ask_program(const std::vector<std::string>& arguments,
       }
     }
   }
-  answer.status = child.wait();
+  answer.status = program.wait();
   return answer;
 }
 

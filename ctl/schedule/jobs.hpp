@@ -1,6 +1,6 @@
 // The scheduled runs of the machine: lines in cron's files that run vornreport.
-#ifndef VORN_CTL_SCHEDULES_HPP
-#define VORN_CTL_SCHEDULES_HPP
+#ifndef VORN_CTL_JOBS_HPP
+#define VORN_CTL_JOBS_HPP
 
 #include <ctime>
 #include <optional>
@@ -8,10 +8,11 @@
 #include <string_view>
 #include <vector>
 
-#include "config/config.hpp"
+#include "base/configuration.hpp"
 
 namespace ctl {
 
+inline constexpr std::size_t kLargestCronFile = 1U << 20U;  // that is looked into
 inline constexpr const char* kScheduleKey = "schedule_collect_id";
 inline constexpr const char* kProgram = "/usr/vorn/bin/vornreport";
 
@@ -29,8 +30,9 @@ struct Job {
 
 // The jobs in `text`, the content of the cron file `file`.
 std::vector<Job> jobs_in(const std::string& file, std::string_view text);
-// Whether `text` holds nothing but jobs of `profile`, comments and blank lines.
-bool only_runs(const std::string& profile, std::string_view text);
+// Throws a Failure when `text`, the content of the cron file `file`, holds anything else than jobs
+// of `profile`, comments and blank lines.
+void check_runs_only(const std::string& profile, const std::string& file, std::string_view text);
 
 // The jobs in the files that cron reads: /etc/crontab and those of /etc/cron.d.
 std::vector<Job> scheduled_jobs();
@@ -41,8 +43,9 @@ std::optional<std::time_t> next_run(const Job& job, std::time_t now);
 // Why cron would not read `file`, and what to do; empty when nothing is wrong.
 std::string cron_file_problem(const std::string& file);
 
-// The cron file of a schedule identifier.
-std::string cron_file(const std::string& id);
+// Removes the cron file of the profile's schedule, if it runs nothing else. Its path, or an empty
+// text when the profile has no schedule. Throws a Failure when it stays.
+std::string remove_cron_file(const Section& profile);
 
 }  // namespace ctl
 

@@ -16,9 +16,11 @@
 #include <cstring>
 
 #include "base/ctl.hpp"
-#include "run/profile_state.hpp"
+#include "base/texts.hpp"
+#include "schedule/commands.hpp"
 #include "schedule/cron_times.hpp"
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
+#include "vorn/admin/runs.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
@@ -32,19 +34,10 @@ struct Options {
   bool clean = false;
 };
 
-constexpr std::size_t kLongestId = 64;
-constexpr std::size_t kLargestCronFile = 1U << 20U;
-
-bool is_id(std::string_view id) {
-  return !id.empty() && id.size() <= kLongestId &&
-         id.find_first_not_of("ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789_-") ==
-             std::string_view::npos;
-}
-
 // An identifier that no other profile name gives. Cron leaves out files with a dot in their name,
 // so a name with dots gets a digest behind it.
 std::string id_for(const std::string& profile) {
-  if (is_id(profile)) {
+  if (admin::is_schedule_id(profile)) {
     return profile;
   }
   constexpr std::size_t kKept = 48;
@@ -62,7 +55,7 @@ std::string id_for(const std::string& profile) {
 // The identifier that the profile has, unless it is of no use: then a new one.
 std::string schedule_id(const Section& profile) {
   std::string kept = profile.value(kScheduleKey);
-  if (!is_id(kept)) {
+  if (!admin::is_schedule_id(kept)) {
     return id_for(profile.name);
   }
   for (const Section& other : read_profiles()) {
@@ -129,16 +122,13 @@ void set_schedule(const Options& options) {
   const host::Fd lock = lock_schedules();
   const Section profile = read_profile(options.profile);
   const std::string id = schedule_id(profile);
-  const std::string path = cron_file(id);
+  const std::string path = admin::schedule_file(id);
   const auto read = host::read_file(path, kLargestCronFile);
   if (!read && access(path.c_str(), F_OK) == 0) {
     throw Failure(path + " can't be read, so it is left as it is; look into it and move it away");
   }
   const std::string before = read.value_or("");
-  if (!only_runs(profile.name, before)) {
-    throw Failure(path + " holds other jobs than those of profile " + profile.name +
-                  "; move them to a file of their own");
-  }
+  check_runs_only(profile.name, path, before);
   for (const Job& job : jobs_in(path, before)) {  // a kind that isn't named keeps its times
     std::string& times = job.kind == JobKind::report ? report_times : data_times;
     times = times.empty() ? job.times : times;
@@ -158,23 +148,10 @@ void set_schedule(const Options& options) {
 void clean_schedule(const Options& options) {
   const host::Fd lock = lock_schedules();
   const Section profile = read_profile(options.profile);
-  const std::string id = profile.value(kScheduleKey);
-  if (id.empty()) {
+  const std::string path = remove_cron_file(profile);
+  if (path.empty()) {
     print_line("profile " + profile.name + " has no schedule");
     return;
-  }
-  if (!is_id(id)) {
-    throw Failure("profile " + profile.name + ": " + kScheduleKey + " = " + id +
-                  " is no schedule identifier; unset it with vornctl profile set");
-  }
-  const std::string path = cron_file(id);
-  const auto text = host::read_file(path, kLargestCronFile);
-  if (text && !only_runs(profile.name, *text)) {
-    throw Failure(path + " holds other jobs than those of profile " + profile.name +
-                  "; move them to a file of their own");
-  }
-  if (unlink(path.c_str()) != 0 && errno != ENOENT) {
-    throw Failure(path + " can't be removed (" + std::strerror(errno) + "); run this as root");
   }
   change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, std::nullopt}});
   print_line("removed " + path);

@@ -1,22 +1,24 @@
-#include "schedule/schedules.hpp"
+#include "schedule/jobs.hpp"
 
-#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <cstring>
 #include <exception>
+#include <filesystem>
+#include <set>
 
-#include "run/run_paths.hpp"
+#include "base/ctl.hpp"
 #include "schedule/cron_times.hpp"
+#include "vorn/admin/runs.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {
 namespace {
-
-constexpr std::size_t kLargestCronFile = 1U << 20U;
 
 // Takes the first word off `text`.
 std::string_view take_word(std::string_view& text) {
@@ -102,24 +104,26 @@ std::vector<Job> jobs_in(const std::string& file, std::string_view text) {
   return jobs;
 }
 
-bool only_runs(const std::string& profile, std::string_view text) {
+void check_runs_only(const std::string& profile, const std::string& file, std::string_view text) {
   bool only = true;
   each_line(text, [&](std::string_view line) {
     const auto job = job_in({}, line);
     only = only && (is_comment(host::trimmed(line)) || (job && job->profile == profile));
   });
-  return only;
+  if (!only) {
+    throw Failure(file + " holds other jobs than those of profile " + profile +
+                  "; move them to a file of their own");
+  }
 }
 
 std::vector<Job> scheduled_jobs() {
   std::vector<Job> jobs;
   append_jobs("/etc/crontab", jobs);
-  const host::Fd folder(open(VORN_PATH_CRON, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  std::vector<std::string> names;
-  if (folder) {
-    names = host::entries_of(folder);
+  std::error_code error;
+  std::set<std::string> names;
+  for (const auto& entry : std::filesystem::directory_iterator(VORN_PATH_CRON, error)) {
+    names.insert(entry.path().filename().string());
   }
-  std::sort(names.begin(), names.end());
   for (const std::string& name : names) {
     if (is_cron_name(name)) {
       append_jobs(VORN_PATH_CRON "/" + name, jobs);
@@ -152,8 +156,21 @@ std::string cron_file_problem(const std::string& file) {
   return text && !text->empty() && !text->ends_with('\n') ? "has no line end at its end" : "";
 }
 
-std::string cron_file(const std::string& id) {
-  return VORN_PATH_CRON "/vornreport-" + id;
+std::string remove_cron_file(const Section& profile) {
+  const std::string id = profile.value(kScheduleKey);
+  if (id.empty()) {
+    return "";
+  }
+  if (!admin::is_schedule_id(id)) {
+    throw Failure("profile " + profile.name + ": " + kScheduleKey + " = " + id +
+                  " is no schedule identifier; unset it with vornctl profile set");
+  }
+  std::string path = admin::schedule_file(id);
+  check_runs_only(profile.name, path, host::read_file(path, kLargestCronFile).value_or(""));
+  if (unlink(path.c_str()) != 0 && errno != ENOENT) {
+    throw Failure(path + " can't be removed (" + std::strerror(errno) + "); run this as root");
+  }
+  return path;
 }
 
 }  // namespace ctl

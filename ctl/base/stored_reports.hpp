@@ -1,0 +1,27 @@
+// The finished reports of a profile. Every failure is thrown as a Failure.
+#ifndef VORN_CTL_STORED_REPORTS_HPP
+#define VORN_CTL_STORED_REPORTS_HPP
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "vorn/admin/reports.hpp"
+
+namespace ctl {
+
+using admin::ReportSize;
+using Reports = std::vector<admin::StoredReport>;
+
+// The folder of the profile's reports; it can't be told when `report_dir` can't be worked with.
+std::string folder_of_reports(const admin::Section& profile);
+
+// The reports in `folder`, oldest first, with their sizes if asked for.
+Reports reports_in(const std::string& folder, ReportSize size);
+
+// The newest one that is whole, or nothing.
+std::optional<admin::StoredReport> newest_whole(const Reports& reports);
+
+}  // namespace ctl
+
+#endif

@@ -1,0 +1,20 @@
+// How sizes, times and states are written on a terminal.
+#ifndef VORN_CTL_TEXTS_HPP
+#define VORN_CTL_TEXTS_HPP
+
+#include <cstdint>
+#include <ctime>
+#include <string>
+
+#include "vorn/admin/runs.hpp"
+
+namespace ctl {
+
+const char* word_for(admin::RunState state);
+std::string size_text(std::uint64_t bytes);  // "1.5 GiB"
+std::string time_text(std::time_t time);     // "2026-11-21 04:00", local
+std::string json_time(std::time_t time);     // "2026-11-21T04:00:00+0100"
+
+}  // namespace ctl
+
+#endif

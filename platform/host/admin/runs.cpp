@@ -1,0 +1,134 @@
+#include "vorn/admin/runs.hpp"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <charconv>
+
+#include "admin/section_hash.hpp"
+#include "config/profile.hpp"
+#include "run/run_lock.hpp"
+#include "run/run_paths.hpp"
+#include "vorn/admin/history.hpp"
+#include "vorn/base/file_io.hpp"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+
+namespace admin {
+namespace {
+
+constexpr std::size_t kLargestFile = 4096;
+
+std::string status_file(const std::string& profile) {
+  return VORN_PATH_STATUS "/" + profile;
+}
+
+pid_t holder_of(const std::string& profile) {
+  const auto text = host::read_file(VORN_PATH_STATUS "/." + profile + ".lock", kLargestFile);
+  pid_t pid = 0;
+  if (text) {
+    std::from_chars(text->data(), text->data() + text->size(), pid);
+  }
+  return pid;
+}
+
+RunState state_of(const std::string& profile, const std::string& word) {
+  if (word == report_format::kSuccess) {
+    return RunState::succeeded;
+  }
+  if (word != report_format::kCollecting) {
+    return RunState::failed;
+  }
+  // "global" keeps this word when all went well.
+  struct stat stored {};
+  const bool has_collected = profile == "global" &&
+                             stat(status_file(profile).c_str(), &stored) == 0 &&
+                             samples_since(profile, stored.st_mtime) > 0;
+  return has_collected ? RunState::succeeded : RunState::ended_early;
+}
+
+// Without paths only what needs no configuration is removed.
+bool clean_up(const Section& profile) {
+  VLIBCSzHash hash = hash_of(profile);
+  VLIBCSzHash* keys = &hash;
+  const char* name = profile.name.c_str();
+  const bool is_placed = VornQazInitRealPath(name, &keys, 0) == 0;
+  return VornQazReportCleanTmp(name, is_placed ? keys : nullptr) == 0 && is_placed;
+}
+
+}  // namespace
+
+LastRun last_run(const std::string& profile) {
+  LastRun run;
+  const bool is_running = host::held_by_other(profile);
+  const auto text = host::read_file(status_file(profile), kLargestFile);
+  const bool is_missing = !text && errno == ENOENT;
+  if (text) {
+    run.status = report_format::status_of(*text);
+  }
+  if (is_running) {
+    run.state = RunState::running;
+    run.process = holder_of(profile);
+  } else if (text) {
+    run.state = state_of(profile, run.status.word);
+  } else if (is_missing) {
+    run.state = RunState::never_ran;
+  }
+  return run;
+}
+
+std::optional<report_format::Progress> read_progress(const std::string& profile) {
+  if (!host::held_by_other(profile)) {
+    return std::nullopt;  // a killed run leaves what it has told
+  }
+  const auto text = host::read_file(VORN_PATH_PROGRESS "/" + profile, kLargestFile);
+  return text ? report_format::progress_of(*text) : std::nullopt;
+}
+
+std::string statistics_file(const std::string& profile) {
+  return host::statistics_path(profile);
+}
+
+Hold hold_profile(const std::string& profile) {
+  switch (host::take_profile(profile)) {
+    case host::TakeResult::taken:
+      return Hold::taken;
+    case host::TakeResult::busy:
+      return Hold::running;
+    case host::TakeResult::failed:
+      break;
+  }
+  return Hold::failed;
+}
+
+bool end_killed_run(const Section& profile) {
+  const bool is_clean = clean_up(profile);
+  return VornQazStatusUpdate(profile.name.c_str(), report_format::kFail) == 0 && is_clean;
+}
+
+bool forget_runs(const Section& profile) {
+  const bool is_clean = clean_up(profile);
+  unlink(status_file(profile.name).c_str());
+  return is_clean;
+}
+
+std::optional<std::vector<std::string>> leftovers_of(const Section& profile) {
+  const auto dir = host::report_dir(profile.name.c_str(), hash_of(profile));
+  auto left = dir ? host::unfinished_reports(*dir + "/" + profile.name) : std::nullopt;
+  if (const std::string file = host::statistics_path(profile.name);
+      left && access(file.c_str(), F_OK) == 0) {
+    left->push_back(file);
+  }
+  return left;
+}
+
+bool is_schedule_id(std::string_view id) {
+  return host::valid_schedule_id(id);
+}
+
+std::string schedule_file(const std::string& id) {
+  return host::schedule_file(id);
+}
+
+}  // namespace admin
