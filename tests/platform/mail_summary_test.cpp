@@ -43,7 +43,7 @@ std::string duplicates(const std::string& rows, int match = 0) {
 
 // The lines of the mail's text between its first and its link, but for reports and time.
 std::string lines_of(const host::ReportFigures& figures, const std::string& language = "en") {
-  const host::MailTexts texts(kDictionaries, language);
+  const report_format::Texts texts(kDictionaries, language);
   const std::string text =
       report_mail(texts, {"weekly", "files", "now", "https://h/", ""}, figures).plain;
   const std::size_t start = text.find("\n\n") + 2;
@@ -165,7 +165,7 @@ TEST(MailSummary, KeepsHostileNamesOutOfTheHtml) {
   figures.volume = host::FullestVolume{hostile, 50};
   figures.share = host::LargestShare{hostile, 1};
   figures.quota = host::QuotaFigures{{{hostile, 95}}, false};
-  const host::MailTexts texts(kDictionaries, "en");
+  const report_format::Texts texts(kDictionaries, "en");
   const std::string html =
       report_mail(texts, {"p", "h", "now", "https://h/?a&b", "large_file," + hostile}, figures)
           .html;

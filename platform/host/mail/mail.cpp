@@ -140,7 +140,7 @@ struct Posting {
   MailServer server;
   std::string from;
   std::vector<std::string> to;
-  MailTexts texts;
+  Texts texts;
   MailTopic topic;
 };
 

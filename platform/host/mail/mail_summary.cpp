@@ -9,6 +9,10 @@
 namespace host {
 namespace {
 
+using report_format::escape_html;
+using report_format::name_in;
+using report_format::TextForm;
+
 constexpr std::size_t kMostUsers = 5;
 // A profile names nine reports; whatever else stands in its list has no right to a long mail.
 constexpr std::size_t kMostReports = 32;
@@ -20,7 +24,7 @@ using Fact = std::pair<std::string, std::string>;
 // Says the figures in one of the two forms.
 class Summary {
  public:
-  Summary(const MailTexts& texts, TextForm form) : texts_(texts), form_(form) {}
+  Summary(const Texts& texts, TextForm form) : texts_(texts), form_(form) {}
 
   std::vector<Fact> facts(const MailTopic& topic, const ReportFigures& figures) const {
     std::vector<Fact> all;
@@ -45,7 +49,7 @@ class Summary {
     return all;
   }
 
-  std::string say(std::string_view key, MailTexts::Values values = {}) const {
+  std::string say(std::string_view key, Texts::Values values = {}) const {
     return texts_.say(form_, key, values);
   }
   std::string name(std::string_view text) const { return name_in(form_, text); }
@@ -114,11 +118,11 @@ class Summary {
     return names;
   }
 
-  const MailTexts& texts_;
+  const Texts& texts_;
   TextForm form_;
 };
 
-std::string html_page(const MailTexts& texts, const std::string& title, const std::string& body) {
+std::string html_page(const Texts& texts, const std::string& title, const std::string& body) {
   return R"(<!DOCTYPE html>
 <html lang=")" +
          escape_html(texts.language()) + R"(">
@@ -162,8 +166,7 @@ std::string about(const Summary& summary, std::string_view key, const MailTopic&
 
 }  // namespace
 
-MailContent report_mail(const MailTexts& texts, const MailTopic& topic,
-                        const ReportFigures& figures) {
+MailContent report_mail(const Texts& texts, const MailTopic& topic, const ReportFigures& figures) {
   const Summary plain(texts, TextForm::plain);
   const Summary html(texts, TextForm::html);
   MailContent mail;
@@ -180,7 +183,7 @@ MailContent report_mail(const MailTexts& texts, const MailTopic& topic,
   return mail;
 }
 
-MailContent test_mail(const MailTexts& texts, const MailTopic& topic) {
+MailContent test_mail(const Texts& texts, const MailTopic& topic) {
   const Summary plain(texts, TextForm::plain);
   const Summary html(texts, TextForm::html);
   MailContent mail;

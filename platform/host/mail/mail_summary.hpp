@@ -4,10 +4,12 @@
 
 #include <string>
 
-#include "mail/mail_texts.hpp"
+#include "report_format/texts.hpp"
 #include "run/report_figures.hpp"
 
 namespace host {
+
+using report_format::Texts;
 
 // What a mail is about.
 struct MailTopic {
@@ -27,10 +29,9 @@ struct MailContent {
 };
 
 // Figures that are absent have no line.
-MailContent report_mail(const MailTexts& texts, const MailTopic& topic,
-                        const ReportFigures& figures);
+MailContent report_mail(const Texts& texts, const MailTopic& topic, const ReportFigures& figures);
 // Only the profile, the host and the time of `topic` count.
-MailContent test_mail(const MailTexts& texts, const MailTopic& topic);
+MailContent test_mail(const Texts& texts, const MailTopic& topic);
 
 }  // namespace host
 

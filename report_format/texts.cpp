@@ -1,4 +1,4 @@
-#include "mail/mail_texts.hpp"
+#include "report_format/texts.hpp"
 
 #include <algorithm>
 #include <array>
@@ -6,11 +6,11 @@
 #include <nlohmann/json.hpp>
 #include <optional>
 
-#include "config/language.hpp"
+#include "report_format/values.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/utf8.hpp"
 
-namespace host {
+namespace report_format {
 namespace {
 
 struct Range {
@@ -35,13 +35,13 @@ bool is_unseen(char32_t code) {
       return true;
     }
   }
-  return is_control(code);
+  return host::is_control(code);
 }
 
 std::string visible(std::string_view name) {
   std::string out;
   while (!name.empty()) {
-    const Utf8Char found = utf8_at(name);
+    const host::Utf8Char found = host::utf8_at(name);
     char code[16];
     if (found.length == 0) {
       std::snprintf(code, sizeof code, "\\x%02x", static_cast<unsigned char>(name.front()));
@@ -64,7 +64,7 @@ void replace_all(std::string& text, const std::string& what, const std::string& 
 }
 
 // One pass, so that a value with braces in it stays what it is.
-std::string filled(std::string_view text, MailTexts::Values values) {
+std::string filled(std::string_view text, Texts::Values values) {
   std::string out;
   while (!text.empty()) {
     const std::size_t open = std::min(text.find('{'), text.size());
@@ -103,9 +103,8 @@ std::string name_in(TextForm form, std::string_view name) {
   return form == TextForm::html ? "<bdi>" + escape_html(text) + "</bdi>" : text;
 }
 
-MailTexts::MailTexts(const std::string& folder, std::string_view code) {
-  constexpr std::size_t kLongestCode = 7;  // as the page takes them
-  if (!is_language_code(code) || code.size() > kLongestCode) {
+Texts::Texts(const std::string& folder, std::string_view code) {
+  if (!is_language_code(code)) {
     code = "en";
   }
   std::string_view previous;
@@ -120,9 +119,9 @@ MailTexts::MailTexts(const std::string& folder, std::string_view code) {
   }
 }
 
-bool MailTexts::read(const std::string& path, Dictionary& dictionary) {
+bool Texts::read(const std::string& path, Dictionary& dictionary) {
   constexpr std::size_t kLargest = std::size_t{1} << 20U;
-  const std::optional<std::string> text = read_file(path, kLargest);
+  const std::optional<std::string> text = host::read_file(path, kLargest);
   const auto json = nlohmann::json::parse(text.value_or(""), nullptr, false);
   for (const auto& [name, group] :
        {std::pair("mail", &dictionary.mail), std::pair("reports", &dictionary.reports)}) {
@@ -138,7 +137,7 @@ bool MailTexts::read(const std::string& path, Dictionary& dictionary) {
   return json.is_object();
 }
 
-const std::string* MailTexts::find(Group Dictionary::*group, std::string_view key) const {
+const std::string* Texts::find(Group Dictionary::*group, std::string_view key) const {
   for (const Dictionary& dictionary : dictionaries_) {
     const auto found = (dictionary.*group).find(key);
     if (found != (dictionary.*group).end()) {
@@ -148,7 +147,7 @@ const std::string* MailTexts::find(Group Dictionary::*group, std::string_view ke
   return nullptr;
 }
 
-std::string MailTexts::say(TextForm form, std::string_view key, Values values) const {
+std::string Texts::say(TextForm form, std::string_view key, Values values) const {
   if (const std::string* text = find(&Dictionary::mail, key); text != nullptr) {
     return filled(form == TextForm::html ? escape_html(*text) : *text, values);
   }
@@ -159,12 +158,12 @@ std::string MailTexts::say(TextForm form, std::string_view key, Values values) c
   return text;
 }
 
-std::string MailTexts::report(std::string_view name) const {
+std::string Texts::report(std::string_view name) const {
   const std::string* text = find(&Dictionary::reports, name);
   return text == nullptr ? "" : *text;
 }
 
-std::string MailTexts::number(double value, int digits) const {
+std::string Texts::number(double value, int digits) const {
   char text[64];
   std::snprintf(text, sizeof text, "%.*f", digits, value);
   std::string number = text;
@@ -179,7 +178,7 @@ std::string MailTexts::number(double value, int digits) const {
   return number;
 }
 
-std::string MailTexts::size(unsigned long long bytes) const {
+std::string Texts::size(unsigned long long bytes) const {
   constexpr std::array kUnits{"B", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
   constexpr double kUnit = 1024.0;
   constexpr double kNearlyOne = 1023.95;  // which would show as 1024
@@ -192,8 +191,8 @@ std::string MailTexts::size(unsigned long long bytes) const {
   return number(count, count < 10 ? 2 : count < 100 ? 1 : 0) + "\u00a0" + kUnits[unit];
 }
 
-std::string MailTexts::percent(double value) const {
+std::string Texts::percent(double value) const {
   return say(TextForm::plain, "percent", {{"n", number(value, 1)}});
 }
 
-}  // namespace host
+}  // namespace report_format

@@ -1,6 +1,5 @@
 // The mail's texts in the language of a profile, from the dictionaries of the report page.
-#ifndef VORN_HOST_MAIL_TEXTS_HPP
-#define VORN_HOST_MAIL_TEXTS_HPP
+#pragma once
 
 #include <initializer_list>
 #include <map>
@@ -9,7 +8,7 @@
 #include <utility>
 #include <vector>
 
-namespace host {
+namespace report_format {
 
 // Where a text goes. Texts that come from elsewhere pass through name_in() for it.
 enum class TextForm { plain, html };
@@ -21,13 +20,13 @@ std::string name_in(TextForm form, std::string_view name);
 // `text` with nothing left in it that HTML would take for its own.
 std::string escape_html(std::string_view text);
 
-class MailTexts {
+class Texts {
  public:
   using Values = std::initializer_list<std::pair<std::string_view, std::string>>;
 
   // The dictionaries of `folder` for the language `code`: de-AT, else de; behind them English. One
   // that is missing or no JSON counts as empty.
-  MailTexts(const std::string& folder, std::string_view code);
+  Texts(const std::string& folder, std::string_view code);
 
   // The code of the language that most texts are in.
   const std::string& language() const { return language_; }
@@ -56,6 +55,4 @@ class MailTexts {
   std::string language_ = "en";
 };
 
-}  // namespace host
-
-#endif
+}  // namespace report_format
