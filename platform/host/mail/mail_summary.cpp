@@ -49,8 +49,8 @@ class Summary {
     return all;
   }
 
-  std::string say(std::string_view key, Texts::Values values = {}) const {
-    return texts_.say(form_, key, values);
+  std::string say(std::string_view key, const Texts::Values& values = {}) const {
+    return texts_.say(form_, "mail", key, values);
   }
   std::string name(std::string_view text) const { return name_in(form_, text); }
 
