@@ -5,8 +5,8 @@
 #include <nlohmann/json.hpp>
 
 #include "base/ctl.hpp"
+#include "report_format/facts_file.hpp"
 #include "run/profile_state.hpp"
-#include "run/report_figures.hpp"
 #include "schedule/schedules.hpp"
 
 namespace ctl {
@@ -29,7 +29,7 @@ struct ProfileStatus {
   std::time_t made = 0;
   std::uint64_t size = 0;
   std::optional<NextRun> next;
-  std::optional<host::FullestVolume> fullest;
+  std::optional<report_format::VolumeFacts> volume;  // the most pressing
 };
 
 std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job>& jobs,
@@ -48,10 +48,13 @@ std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job
 void add_report(const Section& profile, ProfileStatus& status) try {
   const std::string folder = report_folder(profile);
   if (const auto report = newest_whole(reports_in(folder, host::ReportSize::measured))) {
-    status.last_report = folder + "/" + report->name + "/report.html";
+    const std::string place = folder + "/" + report->name;
+    status.last_report = place + "/report.html";
     status.made = report->made;
     status.size = report->size;
-    status.fullest = host::read_figures(status.last_report.c_str()).volume;
+    if (const auto facts = report_format::read_facts(place); facts && !facts->volumes.empty()) {
+      status.volume = facts->volumes.front();
+    }
   }
 } catch (const Failure& failure) {
   warn(failure.what());
@@ -66,11 +69,11 @@ ProfileStatus status_of(const Section& profile, const std::vector<Job>& jobs, st
   return status;
 }
 
-nlohmann::ordered_json json_of(const host::FullestVolume& volume) {
+nlohmann::ordered_json json_of(const report_format::VolumeFacts& volume) {
   nlohmann::ordered_json json{
-      {"volume", volume.name}, {"percent", volume.percent}, {"days_to_full", nullptr}};
-  if (volume.outlook == host::Outlook::days || volume.outlook == host::Outlook::soon) {
-    json["days_to_full"] = volume.days;
+      {"volume", volume.path}, {"percent", volume.percent}, {"days_to_full", nullptr}};
+  if (volume.forecast.days) {
+    json["days_to_full"] = *volume.forecast.days;
   }
   return json;
 }
@@ -90,29 +93,31 @@ void print_as_json(const std::vector<ProfileStatus>& all) {
       entry["next_run"] = {{"time", json_time(status.next->time)},
                            {"kind", status.next->kind == JobKind::report ? "report" : "data"}};
     }
-    if (status.fullest) {
-      entry["fullest_volume"] = json_of(*status.fullest);
+    if (status.volume) {
+      entry["fullest_volume"] = json_of(*status.volume);
     }
     array.push_back(std::move(entry));
   }
   print_json(array);
 }
 
-std::string volume_text(const host::FullestVolume& volume) {
+std::string volume_text(const report_format::VolumeFacts& volume) {
   char percent[32];
   std::snprintf(percent, sizeof percent, "%.0f %%", volume.percent);
-  return std::string(percent) + " of " + volume.name;
+  return std::string(percent) + " of " + volume.path;
 }
 
-std::string days_text(const host::FullestVolume& volume) {
-  switch (volume.outlook) {
-    case host::Outlook::days:
-      return std::to_string(volume.days);
-    case host::Outlook::soon:
-      return "< 1";
-    case host::Outlook::no_growth:
+std::string days_text(const report_format::VolumeFacts& volume) {
+  using enum report_format::ForecastState;
+  switch (volume.forecast.state) {
+    case kFull:
+      return "full";
+    case kGrowing:
+      return volume.forecast.days ? std::to_string(*volume.forecast.days) : "-";
+    case kShrinking:
+    case kSteady:
       return "not filling";
-    case host::Outlook::unknown:
+    case kShort:
       break;
   }
   return "-";
@@ -132,8 +137,8 @@ void print_as_table(const std::vector<ProfileStatus>& all) {
     next += status.next && status.next->kind == JobKind::data ? " (data)" : "";
     table.add({status.name, word_for(status.state), reported ? time_text(status.made) : "-",
                reported ? size_text(status.size) : "-", next,
-               status.fullest ? volume_text(*status.fullest) : "-",
-               status.fullest ? days_text(*status.fullest) : "-"});
+               status.volume ? volume_text(*status.volume) : "-",
+               status.volume ? days_text(*status.volume) : "-"});
   }
   if (table.empty()) {
     print_line("no profiles; add one with vornctl profile add");
