@@ -1,9 +1,10 @@
 #include "base/texts.hpp"
 
-#include <array>
-#include <cstdio>
 #include <iomanip>
 #include <sstream>
+#include <string_view>
+
+#include "vorn/paths.h"
 
 namespace ctl {
 namespace {
@@ -36,18 +37,18 @@ const char* word_for(admin::RunState state) {
   return "unknown";
 }
 
+const report_format::Texts& english() {
+  static const report_format::Texts texts(VORN_PATH_TEMPLATE "/lang", "en");
+  return texts;
+}
+
 std::string size_text(std::uint64_t bytes) {
-  constexpr std::array kUnits{"B", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
-  constexpr double kStep = 1024;
-  auto value = static_cast<double>(bytes);
-  std::size_t unit = 0;
-  // What would be rounded to 1024 is 1 of the next unit.
-  for (; value >= kStep - 0.05 && unit + 1 < kUnits.size(); ++unit) {
-    value /= kStep;
+  constexpr std::string_view kNoBreak = "\u00a0";
+  std::string text = english().size(bytes);
+  if (const std::size_t blank = text.find(kNoBreak); blank != std::string::npos) {
+    text.replace(blank, kNoBreak.size(), " ");
   }
-  std::array<char, 32> text{};
-  std::snprintf(text.data(), text.size(), "%.*f %s", unit == 0 ? 0 : 1, value, kUnits[unit]);
-  return text.data();
+  return text;
 }
 
 std::string time_text(std::time_t time) {

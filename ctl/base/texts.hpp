@@ -6,12 +6,15 @@
 #include <ctime>
 #include <string>
 
+#include "report_format/texts.hpp"
 #include "vorn/admin/runs.hpp"
 
 namespace ctl {
 
 const char* word_for(admin::RunState state);
-std::string size_text(std::uint64_t bytes);  // "1.5 GiB"
+// What reports say, as it stands in their dictionaries.
+const report_format::Texts& english();
+std::string size_text(std::uint64_t bytes);  // "1.5 GiB", as in them
 std::string time_text(std::time_t time);     // "2026-11-21 04:00", local
 std::string json_time(std::time_t time);     // "2026-11-21T04:00:00+0100"
 

@@ -1,6 +1,5 @@
 // vornctl status: how the profiles are doing.
 #include <CLI/CLI.hpp>
-#include <cstdio>
 #include <memory>
 #include <nlohmann/json.hpp>
 
@@ -8,12 +7,15 @@
 #include "base/ctl.hpp"
 #include "base/stored_reports.hpp"
 #include "base/texts.hpp"
+#include "report_format/facts_file.hpp"
 #include "run/commands.hpp"
 #include "schedule/jobs.hpp"
-#include "vorn/admin/figures.hpp"
 
 namespace ctl {
 namespace {
+
+using Json = nlohmann::ordered_json;
+using report_format::TextForm;
 
 struct Options {
   std::string profile;
@@ -28,11 +30,9 @@ struct NextRun {
 struct ProfileStatus {
   std::string name;
   admin::RunState state = admin::RunState::unknown;
-  std::string last_report;  // path of the page; empty when there is none
-  std::time_t made = 0;
-  std::uint64_t size = 0;
+  std::optional<admin::StoredReport> last;
+  std::optional<report_format::Facts> facts;  // of that report
   std::optional<NextRun> next;
-  std::optional<admin::FullestVolume> fullest;
 };
 
 std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job>& jobs,
@@ -49,12 +49,10 @@ std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job
 
 // One folder that can't be read must not hide the other profiles.
 void add_report(const Section& profile, ProfileStatus& status) try {
-  const Reports reports = reports_in(folder_of_reports(profile), ReportSize::measured);
-  if (const auto report = newest_whole(reports)) {
-    status.last_report = report->page;
-    status.made = report->made;
-    status.size = report->size;
-    status.fullest = admin::fullest_volume(report->page);
+  const std::string folder = folder_of_reports(profile);
+  status.last = newest_whole(reports_in(folder, ReportSize::measured));
+  if (status.last) {
+    status.facts = report_format::read_facts(folder + "/" + status.last->name);
   }
 } catch (const Failure& failure) {
   warn(failure.what());
@@ -69,56 +67,75 @@ ProfileStatus status_of(const Section& profile, const std::vector<Job>& jobs, st
   return status;
 }
 
-nlohmann::ordered_json json_of(const admin::FullestVolume& volume) {
-  nlohmann::ordered_json json{
-      {"volume", volume.name}, {"percent", volume.percent}, {"days_to_full", nullptr}};
-  if (volume.outlook == admin::Outlook::days || volume.outlook == admin::Outlook::soon) {
-    json["days_to_full"] = volume.days;
+// --- JSON ---------------------------------------------------------------------------------------
+
+// What the report itself says, with the words for it.
+void add_facts(Json& entry, const report_format::Facts& facts) {
+  const Json all = report_format::to_json(facts);
+  entry["complete"] = facts.complete;
+  entry["volume"] = all["volumes"].empty() ? Json(nullptr) : all["volumes"][0];
+  entry["incidents"] = all["incidents"];
+  entry["attention"] = Json::array();
+  for (std::size_t i = 0; i < facts.attention.size(); ++i) {
+    Json told = all["attention"][i];
+    told["text"] = english().attention(TextForm::plain, facts.attention[i]);
+    entry["attention"].push_back(std::move(told));
   }
-  return json;
 }
 
 void print_as_json(const std::vector<ProfileStatus>& all) {
-  auto array = nlohmann::ordered_json::array();
+  Json array = Json::array();
   for (const ProfileStatus& status : all) {
-    nlohmann::ordered_json entry{{"profile", status.name}, {"status", word_for(status.state)}};
-    entry["last_report"] = nullptr;
-    entry["next_run"] = nullptr;
-    entry["fullest_volume"] = nullptr;
-    if (!status.last_report.empty()) {
-      entry["last_report"] = {
-          {"path", status.last_report}, {"made", json_time(status.made)}, {"bytes", status.size}};
+    Json entry{{"profile", status.name},     {"status", word_for(status.state)},
+               {"last_report", nullptr},     {"next_run", nullptr},
+               {"complete", nullptr},        {"volume", nullptr},
+               {"incidents", Json(nullptr)}, {"attention", Json(nullptr)}};
+    if (status.last) {
+      entry["last_report"] = {{"path", status.last->page},
+                              {"made", json_time(status.last->made)},
+                              {"bytes", status.last->size}};
     }
     if (status.next) {
       entry["next_run"] = {{"time", json_time(status.next->time)},
                            {"kind", status.next->kind == JobKind::report ? "report" : "data"}};
     }
-    if (status.fullest) {
-      entry["fullest_volume"] = json_of(*status.fullest);
+    if (status.facts) {
+      add_facts(entry, *status.facts);
     }
     array.push_back(std::move(entry));
   }
   print_json(array);
 }
 
-std::string volume_text(const admin::FullestVolume& volume) {
-  char percent[32];
-  std::snprintf(percent, sizeof percent, "%.0f %%", volume.percent);
-  return std::string(percent) + " of " + volume.name;
+// --- Text ---------------------------------------------------------------------------------------
+
+std::string volume_text(const std::optional<report_format::Facts>& facts) {
+  if (!facts || facts->volumes.empty()) {
+    return "-";
+  }
+  const report_format::VolumeFacts& volume = facts->volumes.front();
+  return volume.path + ", " + english().percent(volume.percent);
 }
 
-std::string days_text(const admin::FullestVolume& volume) {
-  switch (volume.outlook) {
-    case admin::Outlook::days:
-      return std::to_string(volume.days);
-    case admin::Outlook::soon:
-      return "< 1";
-    case admin::Outlook::no_growth:
-      return "not filling";
-    case admin::Outlook::unknown:
-      break;
+std::string outlook_text(const std::optional<report_format::Facts>& facts) {
+  return facts && !facts->volumes.empty()
+             ? english().outlook(TextForm::plain, facts->volumes.front())
+             : "-";
+}
+
+// What the last reports have to tell, a line each: what they lack, then what needs attention.
+void print_remarks(const ProfileStatus& status) {
+  if (!status.facts) {
+    return;
   }
-  return "-";
+  for (const report_format::Incident& incident : status.facts->incidents) {
+    print_line(status.name + ": " + english().incident(TextForm::plain, incident));
+  }
+  for (const report_format::Attention& entry : status.facts->attention) {
+    if (entry.level != report_format::Level::kOk) {
+      print_line(status.name + ": " + english().attention(TextForm::plain, entry));
+    }
+  }
 }
 
 void print_as_table(const std::vector<ProfileStatus>& all) {
@@ -127,21 +144,23 @@ void print_as_table(const std::vector<ProfileStatus>& all) {
                {"LAST REPORT"},
                {"SIZE", Table::Align::right},
                {"NEXT RUN"},
-               {"FULLEST VOLUME"},
-               {"DAYS TO FULL", Table::Align::right}});
+               {"MOST PRESSING VOLUME"},
+               {"OUTLOOK"}});
   for (const ProfileStatus& status : all) {
-    const bool reported = !status.last_report.empty();
     std::string next = status.next ? time_text(status.next->time) : "-";
     next += status.next && status.next->kind == JobKind::data ? " (data)" : "";
-    table.add({status.name, word_for(status.state), reported ? time_text(status.made) : "-",
-               reported ? size_text(status.size) : "-", next,
-               status.fullest ? volume_text(*status.fullest) : "-",
-               status.fullest ? days_text(*status.fullest) : "-"});
+    table.add({status.name, word_for(status.state),
+               status.last ? time_text(status.last->made) : "-",
+               status.last ? size_text(status.last->size) : "-", next, volume_text(status.facts),
+               outlook_text(status.facts)});
   }
   if (table.empty()) {
     print_line("no profiles; add one with vornctl profile add");
-  } else {
-    table.print();
+    return;
+  }
+  table.print();
+  for (const ProfileStatus& status : all) {
+    print_remarks(status);
   }
 }
 

@@ -249,18 +249,12 @@ class Schedules(CtlTest):
 
 class Status(CtlTest):
     def test_status(self):
-        block = "<script type='text/javascript'>\nvar {} = {}\n</script>\n"
-        page = WHOLE.replace('</html>', block.format('vornVolumeUsageData', """[
-[ '/', 10 , 90, '10.000000%', '3' ],
-[ '/srv/a', 90 , 10, '90.000000%', '12' ],
-[ '/c', 20 , 80, '20.000000%', '0' ]
-];""") + block.format('vornVolumeUsageDataHistory', """{
-'/srv/a' : [
-[ 1760000000, 90.0 ],
-[ 1750000000, 50.0 ]
-]
-};""") + '</html>')
-        folder = self.stored('weekly', {'2026-01-02_03-04-05': page, '2026-01-03_03-04-05': CUT})
+        folder = self.stored('weekly', {'2026-01-02_03-04-05': WHOLE, '2026-01-03_03-04-05': CUT})
+        (folder / '2026-01-02_03-04-05/report.json').write_text(json.dumps({
+            'format': 1, 'volumes': [
+                {'path': '/srv/a', 'size': 100, 'percent': 90.0,
+                 'forecast': {'state': 'growing', 'days': 12}},
+                {'path': '/', 'size': 100, 'percent': 95.0, 'forecast': {'state': 'steady'}}]}))
         (self.m.vorn / 'var/status').mkdir(parents=True, exist_ok=True)
         self.m.profile('far', report_list='share_list', report_dir='relative')
         states = {'weekly': ('success', 'success'), 'far': ('fail', 'fail'),

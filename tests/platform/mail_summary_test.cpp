@@ -1,188 +1,220 @@
-// The figures of a finished report, and what a mail says of them.
+// What a mail says of a report's facts.
 #include "mail/mail_summary.hpp"
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <nlohmann/json.hpp>
 #include <regex>
 #include <set>
 
-#include "support.hpp"
+#include "dictionaries.hpp"
 
 namespace {
 
-const std::string kDictionaries = VORN_TEST_SOURCE_DIR "/reportUI/template/lang";
-const std::string kScript = "<script type='text/javascript'>\n";
-const std::string kEnd = "</script>\n";
+using namespace report_format;
 
-host::ReportFigures figures_of(const std::string& page) {
-  const support::TempFolder folder;
-  support::write_file(folder.path("report.html"), "<!DOCTYPE html>\n" + page + "</html>\n");
-  return host::read_figures(folder.path("report.html").c_str());
+const host::MailTopic kTopic = {"weekly", "files", "now", "https://h/?a&b", "share_list;,x"};
+
+class MailSummary : public testing::Test {
+ protected:
+  MailSummary() { support::write_dictionaries(folder_.path()); }
+  host::MailContent mail(const std::optional<Facts>& facts, const char* language = "en",
+                         const host::MailTopic& topic = kTopic) const {
+    return report_mail(Texts(folder_.path(), language), topic, facts);
+  }
+
+ private:
+  support::TempFolder folder_;
+};
+
+Attention fills(Level level, const char* volume) {
+  return {level,
+          "volume_fills",
+          {{"volume", volume}, {"days", 24L}, {"days_low", 19L}, {"days_high", 33L}},
+          "volume_usage"};
 }
 
-std::string volumes(const std::string& days, const std::string& history = "") {
-  return kScript +
-         "var vornVolumeUsageData = [\n[ '/', 10 , 90, '10.0%', '-' ],\n[ '/srv', 936 , " +
-         "64, '93.6%', '" + days + "' ],\n[ '/none', 0 , 0, '-nan%', '0' ]\n];\n" + kEnd +
-         (history.empty() ? "" : kScript + "var vornVolumeUsageDataHistory = {\n" + history + kEnd);
+Attention largest(const std::string& share) {
+  return {Level::kOk, "share_largest", {{"share", share}, {"bytes", 1536L}}, "share_list"};
 }
 
-std::string shares(const std::string& rows) {
-  return kScript + "var vornShareListData = [\n" + rows + "\n];\n" + kEnd;
+Incident missing(const char* share) {
+  return {IncidentLevel::kError, "share_missing", share, "Its folder is gone; mount it."};
+}
+const Incident kPart = {IncidentLevel::kWarning, "share_part", "a: 7", "Look into the log."};
+
+Facts facts_with(std::vector<Attention> attention, std::vector<Incident> incidents) {
+  Facts facts;
+  facts.attention = std::move(attention);
+  facts.incidents = std::move(incidents);
+  return facts;
 }
 
-std::string quotas(const std::string& tables) {
-  return kScript + "var vornQuotaUsageTable = {\n" + tables + "]}\n" + kEnd;
+TEST_F(MailSummary, SaysTheWorstThingFirst) {
+  const std::string usual = "Storage report weekly of files, now";
+  const std::string ready = "The storage report “weekly” of files is ready.";
+  const std::string incomplete = "The storage report “weekly” of files is ready, but incomplete.";
+  const std::string days = ": full in about 24 days (19 to 33)";
+  const std::string about = " – storage report weekly of files";
+  const std::string gone = "Share b is missing from this report";
+  const std::string part = "Part of a share could not be read (a: 7)";
+  const auto both = {fills(Level::kWarning, "/a"), fills(Level::kCritical, "/b")};
+  std::string path = "/";
+  while (path.size() < 400) {
+    path += "ä";
+  }
+  const struct {
+    std::optional<Facts> facts;
+    std::string subject;
+    std::string beginning;
+  } cases[] = {{std::nullopt, usual, ready + "\n\nIts figures are missing"},
+               {facts_with({}, {}), usual, ready},
+               {facts_with({largest("a")}, {}), usual, ready},
+               {facts_with(both, {}), "/a" + days + about, "/a" + days + "\n\n" + ready},
+               {facts_with({largest("a"), fills(Level::kWarning, "/a")}, {}), "/a" + days + about,
+                "/a" + days + "\n\n" + ready},
+               {facts_with(both, {kPart, missing("b")}), "/a" + days + about + " – incomplete",
+                "/a" + days + "\n\n" + incomplete},
+               {facts_with({}, {kPart, missing("b")}), gone + about + " – incomplete",
+                gone + "\n\n" + incomplete},
+               {facts_with({}, {kPart}), part + about + " – incidents: 1", part + "\n\n" + ready},
+               // 160 bytes at most, and no half character.
+               {facts_with({fills(Level::kWarning, path.c_str())}, {}),
+                path.substr(0, 159) + "…" + about, path + days}};
+  for (const auto& [facts, subject, beginning] : cases) {
+    const host::MailContent content = mail(facts);
+    EXPECT_EQ(subject, content.subject);
+    EXPECT_TRUE(content.plain.starts_with(beginning + "\n") ||
+                content.plain.starts_with(beginning + ":"))
+        << content.plain;
+  }
 }
 
-std::string duplicates(const std::string& rows, int match = 0) {
-  return kScript + "var vornDuplicateHashMatch = " + std::to_string(match) +
-         ";\nvar vornDuplicateFileData = [\n" + rows + "\n];\n" + kEnd;
-}
-
-// The lines of the mail's text between its first and its link, but for reports and time.
-std::string lines_of(const host::ReportFigures& figures, const std::string& language = "en") {
-  const host::MailTexts texts(kDictionaries, language);
-  const std::string text =
-      report_mail(texts, {"weekly", "files", "now", "https://h/", ""}, figures).plain;
-  const std::size_t start = text.find("\n\n") + 2;
-  const std::size_t end = text.rfind('\n', text.find("now", start));
-  return end < start ? "" : text.substr(start, end - start);
-}
-
-TEST(MailSummary, TellsTheFiguresOfAReport) {
-  // The newest sample, one of before, and one of a day before.
-  const auto history = [](const std::string& before, const std::string& oldest) {
-    return "'/' : [\n[ '200000', 10.0 ]\n],\n'/srv' : [\n[ '200000', 93.6 ],\n" + before +
-           "[ '113600', " + oldest + " ]\n]\n};\n";
+TEST_F(MailSummary, TellsEachThingOnce) {
+  Facts facts = facts_with({fills(Level::kCritical, "/a"), fills(Level::kWarning, "/b"),
+                            largest("photos"), largest("b, [c]")},
+                           {kPart, missing("b")});
+  VolumeFacts volume;
+  volume.path = "/a";
+  volume.size = 100;
+  volume.percent = 93.44;
+  volume.forecast.state = ForecastState::kGrowing;
+  volume.forecast.days = 24;
+  volume.forecast.window = 30;
+  facts.volumes = {volume, VolumeFacts()};
+  facts.reports.resize(2);
+  facts.reports[0].name = "volume_usage";
+  facts.reports[1].name = "unheard_of";
+  EXPECT_EQ(
+      "/a: full in about 24 days (19 to 33)\n\n"
+      "The storage report “weekly” of files is ready, but incomplete.\n\n"
+      "Share b is missing from this report\n    Its folder is gone; mount it.\n"
+      "Part of a share could not be read (a: 7)\n    Look into the log.\n\n"
+      "/b: full in about 24 days (19 to 33)\n"
+      "Most pressing volume: /a (93.4%), full in about 24 days (24 to 24), at the pace of the last "
+      "30 days\n"
+      "The largest share is photos with 1.5\u00a0KiB\n"
+      "The largest share is b, [c] with 1.5\u00a0KiB\n"
+      "Reports: Volumes, unheard_of\nMade: now\n\nhttps://h/?a&b\n",
+      mail(facts).plain);
+  // The same in the other form.
+  std::string html = mail(facts).html;
+  html = html.substr(html.find("<body"));
+  for (const auto& [pattern, text] :
+       {std::pair("</th>", ": "), {"<br>", "\n    "}, {"<[^>]*>", ""}, {"&amp;", "&"}}) {
+    html = std::regex_replace(html, std::regex(pattern), text);
+  }
+  const auto lines_of = [](const std::string& text) {
+    const std::regex line(".+");
+    const std::sregex_iterator begin(text.begin(), text.end(), line);
+    std::vector<std::string> lines;
+    std::transform(begin, {}, std::back_inserter(lines), [](const auto& m) { return m.str(); });
+    return lines;
   };
-  const std::string grown = history("[ '190000', 95.0 ],\n", "80.0");
-  const std::string young = "'/srv' : [\n[ '200000', 93.6 ],\n[ '199999', 93.6 ]\n]\n};\n";
-  const std::string volume = "Fullest volume: /srv (93.6%)";
-  std::string many;
-  for (int i = 0; i < 100; ++i) {
-    many += (i == 0 ? "" : ",\n") + ("['u" + std::to_string(i)) + "', 100, 50, 50.0]";
-  }
-  std::string groups;
-  for (int i = 1; i <= 200; ++i) {
-    const std::string row = "[ '" + std::to_string(i) + "', 's', '/";
-    groups += (i == 1 ? "" : ",\n") + row + "a', 1024, 1 ],\n" + row + "b', 1024, 1 ]";
-  }
-  const std::pair<std::string, std::string> cases[] = {
-      {"", ""},
-      {volumes("-"), volume},
-      {volumes("12", grown), volume + "\nDays until full: 12"},
-      {volumes("0", grown), volume + "\nDays until full: less than 1"},
-      {volumes("0", history("", "94.0")), volume + "\nDays until full: no growth"},
-      {volumes("0", history("", "93.59")), volume + "\nDays until full: no growth"},
-      {volumes("40000", grown), volume + "\nDays until full: no growth"},
-      {volumes("0", young), volume},
-      {volumes("0", "' : [\n};\n"), volume},
-      {shares("[ 'a', '/', '1' ],\n[ 'b, [c]', '/', '1610612736' ]"),
-       "Largest share: b, [c] (1.5\u00a0GiB)"},
-      {shares("[ 'a', '/', '1' ],\n[ 'b'"), ""},
-      {shares("[ 'a', '/', '-1' ]"), ""},
-      {shares("[ 'a', '/', '1' ]").substr(0, 70), ""},  // cut short
-      // A block that was left open, and one behind it.
-      {kScript + "var vornVolumeUsageData = [\n[ '/', 1 , 1, '50%', '-' ]" + "\n" +
-           shares("[ 'a', '/', '1023' ]"),
-       "Largest share: a (1023\u00a0B)"},
-      {quotas("'/' : [\n['joe', 100, 90, 90.0],\n['none', 0, 5, -1.0]\n] , \n'/srv' : [\n"),
-       "Users over 90% of their quota: none"},
-      {quotas(
-           "'/' : [\n['o'neil\\x', 1000, 905, 90.5],\n['b', 10, 11, 110.0]] , \n'/srv' : [\n"
-           "['b', 100, 91, 91.0],\n['<c>\u202e\x01\xff', 1000, 999, 99.9],\n['d', 10, 10, 100],\n"
-           "['e', 1000, 901, 90.1],\n['f', 1000, 902, 90.2]"),
-       "Users over 90% of their quota: b (110%), d (100%), <c>U+202EU+0001\\xff (99.9%), o'neil\\x "
-       "(90.5%), f (90.2%) and 1 more"},
-      {quotas("'/' : [\n" + many),
-       "Users over 90% of their quota: none (counting, on each volume, only the 100 users with the "
-       "smallest usage)"},
-      {quotas("'/' : [\n['joe', x, 90, 90.0]"), ""},
-      // Three files of one content, one of them in two shares.
-      {duplicates("[ '1', 's', '/s/\\'a,', 2000, 1 ],\n[ '1', 's', '/s/b', 2000, 1 ],\n"
-                  "[ '1', 't', '/s/b', 2000, 1 ],\n[ '1', 't', '/s/c', 2000, 1 ],\n"
-                  "[ '2', 's', '/s/\\\\', 96, 1 ],\n[ '2', 's', '/s/e', 96, 1 ]",
-                  1),
-       "Confirmed duplicates could free: 4\u00a0KiB"},
-      {duplicates("[ '1', 's', '/a', '10', '1' ],\n[ '1', 't', '/a', '10', '1' ]"), ""},
-      {duplicates(groups),
-       "Possible duplicates could free: at least 200\u00a0KiB (counting only the first 200 "
-       "groups)"},
-      {duplicates("[ '1', 's', '/a', 10 ]"), ""}};
-  for (const auto& [page, expected] : cases) {
-    EXPECT_EQ(expected, lines_of(figures_of(page))) << page;
-  }
-  // Behind the first 64 MiB nothing is read.
-  const std::string row = "[ '1', 's', '/a', 1, 1 ],\n";
-  std::string rows = row + "[ '1', 's', '/b', 1, 1 ],\n";
-  while (rows.size() < std::size_t{64} << 20U) {
-    rows += row;
-  }
-  EXPECT_NE(std::string::npos, lines_of(figures_of(duplicates(rows))).find("at least 1\u00a0B"));
+  EXPECT_EQ(lines_of(mail(facts).plain), lines_of(html));
+
+  facts = facts_with({}, {{IncidentLevel::kWarning, "unheard", "x", "Only this."}});
+  facts.volumes.emplace_back().path = "/c";
+  EXPECT_EQ(
+      "Only this.\n\nThe storage report “weekly” of files is ready.\n\nOnly this.\n\n"
+      "Most pressing volume: /c, size unknown\nMade: now\n\nhttps://h/?a&b\n",
+      mail(facts).plain);
+  EXPECT_EQ(
+      "The storage report “weekly” of files is ready.\n\n"
+      "Its figures are missing: they could not be read from the report.\n"
+      "Reports: Shares, x\nMade: now\n\nhttps://h/?a&b\n",
+      mail(std::nullopt).plain);
 }
 
-TEST(MailSummary, SpeaksEachLanguage) {
-  const host::ReportFigures figures = {host::FullestVolume{"/srv", 93.64, host::Outlook::days, 12},
-                                       host::LargestShare{"photos", 1610612736},
-                                       host::QuotaFigures{{{"joe", 97.5}}, false},
-                                       host::DuplicateFigures{1610612736, false, true}};
+// The texts that C++ asks for, by its sources, and those of the dictionaries are the same.
+TEST(MailTexts, AreThereInEachLanguageAndNoOthers) {
+  const std::string root = VORN_TEST_SOURCE_DIR "/";
+  const std::string sources = support::read_file(root + "platform/host/mail/mail_summary.cpp") +
+                              support::read_file(root + "report_format/texts.cpp");
+  const std::regex call(R"re((?:\b(?:say|about)\(|kMail, )\s*"(\w+)")re");
+  std::set<std::string> used;
+  for (std::sregex_iterator match(sources.begin(), sources.end(), call), end; match != end;
+       ++match) {
+    used.insert((*match)[1]);
+  }
   nlohmann::json english;
   for (const std::string code : {"en", "de", "fr", "es", "ja", "zh"}) {
-    const auto texts =
-        nlohmann::json::parse(support::read_file(kDictionaries + "/" + code + ".json"))["mail"];
+    const auto texts = nlohmann::json::parse(
+        support::read_file(root + "reportUI/template/lang/" + code + ".json"))["mail"];
     english = code == "en" ? texts : english;
-    const std::regex placeholder(R"(\{\w+\})");
-    for (const auto& [key, text] : english.items()) {
-      const auto placeholders = [&](const std::string& value) {
+    std::set<std::string> keys;
+    for (const auto& [key, text] : texts.items()) {
+      keys.insert(key);
+      const auto placeholders = [](const std::string& value) {
+        const std::regex placeholder(R"(\{\w+\})");
         const std::sregex_iterator begin(value.begin(), value.end(), placeholder);
         std::multiset<std::string> found;
         std::for_each(begin, {}, [&](const std::smatch& match) { found.insert(match.str()); });
         return found;
       };
-      ASSERT_TRUE(texts.contains(key)) << code << " " << key;
-      EXPECT_EQ(placeholders(text), placeholders(texts[key])) << code << " " << key;
+      EXPECT_EQ(placeholders(english.value(key, "")), placeholders(text)) << code << " " << key;
     }
-    EXPECT_EQ(english.size(), texts.size()) << code;
-    EXPECT_EQ(std::string::npos, lines_of(figures, code).find_first_of("{}")) << code;
-  }
-  const std::pair<const char*, const char*> cases[] = {
-      {"de-AT", "Vollstes Volume: /srv (93,6\u00a0%)"},
-      {"zh", "使用率最高的卷：/srv（93.6%）"},
-      {"ja", "最も使用率の高いボリューム: /srv (93.6%)"},
-      {"xx", "Fullest volume: /srv (93.6%)"},
-      {"en-much-too-long", "Fullest volume: /srv (93.6%)"}};
-  for (const auto& [code, line] : cases) {
-    const std::string lines = lines_of(figures, code);
-    EXPECT_EQ(line, lines.substr(0, lines.find('\n')));
+    EXPECT_EQ(used, keys) << code;
   }
 }
 
-TEST(MailSummary, KeepsHostileNamesOutOfTheHtml) {
+TEST_F(MailSummary, SpeaksTheLanguageOfTheProfile) {
+  const Facts facts = facts_with({}, {missing("b")});
+  const std::pair<const char*, const char*> cases[] = {
+      {"de-AT", "Freigabe b fehlt – Speicherbericht weekly von files – unvollständig"},
+      {"xx", "Share b is missing from this report – storage report weekly of files – incomplete"}};
+  for (const auto& [code, subject] : cases) {
+    EXPECT_EQ(subject, mail(facts, code).subject);
+  }
+}
+
+TEST_F(MailSummary, KeepsHostileNamesOutOfTheHtml) {
   const std::string hostile = "</bdi><script src=\"https://x\">&'{value}\u202e\n";
-  host::ReportFigures figures;
-  figures.volume = host::FullestVolume{hostile, 50};
-  figures.share = host::LargestShare{hostile, 1};
-  figures.quota = host::QuotaFigures{{{hostile, 95}}, false};
-  const host::MailTexts texts(kDictionaries, "en");
-  const std::string html =
-      report_mail(texts, {"p", "h", "now", "https://h/?a&b", "large_file," + hostile}, figures)
-          .html;
+  Facts facts = facts_with({fills(Level::kWarning, hostile.c_str()), largest(hostile)},
+                           {{IncidentLevel::kError, hostile, hostile, hostile}});
+  facts.volumes.emplace_back().path = hostile;
+  facts.reports.emplace_back().name = hostile;
+  const std::string html = mail(facts).html;
   const std::string safe =
       "<bdi>&lt;/bdi&gt;&lt;script "
       "src=&quot;https://x&quot;&gt;&amp;&#39;{value}U+202EU+000A</bdi>";
-  EXPECT_NE(std::string::npos, html.find(safe + " (50%)")) << html;
+  EXPECT_NE(std::string::npos, html.find("share is " + safe + " with ")) << html;
   EXPECT_NE(std::string::npos, html.find("href=\"https://h/?a&amp;b\"")) << html;
   EXPECT_FALSE(std::regex_search(html, std::regex("<script|<img|<link|url\\(|src=\"|\n\n")))
       << html;
-  // Whatever a profile's list and the quota tool hold, it stays a small mail.
-  figures.quota = host::QuotaFigures{{1000, {std::string(127, '\x01'), 95}}, true};
-  EXPECT_LT(report_mail(
-                texts, {"p", "h", "now", "l", std::string(200'000, '&') + std::string(99'999, ',')},
-                figures)
-                .html.size(),
-            std::size_t{100} << 10U);
+  // Whatever facts and a profile's list hold, it stays a small mail.
+  const std::string name(255, '\x01');
+  const Facts many =
+      facts_with({1000, {Level::kWarning, "quota_near", {{"user", name}, {"volume", "/"}}, ""}},
+                 {1000, {IncidentLevel::kError, "share_missing", name, name}});
+  const host::MailContent content = mail(many);
+  EXPECT_LT(content.html.size(), std::size_t{200} << 10U);
+  EXPECT_NE(std::string::npos, content.plain.find("\n… and 980 more\n"));
+  EXPECT_NE(std::string::npos, content.plain.find("\n… and 979 more\n"));
+  host::MailTopic topic = kTopic;
+  topic.report_list = std::string(200'000, '&') + std::string(99'999, ',') + "x";
+  EXPECT_LT(mail(std::nullopt, "en", topic).html.size(), std::size_t{10} << 10U);
 }
 
 }  // namespace

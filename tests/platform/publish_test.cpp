@@ -11,6 +11,7 @@
 #include <filesystem>
 #include <regex>
 
+#include "dictionaries.hpp"
 #include "mail/mail.hpp"
 #include "support.hpp"
 #include "vorn/base/file_io.hpp"
@@ -109,7 +110,6 @@ class MailServer {
 };
 
 const std::string kDictionaries = VORN_PATH_TEMPLATE "/lang";
-const std::string kSourceDictionaries = VORN_TEST_SOURCE_DIR "/reportUI/template/lang";
 
 int send(Entries profile, const std::string& url, const char* to = "a@example.com") {
   profile.emplace_back("smtp_url", url);
@@ -126,10 +126,13 @@ TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
                            {"report_list", "share_list,large_file"},
                            {"real_path_report_final", folder.path("report.html")},
                            {"smtp_url", server.url()}};
-  support::write_file(folder.path("report.html"),
-                      "var vornShareListData = [\n[ 'photos', '/', '2048' ]\n];\n");
-  support::write_file(kDictionaries + "/en.json",
-                      support::read_file(kSourceDictionaries + "/en.json"));
+  report_format::Facts facts;
+  facts.attention = {{report_format::Level::kOk,
+                      "share_largest",
+                      {{"share", "photos"}, {"bytes", std::int64_t{2048}}},
+                      "share_list"}};
+  support::write_file(folder.path("report.json"), to_line(facts));
+  support::write_dictionaries(kDictionaries);
   ASSERT_EQ(0, VornQazSendReport("weekly", long_link.c_str(), make_hash(profile).get()));
   EXPECT_EQ("", syslog_text());
   ASSERT_EQ(2U, server.count());
@@ -157,14 +160,45 @@ TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
     const std::regex soft_break("=\r\n");
     const std::string plain = std::regex_replace(parts[4].str(), soft_break, "");
     const std::string html = std::regex_replace(parts[5].str(), soft_break, "");
-    for (const char* text :
-         {"x?=3D.\r\n.\r\nend\r\n",  // a line of one dot must not end it
-          "Largest share: photos (2=C2=A0KiB)", "Reports: Shares, Largest files"}) {
+    for (const char* text : {"x?=3D.\r\n.\r\nend\r\n",  // a line of one dot must not end it
+                             "The largest share is photos with 2=C2=A0KiB\r\n"}) {
       EXPECT_NE(std::string::npos, plain.find(text)) << plain;
     }
-    EXPECT_NE(std::string::npos, html.find("<bdi>photos</bdi> (2=C2=A0KiB)")) << html;
+    EXPECT_NE(std::string::npos, html.find("<bdi>photos</bdi> with 2=C2=A0KiB")) << html;
   }
   EXPECT_EQ(ports[0], ports[1]);
+}
+
+TEST(SendReport, TakesFactsFromAPlainFileOnly) {
+  const MailServer server;
+  const support::TempFolder folder;
+  support::write_dictionaries(kDictionaries);
+  const std::string facts = folder.path("report.json");
+  const std::function<void()> places[] = {
+      [&] {},  // absent
+      [&] { support::write_file(facts, "{\"format\": 1"); },
+      [&] { support::write_file(facts, R"({"format": 2, "attention": []})"); },
+      [&] {
+        support::write_file(folder.path("elsewhere"), R"({"format": 1})");
+        std::filesystem::create_symlink(folder.path("elsewhere"), facts);
+      },
+      [&] { ASSERT_EQ(0, mkfifo(facts.c_str(), 0600)); },
+      [&] {
+        support::write_file(facts, R"({"format": 1})");
+        std::filesystem::resize_file(facts, report_format::kLargestFacts + 1);
+      },
+      [&] { support::write_file(facts, R"({"format": 1})"); }};
+  int count = 0;
+  for (const auto& place : places) {
+    std::filesystem::remove(facts);
+    place();
+    EXPECT_EQ(0, send({{"real_path_report_final", folder.path("report.html")}}, server.url()));
+    const bool is_good = ++count == std::ssize(places);
+    EXPECT_EQ(is_good, server.mail(count).find("figures are missing") == std::string::npos)
+        << count;
+    EXPECT_NE(std::string::npos, server.mail(count).find("https://h/r.html"));
+  }
+  EXPECT_EQ("", syslog_text());
 }
 
 TEST(SendReport, NeedsNoDictionary) {
@@ -179,8 +213,7 @@ TEST(SendTestMail, SaysWhoGetsNone) {
   const MailServer picky("--refuse b@example.com");
   const Entries profile = {{"mail_to", "a@example.com, b@example.com, c"},
                            {"smtp_url", picky.url()}};
-  support::write_file(kDictionaries + "/de.json",
-                      support::read_file(kSourceDictionaries + "/de.json"));
+  support::write_dictionaries(kDictionaries);
   const auto test = [](Entries entries) {
     entries.emplace_back("language", "de-AT");
     return host::send_test_mail("weekly", *make_hash(entries), host::MailLimits{});

@@ -3,12 +3,29 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdlib>
 #include <filesystem>
 #include <system_error>
 
 namespace host {
+namespace {
+
+Fd open_regular_with(int folder, const char* name, int flags) {
+  Fd fd(openat(folder, name, O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
+  struct stat status {};
+  if (!fd || fstat(fd.get(), &status) != 0) {
+    return {};
+  }
+  if (!S_ISREG(status.st_mode)) {
+    errno = S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
+    return {};
+  }
+  return fd;
+}
+
+}  // namespace
 
 ErrnoKeeper::ErrnoKeeper() : saved_(errno) {}
 ErrnoKeeper::~ErrnoKeeper() {
@@ -16,34 +33,34 @@ ErrnoKeeper::~ErrnoKeeper() {
 }
 
 std::optional<std::string> read_file(const std::string& path, std::size_t limit) {
-  const Fd fd(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-  struct stat status {};
-  if (!fd || fstat(fd.get(), &status) != 0) {
+  const Fd fd = open_regular_with(AT_FDCWD, path.c_str(), 0);
+  std::optional<std::string> text = fd ? read_start(fd.get(), limit + 1) : std::nullopt;
+  if (text && text->size() > limit) {
+    errno = EFBIG;
     return std::nullopt;
   }
-  if (!S_ISREG(status.st_mode)) {
-    errno = S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
-    return std::nullopt;
-  }
+  return text;
+}
+
+Fd open_regular(int folder, const char* name) {
+  return open_regular_with(folder, name, O_NOFOLLOW);
+}
+
+std::optional<std::string> read_start(int fd, std::size_t most) {
   std::string text;
   char chunk[16384];
-  for (;;) {
-    const ssize_t got = read(fd.get(), chunk, sizeof chunk);
+  while (text.size() < most) {
+    const ssize_t got = read(fd, chunk, std::min(sizeof chunk, most - text.size()));
     if (got == 0) {
-      return text;
+      break;
     }
-    if (got < 0) {
-      if (errno == EINTR) {
-        continue;
-      }
-      return std::nullopt;
-    }
-    text.append(chunk, static_cast<std::size_t>(got));
-    if (text.size() > limit) {
-      errno = EFBIG;
+    if (got > 0) {
+      text.append(chunk, static_cast<std::size_t>(got));
+    } else if (errno != EINTR) {
       return std::nullopt;
     }
   }
+  return text;
 }
 
 bool write_all(int fd, std::string_view text) {

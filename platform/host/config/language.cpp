@@ -1,11 +1,10 @@
 // The language of the page.
-#include "config/language.hpp"
-
 #include <cerrno>
 #include <cstring>
 #include <string_view>
 
 #include "base/host_log.hpp"
+#include "report_format/values.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
 
@@ -17,7 +16,7 @@ int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size) {
   }
   const char* value = VLIBCSzHashGetValue(hash, "language");
   std::string_view language = value == nullptr || *value == '\0' ? kDefault : value;
-  if (!host::is_language_code(language) || language.size() >= size) {
+  if (!report_format::is_language_code(language) || language.size() >= size) {
     host::log_line(
         "language \"%.80s\" is no code of at most %zu letters, digits and '-', so the page is in "
         "English; write language = en, for example, in %s",

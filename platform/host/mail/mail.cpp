@@ -16,6 +16,7 @@
 #include "base/host_log.hpp"
 #include "config/profile.hpp"
 #include "mail/mail_delivery.hpp"
+#include "report_format/facts_file.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"
@@ -140,7 +141,7 @@ struct Posting {
   MailServer server;
   std::string from;
   std::vector<std::string> to;
-  MailTexts texts;
+  report_format::Texts texts;
   MailTopic topic;
 };
 
@@ -225,7 +226,8 @@ int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
   MailTopic topic = posting->topic;
   topic.link = link;
   const std::string page = value_of(hash, "real_path_report_final");
-  const MailContent content = report_mail(posting->texts, topic, read_figures(page.c_str()));
+  const auto facts = report_format::read_facts(page.substr(0, page.rfind('/')));
+  const MailContent content = report_mail(posting->texts, topic, facts);
   return send(profile, *posting, content, limits).empty() ? -1 : 0;
 }
 

@@ -52,8 +52,8 @@ std::string quoted_printable(std::string_view text);
 // encoded words on folded lines. Line ends and other control characters become blanks.
 std::string header_text(std::string_view text);
 
-// As VornQazSendReport. With the path of the finished page in `hash` (real_path_report_final) the
-// mail tells its figures.
+// As VornQazSendReport. The mail tells the facts beside the finished page, whose path is in `hash`
+// (real_path_report_final).
 int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
                 const MailLimits& limits);
 

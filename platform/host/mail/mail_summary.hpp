@@ -1,11 +1,12 @@
-// What the mails say: that a report is ready, and the figures of it that matter most.
+// What the mails say: that a report is ready, and the facts of it that matter most.
 #ifndef VORN_HOST_MAIL_SUMMARY_HPP
 #define VORN_HOST_MAIL_SUMMARY_HPP
 
+#include <optional>
 #include <string>
 
-#include "mail/mail_texts.hpp"
-#include "run/report_figures.hpp"
+#include "report_format/facts.hpp"
+#include "report_format/texts.hpp"
 
 namespace host {
 
@@ -26,11 +27,12 @@ struct MailContent {
   std::string html;
 };
 
-// Figures that are absent have no line.
-MailContent report_mail(const MailTexts& texts, const MailTopic& topic,
-                        const ReportFigures& figures);
+// Subject and first line say the worst thing first: what needs attention, else what the report
+// lacks. Without facts the mail says that they are missing.
+MailContent report_mail(const report_format::Texts& texts, const MailTopic& topic,
+                        const std::optional<report_format::Facts>& facts);
 // Only the profile, the host and the time of `topic` count.
-MailContent test_mail(const MailTexts& texts, const MailTopic& topic);
+MailContent test_mail(const report_format::Texts& texts, const MailTopic& topic);
 
 }  // namespace host
 

@@ -18,9 +18,9 @@ bool page_is_complete_at(int folder, const char* name) {
   constexpr std::string_view kBeginning = "<!DOCTYPE html>";
   constexpr std::string_view kLastLine = "\n</html>";
   const ErrnoKeeper keeper;
-  const Fd fd(openat(folder, name, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  const Fd fd = open_regular(folder, name);
   struct stat status {};
-  if (!fd || fstat(fd.get(), &status) != 0 || !S_ISREG(status.st_mode)) {
+  if (!fd || fstat(fd.get(), &status) != 0) {
     return false;
   }
   char buffer[kBeginning.size()];

@@ -1,6 +1,7 @@
 // Values of the configuration, judged once for all who read them.
 #pragma once
 
+#include <cstddef>
 #include <string_view>
 
 namespace report_format {
@@ -17,5 +18,9 @@ bool is_language_code(std::string_view code);
 // From how many per cent of a quota on a user is near to it, and above how many over it.
 inline constexpr double kNearQuota = 90;
 inline constexpr double kOverQuota = 100;
+
+// How much history a forecast needs: days between its first and last sample, days with samples.
+inline constexpr int kShortestWindow = 7;
+inline constexpr int kFewestSamples = 4;
 
 }  // namespace report_format
