@@ -17,7 +17,9 @@
 namespace {
 
 constexpr const char* kFooter =
-    "Exit status: 0 fine, 1 failed, 2 wrong usage. Every command is described in vornctl(8).";
+    "Exit status: 0 fine, 1 failed, 2 wrong usage, 3 a report that lacks something. Every command "
+    "is "
+    "described in vornctl(8).";
 
 // Names a word that is no command; the parser only says that one is missing.
 void check_commands(const CLI::App& app, int argc, char** argv) {

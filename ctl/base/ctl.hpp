@@ -1,7 +1,8 @@
 // What the commands of vornctl share. Each command has a file of its own, which adds it to the
 // command line (see commands.hpp of its group) and runs it in its callback.
 //
-// Exit status: 0 when all went well, 1 when the command failed, 2 when the command line is wrong.
+// Exit status: 0 when all went well, 1 when the command failed, 2 when the command line is wrong, 3
+// when a report was made that lacks something.
 // Results go to standard output, everything else to standard error.
 #ifndef VORN_CTL_CTL_HPP
 #define VORN_CTL_CTL_HPP
@@ -18,6 +19,7 @@ namespace ctl {
 
 inline constexpr int kFailed = 1;
 inline constexpr int kWrongUsage = 2;
+inline constexpr int kWithIncidents = 3;
 
 // Ends the command. The message is one line that says what is wrong and what to do; main prints it
 // after "vornctl: ". An empty one prints nothing, for a command that has said all.

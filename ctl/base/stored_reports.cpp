@@ -22,6 +22,10 @@ Reports reports_in(const std::string& folder, ReportSize size) {
   return std::move(*reports);
 }
 
+std::optional<report_format::Facts> facts_of(const admin::StoredReport& report) {
+  return report_format::read_facts(report.page.substr(0, report.page.rfind('/')));
+}
+
 std::optional<admin::StoredReport> newest_whole(const Reports& reports) {
   const auto newest = std::find_if(reports.rbegin(), reports.rend(),
                                    [](const auto& report) { return report.is_whole; });

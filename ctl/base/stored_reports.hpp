@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "report_format/facts_file.hpp"
 #include "vorn/admin/reports.hpp"
 
 namespace ctl {
@@ -18,6 +19,9 @@ std::string folder_of_reports(const admin::Section& profile);
 
 // The reports in `folder`, oldest first, with their sizes if asked for.
 Reports reports_in(const std::string& folder, ReportSize size);
+
+// What the report tells of itself; nothing for one of before that, or a damaged one.
+std::optional<report_format::Facts> facts_of(const admin::StoredReport& report);
 
 // The newest one that is whole, or nothing.
 std::optional<admin::StoredReport> newest_whole(const Reports& reports);

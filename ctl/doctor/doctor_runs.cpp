@@ -103,6 +103,24 @@ void check_schedules(Findings& findings, const Configuration& configuration) {
   }
 }
 
+namespace {
+
+// What the last report says that it lacks.
+void check_last_report(Findings& findings, const Section& profile) try {
+  const auto report = newest_whole(reports_in(folder_of_reports(profile), ReportSize::left_out));
+  const auto facts = report ? facts_of(*report) : std::nullopt;
+  for (const report_format::Incident& incident :
+       facts ? facts->incidents : std::vector<report_format::Incident>{}) {
+    const bool is_error = incident.level == report_format::IncidentLevel::kError;
+    findings.add(is_error ? Level::error : Level::warning, "last report of " + profile.name,
+                 incident.text);
+  }
+} catch (const Failure&) {
+  // Other checks tell of a folder that can't be read.
+}
+
+}  // namespace
+
 void check_last_runs(Findings& findings, const Configuration& configuration) {
   for (const Section& profile : configuration.profiles) {
     const std::string subject = "last run of " + profile.name;
@@ -113,6 +131,7 @@ void check_last_runs(Findings& findings, const Configuration& configuration) {
     } else {
       findings.ok(subject, word_for(state));
     }
+    check_last_report(findings, profile);
     if (state != RunState::running) {  // what it has begun is no left-over
       check_leftovers(findings, profile);
     }

@@ -30,22 +30,47 @@ struct Options {
   bool json = false;
 };
 
+// The worst that a report says of what it has seen.
+const char* level_of(const report_format::Facts& facts) {
+  return report_format::word_of(facts.attention.empty() ? report_format::Level::kOk
+                                                        : facts.attention.front().level);
+}
+
+// "yes", "yes, lacking 2" (incidents that it tells), or "no" (its page).
+std::string complete_text(const admin::StoredReport& report,
+                          const std::optional<report_format::Facts>& facts) {
+  return !report.is_whole ? "no"
+         : facts && !facts->incidents.empty()
+             ? "yes, lacking " + std::to_string(facts->incidents.size())
+             : "yes";
+}
+
+void list_as_json(const Reports& reports) {
+  auto array = nlohmann::ordered_json::array();
+  for (const admin::StoredReport& report : reports) {
+    nlohmann::ordered_json entry{{"name", report.name},  {"made", json_time(report.made)},
+                                 {"bytes", report.size}, {"complete", report.is_whole},
+                                 {"level", nullptr},     {"incidents", nullptr},
+                                 {"path", report.page}};
+    if (const auto facts = facts_of(report)) {
+      entry["level"] = level_of(*facts);
+      entry["incidents"] = facts->incidents.size();
+    }
+    array.push_back(std::move(entry));
+  }
+  print_json(array);
+}
+
 void list(const Options& options, const std::string& folder, const Reports& reports) {
   if (options.json) {
-    auto array = nlohmann::ordered_json::array();
-    for (const admin::StoredReport& report : reports) {
-      array.push_back({{"name", report.name},
-                       {"made", json_time(report.made)},
-                       {"bytes", report.size},
-                       {"complete", report.is_whole},
-                       {"path", report.page}});
-    }
-    print_json(array);
+    list_as_json(reports);
     return;
   }
-  Table table({{"DATE"}, {"SIZE", Table::Align::right}, {"COMPLETE"}, {"PATH"}});
+  Table table({{"DATE"}, {"SIZE", Table::Align::right}, {"COMPLETE"}, {"LEVEL"}, {"PATH"}});
   for (const admin::StoredReport& report : reports) {
-    table.add({report.name, size_text(report.size), report.is_whole ? "yes" : "no", report.page});
+    const auto facts = facts_of(report);
+    table.add({report.name, size_text(report.size), complete_text(report, facts),
+               facts ? level_of(*facts) : "-", report.page});
   }
   if (table.empty()) {
     print_line("profile " + options.profile + " has no reports in " + folder);

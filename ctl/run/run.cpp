@@ -16,6 +16,7 @@
 #include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "base/stored_reports.hpp"
+#include "report_format/facts_file.hpp"
 #include "report_format/reports.hpp"
 #include "run/commands.hpp"
 #include "run/run_log.hpp"
@@ -138,27 +139,21 @@ void check_start(const Options& options, const Section& profile) {
 
 // Until the run has ended; a signal to this process is passed on to it as SIGTERM, which makes it
 // clear up and end.
-void watch(Child& child, RunWatch& run) {
+void watch(Child& child, const std::string& profile, RunOutput& output) {
   constexpr std::chrono::milliseconds kWait{200};
-  constexpr std::chrono::seconds kCountEvery{1};
   ProgressLine line;
-  Clock::time_point counted = Clock::now();
   bool told = false;
   while (!child.has_ended()) {
-    run.take_output(child.read_output(kWait));
+    output.take(child.read_output(kWait));
     if (g_signal != 0 && !told) {
       child.send_signal(SIGTERM);
       told = true;
     }
-    if (Clock::now() - counted >= kCountEvery) {
-      run.count_files();
-      counted = Clock::now();
-    }
-    line.show(told ? "ending the run" : run.progress());
+    line.show(told ? "ending the run" : progress_line(profile, admin::read_progress(profile)));
   }
-  std::string output;
-  while (!(output = child.read_output(std::chrono::milliseconds(0))).empty()) {
-    run.take_output(output);
+  std::string rest;
+  while (!(rest = child.read_output(std::chrono::milliseconds(0))).empty()) {
+    output.take(rest);
   }
 }
 
@@ -186,10 +181,10 @@ bool has_collected(const Section& profile, std::time_t start) {
 }
 
 [[noreturn]] void fail_with_log(const std::string& what, const RunLog& log, const Child& child,
-                                const RunWatch& run) {
+                                const RunOutput& output) {
   std::vector<std::string> said = log.messages(child.pid());
   if (said.empty()) {
-    said.assign(run.complaints().begin(), run.complaints().end());
+    said.assign(output.complaints().begin(), output.complaints().end());
   }
   for (const std::string& line : said) {
     warn(line);
@@ -197,34 +192,33 @@ bool has_collected(const Section& profile, std::time_t start) {
   throw Failure(what + "; see " + log.command() + ", and vornctl doctor");
 }
 
-Reports reports_of(const Section& profile) {
-  return reports_in(folder_of_reports(profile), ReportSize::left_out);
-}
-
-// The page that isn't among the reports `before`; empty when there is none. After the clock was set
-// back it isn't the last one.
-std::string new_page(const Section& profile, const Reports& before) {
-  for (const admin::StoredReport& report : reports_of(profile)) {
-    const bool is_new = std::none_of(before.begin(), before.end(),
-                                     [&](const auto& known) { return known.name == report.name; });
-    if (is_new && report.is_whole) {
-      return report.page;
-    }
+// Prints the page of the report, and what it lacks to standard error.
+void show_report(const Section& profile, const std::string& report) {
+  const std::string folder = folder_of_reports(profile) + "/" + report;
+  print_line(folder + "/" + report_format::kPageFile);
+  const auto facts = report_format::read_facts(folder);
+  if (!facts) {
+    throw Failure(folder + "/" + report_format::kFactsFile + " can't be read; run vornctl doctor");
   }
-  return "";
+  for (const report_format::Incident& incident : facts->incidents) {
+    warn(incident.text);
+  }
+  if (!facts->incidents.empty()) {
+    throw Failure("", kWithIncidents);
+  }
 }
 
 void run(const Options& options) {
   const Section profile = read_profile(options.profile);
   check_start(options, profile);
-  const auto before = options.data ? Reports{} : reports_of(profile);
+  const std::string before = admin::last_run(profile.name).status.report;
   const std::time_t start = std::time(nullptr);
   const RunLog log;
   const SignalsNoted noted;
-  RunWatch watched(profile.name, count_reports(profile.value("report_list")));
+  RunOutput output(profile.name);
   Child child({kProgram, option_of(options.data ? JobKind::data : JobKind::report), profile.name});
-  watch(child, watched);
-  if (watched.was_skipped()) {
+  watch(child, profile.name, output);
+  if (output.was_skipped()) {
     fail_as_running(profile.name);
   }
   if (child.exit_status() != 0) {
@@ -234,19 +228,20 @@ void run(const Options& options) {
                     " was ended; what it had begun is removed");
     }
     fail_with_log("the run of profile " + profile.name + " was ended from outside", log, child,
-                  watched);
+                  output);
   }
   if (options.data) {
     if (!has_collected(profile, start)) {
-      fail_with_log("collecting data for profile " + profile.name + " failed", log, child, watched);
+      fail_with_log("collecting data for profile " + profile.name + " failed", log, child, output);
     }
     return;
   }
-  const std::string page = new_page(profile, before);
-  if (!has_succeeded(profile) || page.empty()) {
-    fail_with_log("the run of profile " + profile.name + " failed", log, child, watched);
+  const admin::LastRun last = admin::last_run(profile.name);
+  if (last.state != admin::RunState::succeeded || last.status.report.empty() ||
+      last.status.report == before) {
+    fail_with_log("the run of profile " + profile.name + " failed", log, child, output);
   }
-  print_line(page);
+  show_report(profile, last.status.report);
 }
 
 }  // namespace

@@ -1,27 +1,29 @@
-// How far a run has come, from what it prints and from its statistics database.
+// A run in the foreground: how far it has come, and what it has to say.
 #ifndef VORN_CTL_RUN_WATCH_HPP
 #define VORN_CTL_RUN_WATCH_HPP
 
-#include <cstdint>
 #include <deque>
+#include <optional>
 #include <string>
 #include <string_view>
 
+#include "report_format/run_state.hpp"
+
 namespace ctl {
 
-class RunWatch {
+// One line for a terminal, for instance "weekly: report 3 of 9, large_file". No `progress`: the run
+// tells none yet.
+std::string progress_line(const std::string& profile,
+                          const std::optional<report_format::Progress>& progress);
+
+// What a run prints.
+class RunOutput {
  public:
-  // `reports` is the number of reports that the run will make.
-  RunWatch(std::string profile, int reports) : profile_(std::move(profile)), reports_(reports) {}
+  explicit RunOutput(const std::string& profile)
+      : skipped_("profile=" + profile + " is running, skip running again") {}
 
-  // What the run has printed, in pieces of any size.
-  void take_output(std::string_view bytes);
-
-  // One line for a terminal, for instance "weekly: report 3 of 9, large_file".
-  std::string progress() const;
-
-  // Looks how many files the run has counted so far. Takes no lock that the run could meet.
-  void count_files();
+  // The next piece, of any size.
+  void take(std::string_view bytes);
 
   // The run has said that another one is going on, and ended.
   bool was_skipped() const { return was_skipped_; }
@@ -29,18 +31,9 @@ class RunWatch {
   const std::deque<std::string>& complaints() const { return complaints_; }
 
  private:
-  enum class Phase { starting, gathering, reporting, assembling, publishing };
-
   void take_line(std::string_view line);
-  void take_progress(std::string_view text);
 
-  std::string profile_;
-  int reports_;
-  Phase phase_ = Phase::starting;
-  std::string share_;
-  std::string report_;
-  int report_number_ = 0;
-  std::int64_t files_ = 0;
+  std::string skipped_;
   bool was_skipped_ = false;
   std::string rest_;  // the beginning of a line that isn't whole yet
   std::deque<std::string> complaints_;

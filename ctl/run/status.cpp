@@ -7,7 +7,6 @@
 #include "base/ctl.hpp"
 #include "base/stored_reports.hpp"
 #include "base/texts.hpp"
-#include "report_format/facts_file.hpp"
 #include "run/commands.hpp"
 #include "schedule/jobs.hpp"
 
@@ -49,10 +48,9 @@ std::optional<NextRun> next_of(const std::string& profile, const std::vector<Job
 
 // One folder that can't be read must not hide the other profiles.
 void add_report(const Section& profile, ProfileStatus& status) try {
-  const std::string folder = folder_of_reports(profile);
-  status.last = newest_whole(reports_in(folder, ReportSize::measured));
+  status.last = newest_whole(reports_in(folder_of_reports(profile), ReportSize::measured));
   if (status.last) {
-    status.facts = report_format::read_facts(folder + "/" + status.last->name);
+    status.facts = facts_of(*status.last);
   }
 } catch (const Failure& failure) {
   warn(failure.what());

@@ -86,10 +86,6 @@ std::optional<report_format::Progress> read_progress(const std::string& profile)
   return text ? report_format::progress_of(*text) : std::nullopt;
 }
 
-std::string statistics_file(const std::string& profile) {
-  return host::statistics_path(profile);
-}
-
 Hold hold_profile(const std::string& profile) {
   switch (host::take_profile(profile)) {
     case host::TakeResult::taken:

@@ -33,8 +33,6 @@ LastRun last_run(const std::string& profile);
 
 // How far the run that is going on has come; nothing when there is none or it doesn't tell.
 std::optional<report_format::Progress> read_progress(const std::string& profile);
-// Where a run keeps what it has counted.
-std::string statistics_file(const std::string& profile);
 
 // --- Holding ------------------------------------------------------------------------------------
 
