@@ -1,9 +1,11 @@
 // How to add a report:
-//   1. Write src/rep_<name>.cpp: a StatisticsReport record and its report function (or, for one
+//   1. Add its format to kReports of report_format/reports.hpp, at the place it shall have on the
+//      page: name, variable and limits, which page and vornctl take from there.
+//   2. Write src/rep_<name>.cpp: a StatisticsReport record and its report function (or, for one
 //      that doesn't read the statistics database, a report function of its own).
-//   2. Add its line to kRegistry below, at the place it shall have on the page.
-//   3. Add its section to the page: one entry in the table of reportUI/template/report.js, and
-//      its texts in reportUI/template/lang/.
+//   3. Add its line to kRegistry below, at the same place.
+//   4. Add its section to the page: one entry in reportUI/page/src/sections.js, and its texts in
+//      the dictionaries of reportUI/template/lang.
 #include "vornreport/registry.hpp"
 
 #include <algorithm>

@@ -1,4 +1,5 @@
 """The scripts, and who includes whom."""
+import json
 import os
 import re
 import subprocess
@@ -6,7 +7,7 @@ import tempfile
 import unittest
 from pathlib import Path
 
-from harness import ROOT
+from harness import BUILD, ROOT
 
 TEMPLATE = ROOT / 'reportUI/build-template.sh'
 
@@ -25,18 +26,118 @@ class Sources(unittest.TestCase):
                               stdout=subprocess.PIPE)
         self.assertEqual(done.stdout, '')
 
+
+# --- Who includes whom ---------------------------------------------------------------------------
+
+# Where the includes of each part of the product are looked for, besides a file's own folder. A
+# part's own folder is private unless it is called include.
+SIGHT = {'src': 'include src platform/include report_format/include',
+         'include': 'include platform/include report_format/include',
+         'report_format': 'report_format/include platform/include platform/host/base/include',
+         'platform/include': 'platform/include',
+         'platform/host': 'platform/host platform/host/base/include platform/host/admin/include '
+                          'platform/include report_format/include',
+         'ctl': 'ctl platform/host/base/include platform/host/admin/include platform/include '
+                'report_format/include'}
+CONTRACTS = 'admin-contract format base-contract api'
+PROGRAM = 'facts ground format api'
+# Every room: its files, and the rooms whose headers it may name besides its own. Only such that
+# stand further down, so that no arrow runs back up. What stands in brackets tells the files of a
+# room apart: each report sees its own only.
+ROOMS = {
+    'main': (r'src/main\.cpp', 'driver'),
+    'registry': (r'src/vornreport/registry\.cpp', 'driver report ' + PROGRAM),
+    'driver': (r'src/vornreport/.*|include/vornreport/registry\.hpp',
+               'global gathering history ' + PROGRAM),
+    'global': (r'src/global\.cpp|include/vornreport/global\.hpp', 'report ' + PROGRAM),
+    'report': (r'src/rep_([a-z_]+)[./].*', 'frame history ' + PROGRAM),
+    'frame': (r'src/report_frame\..*', PROGRAM),
+    'gathering': (r'src/file_gathering/.*', PROGRAM),
+    'history': (r'src/db_volume_usage\..*', PROGRAM),
+    'facts': (r'src/facts/.*', 'ground format api'),
+    'ground': (r'src/(?:shell|below_share|error_log|report_data)\..*|include/vornreport/.*',
+               'format api'),
+
+    'ctl-main': (r'ctl/main\.cpp', 'doctor run config schedule ctl-base ' + CONTRACTS),
+    'doctor': (r'ctl/doctor/.*', 'run config schedule ctl-base ' + CONTRACTS),
+    'run': (r'ctl/run/.*', 'schedule ctl-base ' + CONTRACTS),
+    'config': (r'ctl/config/.*', 'schedule ctl-base ' + CONTRACTS),
+    'schedule': (r'ctl/schedule/.*', 'ctl-base ' + CONTRACTS),
+    'ctl-base': (r'ctl/base/.*', CONTRACTS),
+
+    'admin': (r'platform/host/admin/(?!include/).*',
+              'host-mail host-run host-machine host-config host-base ' + CONTRACTS),
+    'admin-contract': (r'platform/host/admin/include/.*', 'format'),
+    'host-mail': (r'platform/host/mail/.*', 'host-config host-base format base-contract api'),
+    'host-run': (r'platform/host/run/.*', 'host-config host-base format base-contract api'),
+    'host-machine': (r'platform/host/machine/.*', 'host-config host-base format base-contract api'),
+    'host-config': (r'platform/host/config/.*', 'host-base format base-contract api'),
+    'host-base': (r'platform/host/base/(?!include/).*', 'base-contract api'),
+    'format': (r'report_format/.*', 'base-contract api'),
+    'base-contract': (r'platform/host/base/include/.*', 'api'),
+    'api': (r'platform/include/.*', '')}
+
+
+def room_of(path):
+    """The first room that `path` belongs to, and what tells it apart there; None when it has none."""
+    for room, (files, _) in ROOMS.items():
+        if match := re.fullmatch(files, path):
+            return room, match.groups()
+    return None
+
+
+def sight_of(path):
+    return max((part for part in SIGHT if path.startswith(part + '/')), key=len, default=None)
+
+
+class Includes(unittest.TestCase):
+    def sources(self):
+        """All but the tests and benchmarks, which look into everything."""
+        for folder, folders, names in os.walk(ROOT):
+            folders[:] = [name for name in folders if not name.startswith((
+                'build', '.', 'quickstart-', 'node_modules')) and not (
+                    Path(folder) == ROOT and name in ('tests', 'bench'))]
+            for name in names:
+                if re.search(r'\.(c|cc|cpp|h|hpp)$', name):
+                    yield str(Path(folder, name).relative_to(ROOT))
+
+    def test_rooms_name_only_what_stands_below(self):
+        order = list(ROOMS)
+        for room, (_, below) in ROOMS.items():
+            for other in below.split():
+                self.assertLess(order.index(room), order.index(other), f'{room} names {other}')
+
     def test_includes_go_one_way(self):
-        for folder, forbidden, exempt in (
-                ('src', r'platform/|host/', ''), ('include', r'platform/|host/', ''),
-                ('platform', r'vornreport/|src/|report_frame|file_gathering|rep_', ''),
-                ('include', r'rep_|file_gathering/', ''), ('ctl', r'src/|rep_|file_gathering/', ''),
-                ('src', r'rep_', r'registry\.cpp|global\.cpp')):
-            for path in (ROOT / folder).rglob('*.[ch]*'):
-                for include in re.findall(r'^\s*#\s*include\s*["<](.*)[">]', path.read_text(),
-                                          re.MULTILINE):
-                    # A report's own header is its own.
-                    if not (re.fullmatch(exempt, path.name) or Path(include).stem == path.stem):
-                        self.assertNotRegex(include, rf'^({forbidden})', path)
+        count = 0
+        for path in self.sources():
+            self.assertTrue(room_of(path), f'{path} belongs to no room')
+            room, _ = own = room_of(path)
+            sight = SIGHT[sight_of(path)].split()
+            for open_, name in re.findall(r'^\s*#\s*include\s*(["<])(.*)[">]',
+                                          (ROOT / path).read_text(), re.MULTILINE):
+                places = [Path(path).parent, *sight] if open_ == '"' else sight
+                found = [os.path.normpath(Path(place, name)) for place in places
+                         if (ROOT / place / name).is_file()]
+                self.assertTrue(found or open_ == '<', f'{path} names {name}, out of its sight')
+                for target in found[:1]:
+                    count += 1
+                    named = room_of(target)
+                    self.assertTrue(named == own or named[0] in ROOMS[room][1].split(),
+                                    f'{path} ({room}) names {target} ({named[0]})')
+        self.assertGreater(count, 500)
+
+    def test_targets_see_no_more(self):
+        commands = json.loads((BUILD / 'compile_commands.json').read_text())
+        seen = set()
+        for command in commands:
+            path = os.path.relpath(command['file'], ROOT)
+            part = sight_of(path)
+            if part and ' -o tests/' not in command['command']:
+                folders = {os.path.relpath(folder, ROOT)
+                           for folder in re.findall(r'-I(\S+)', command['command'])}
+                self.assertLessEqual(folders, set(SIGHT[part].split()), path)
+                seen.add(part)
+        self.assertEqual(seen, {'src', 'report_format', 'platform/host', 'ctl'})
 
 
 class Template(unittest.TestCase):
