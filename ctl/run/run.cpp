@@ -15,6 +15,7 @@
 #include "base/child.hpp"
 #include "base/ctl.hpp"
 #include "base/text_containers.hpp"
+#include "report_format/run_state.hpp"
 #include "run/old_reports.hpp"
 #include "run/profile_state.hpp"
 #include "run/run_log.hpp"
@@ -174,6 +175,7 @@ void clear_up(const Section& profile, bool is_report) {
     hash.set(key, value);
   }
   VornQazReportCleanTmp(profile.name.c_str(), &hash);
+  VornQazStatusUpdate(profile.name.c_str(), report_format::kFail);
 }
 
 // --- The outcome --------------------------------------------------------------------------------
