@@ -249,9 +249,9 @@ TEST_F(Run, AStatusThatCannotBeStoredIsTold) {
 
 TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
   const std::string own = folder.path("keep");
-  const std::vector<std::string> old = {"1999-12-31_23-59-59", "2001-02-03_04-05-06",
-                                        "2001-02-03_04-05-06-2", "2001-02-03_04-05-06-10",
-                                        "2999-01-01_00-00-00"};
+  const std::vector<std::string> old = {"2999-01-01_00-00-00", "1999-12-31_23-59-59",
+                                        "2001-02-03_04-05-06", "2001-02-03_04-05-06-2",
+                                        "2001-02-03_04-05-06-10"};
   const std::vector<std::string> others = {"2000-01-01_00-00-00-x", "2000-01-01",
                                            "2000-02-30_00-00-00", ".2000-01-01_00-00-00"};
   const struct {
@@ -295,6 +295,6 @@ TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
   }
   const auto listed = host::stored_reports(own, host::ReportSize::measured);
   ASSERT_EQ(listed.value().size(), 7U);
-  EXPECT_EQ((*listed)[1].name + ((*listed)[1].is_whole ? " whole" : ""), "2000-01-01_00-00-02");
-  EXPECT_GE((*listed)[1].size, 4096U);
+  EXPECT_EQ((*listed)[2].name + ((*listed)[2].is_whole ? " whole" : ""), "2000-01-01_00-00-02");
+  EXPECT_GE((*listed)[2].size, 4096U);
 }
