@@ -78,7 +78,7 @@ total = time.monotonic() - begin
 print(marks[b"stat complete"] - marks[b"stat start"], total, peak[0])
 ''', '/usr/vorn/bin/vornreport', '--report', 'bench']
     result = subprocess.run(command, stdout=subprocess.PIPE, check=True).stdout
-    status = (stage / 'usr/vorn/var/status/bench').read_text().strip()
+    status = (stage / 'usr/vorn/var/status/bench').read_text().splitlines()[0]
     if status != 'success':
         raise SystemExit(f'the report ended with the status "{status}"')
     return [float(number) for number in result.split()]

@@ -166,7 +166,7 @@ class Bench:
             [ROOT / 'tools/sandbox.sh', '--stage', self.stage, '--', sys.executable, '-c', WATCH,
              '/usr/vorn/bin/vornreport', '--report', 'bench'], stdout=subprocess.PIPE, check=True,
             stderr=subprocess.DEVNULL).stdout.split()
-        status = (self.stage / 'usr/vorn/var/status/bench').read_text().strip()
+        status = (self.stage / 'usr/vorn/var/status/bench').read_text().splitlines()[0]
         if status != 'success':
             raise SystemExit(f'the report ended with the status "{status}"')
         shutil.rmtree(self.stage / 'usr/vorn/var/reports/bench')

@@ -143,18 +143,27 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
   const int sections = build_report_html(profile, profile_hash, data_path.c_str());
   if (report_data_lost() || sections < 1) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 366, "create template failed");
-    VornQazReportCleanTmp(profile, profile_hash);
     return -1;
   }
   if (correct_report_dir(profile, profile_hash) < 0 || report_data_lost()) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 370, "correct dir failed");
-    VornQazReportCleanTmp(profile, profile_hash);
     return -1;
   }
   progress_phase(report_format::Phase::kPublishing);
   publish_report(profile, profile_hash);
-  VornQazStatusUpdate(profile, "success");
   return 0;
+}
+
+// The end of a run whose profile this process holds: what is unfinished goes when it failed, and
+// the outcome is stored. `profile_hash` is null when the profile couldn't be loaded. `result`, or
+// -1 when the report isn't what it seemed to be.
+int end_run(const char* profile, const VLIBCSzHash* profile_hash, int result) {
+  if (result < 0) {
+    VornQazReportCleanTmp(profile, profile_hash);
+    VornQazStatusUpdate(profile, "fail");
+    return result;
+  }
+  return VornQazStatusUpdate(profile, "success") == 1 ? -1 : result;
 }
 
 }  // namespace
@@ -228,14 +237,13 @@ int report_action(char** args) {
   const HashHandle hash = init_profile(profile, 1);
   if (!hash) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 352, "init profile failed, profile=%s", profile);
-    VornQazReportCleanTmp(profile, nullptr);
-    return -1;
+    return end_run(profile, nullptr, -1);
   }
   const char* stat_db = set_value(hash.get(), "real_path_stat_db");
   remove_when_terminated(stat_db, profile);
   begin_facts(profile, hash.get());
   progress_begin(profile, count_selected(hash.get()));
-  const int result = make_report(profile, hash.get());
+  const int result = end_run(profile, hash.get(), make_report(profile, hash.get()));
   progress_end();
   if (stat_db != nullptr) {
     unlink(stat_db);

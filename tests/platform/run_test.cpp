@@ -6,6 +6,8 @@
 #include <filesystem>
 #include <set>
 
+#include "report_format/facts.hpp"
+#include "report_format/run_state.hpp"
 #include "run/old_reports.hpp"
 #include "support.hpp"
 #include "vorn/paths.h"
@@ -20,6 +22,7 @@ using support::write_file;
 namespace {
 
 constexpr const char* kReports = VORN_PATH_REPORTS;
+constexpr const char* kWhole = "<!DOCTYPE html>\n</html>\n";
 
 std::string status_of(const std::string& profile) {
   return read_file(VORN_PATH_STATUS "/" + profile);
@@ -178,7 +181,7 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
 }
 
 TEST_F(Run, SuccessNeedsACompletePage) {
-  const std::pair<const char*, bool> cases[] = {{"<!DOCTYPE html>\n</html>\n", true},
+  const std::pair<const char*, bool> cases[] = {{kWhole, true},
                                                 {"<!DOCTYPE html>\n<p></html>", false},
                                                 {"<!DOCTYPE html>\n</html>\n<p", false},
                                                 {"<p>cut\noff</p>\n</html>\n", false},
@@ -190,20 +193,65 @@ TEST_F(Run, SuccessNeedsACompletePage) {
     if (page != nullptr) {
       publish(page);
     }
-    EXPECT_EQ(VornQazStatusUpdate("page", "success"), 0);
-    EXPECT_EQ(status_of("page"), good ? "success\n" : "fail\n");
+    EXPECT_EQ(VornQazStatusUpdate("page", "success"), good ? 0 : 1);
+    const std::string name = fs::path(path("real_path_date_final")).filename();
+    EXPECT_EQ(status_of("page"),
+              good ? "success\nreport = " + name + "\nincidents = 0\n" : "fail\n");
     EXPECT_EQ(exists(path("real_path_date_final")), good);
     EXPECT_FALSE(exists(path("real_path_date")));
     EXPECT_EQ(syslog_lines().size(), good ? 0U : 1U);
   }
 }
 
+TEST_F(Run, OnlyItsEndStoresHowItEnded) {
+  ASSERT_EQ(begin("end"), 0);
+  ASSERT_EQ(VornQazStatusUpdate("end", "collect_data"), 0);
+  EXPECT_EQ(VornQazReportCleanTmp("end", hash.get()), 0);
+  EXPECT_EQ(status_of("end"), "collect_data\n");
+  EXPECT_FALSE(exists(path("real_path_date")));
+  // Having cleared up is no way around the judgement.
+  EXPECT_EQ(VornQazStatusUpdate("end", "success"), 1);
+  EXPECT_EQ(status_of("end"), "fail\n");
+  syslog_lines();
+
+  // A run that fails behind its report's last name leaves nothing that looks like a report.
+  ASSERT_EQ(begin("end"), 0);
+  publish("<!DOCTYPE html>\n");
+  EXPECT_EQ(VornQazStatusUpdate("end", "fail"), 0);
+  EXPECT_FALSE(exists(path("real_path_date_final")) || exists(path("real_path_date")));
+  EXPECT_EQ(support::syslog_text(), "") << "the program has said why";
+
+  // A collection makes no report.
+  EXPECT_EQ(VornQazStatusUpdate("end", "success"), 0);
+  EXPECT_EQ(status_of("end"), "success\n");
+}
+
+TEST_F(Run, TheStatusCountsTheReportsIncidents) {
+  ASSERT_EQ(begin("told"), 0);
+  report_format::Facts facts;
+  facts.incidents.resize(2);
+  write_file(path("real_path_date") + "/report.json", to_line(facts));
+  publish(kWhole);
+  ASSERT_EQ(VornQazStatusUpdate("told", "success"), 0);
+  const report_format::RunStatus status = report_format::status_of(status_of("told"));
+  EXPECT_EQ(status.report, fs::path(path("real_path_date_final")).filename());
+  EXPECT_EQ(status.incidents, 2);
+}
+
+TEST_F(Run, AStatusThatCannotBeStoredIsTold) {
+  ASSERT_EQ(begin("stuck"), 0);
+  publish(kWhole);
+  fs::create_directories(VORN_PATH_STATUS "/stuck/x");
+  EXPECT_EQ(VornQazStatusUpdate("stuck", "success"), -1);
+  EXPECT_EQ(syslog_lines().size(), 1U);
+  EXPECT_TRUE(exists(path("real_path_date_final")));
+}
+
 TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
-  const std::string whole = "<!DOCTYPE html>\n</html>\n";
   const std::string own = folder.path("keep");
-  const std::vector<std::string> old = {"1999-12-31_23-59-59", "2001-02-03_04-05-06",
-                                        "2001-02-03_04-05-06-2", "2001-02-03_04-05-06-10",
-                                        "2999-01-01_00-00-00"};
+  const std::vector<std::string> old = {"2999-01-01_00-00-00", "1999-12-31_23-59-59",
+                                        "2001-02-03_04-05-06", "2001-02-03_04-05-06-2",
+                                        "2001-02-03_04-05-06-10"};
   const std::vector<std::string> others = {"2000-01-01_00-00-00-x", "2000-01-01",
                                            "2000-02-30_00-00-00", ".2000-01-01_00-00-00"};
   const struct {
@@ -212,17 +260,17 @@ TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
     std::size_t lines;
   } cases[] = {{"", 5, 0},  {"4", 3, 0},  {"2", 1, 0},     {"1", 0, 0},
                {"0", 5, 1}, {"+1", 5, 1}, {"1 week", 5, 1}};
-  write_file(folder.path("elsewhere/report.html"), whole);
+  write_file(folder.path("elsewhere/report.html"), kWhole);
   for (const auto& [value, stay, lines] : cases) {
     SCOPED_TRACE(value);
     fs::remove_all(own);
     std::set<std::string> expected(others.begin(), others.end());
     for (const std::string& name : old) {
-      write_file(own + "/" + name + "/report.html", whole);
+      write_file(own + "/" + name + "/report.html", kWhole);
       fs::create_directory_symlink(folder.path("elsewhere"), own + "/" + name + "/csv");
     }
     for (const std::string& name : others) {
-      write_file(own + "/" + name + "/report.html", whole);
+      write_file(own + "/" + name + "/report.html", kWhole);
     }
     write_file(own + "/" + *expected.insert("2000-01-01_00-00-02").first + "/report.html", "cut");
     fs::create_directory_symlink(folder.path("elsewhere"),
@@ -230,7 +278,7 @@ TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
     expected.insert(old.end() - static_cast<std::ptrdiff_t>(stay), old.end());
     hash = support::make_hash({{"report_dir", folder.path()}, {"keep_reports", value}});
     ASSERT_EQ(begin("keep"), 0);
-    publish(whole);
+    publish(kWhole);
     expected.insert(fs::path(path("real_path_date_final")).filename());
     EXPECT_EQ(VornQazStatusUpdate("keep", "success"), 0);
     EXPECT_EQ(syslog_lines().size(), lines);
@@ -240,13 +288,13 @@ TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
     }
     EXPECT_EQ(left, expected);
   }
-  EXPECT_EQ(read_file(folder.path("elsewhere/report.html")), whole);
+  EXPECT_EQ(read_file(folder.path("elsewhere/report.html")), kWhole);
   for (const char* name : {"2000-01-01_00-00-01", "2000-01-01_00-00-02", "..", "elsewhere"}) {
     EXPECT_FALSE(host::remove_report(own, name)) << name;
     EXPECT_EQ(syslog_lines().size(), 1U);
   }
   const auto listed = host::stored_reports(own, host::ReportSize::measured);
   ASSERT_EQ(listed.value().size(), 7U);
-  EXPECT_EQ((*listed)[1].name + ((*listed)[1].is_whole ? " whole" : ""), "2000-01-01_00-00-02");
-  EXPECT_GE((*listed)[1].size, 4096U);
+  EXPECT_EQ((*listed)[2].name + ((*listed)[2].is_whole ? " whole" : ""), "2000-01-01_00-00-02");
+  EXPECT_GE((*listed)[2].size, 4096U);
 }

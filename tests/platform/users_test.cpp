@@ -2,6 +2,7 @@
 #include "machine/users.hpp"
 
 #include <gtest/gtest.h>
+#include <sys/resource.h>
 
 #include "support.hpp"
 #include "vorn/report.h"
@@ -29,6 +30,28 @@ TEST(Users, HandOutHarmlessNamesOnly) {
     VORNUserFree(user);
   }
   EXPECT_EQ(5U, support::syslog_lines().size()) << "one for each that was refused";
+}
+
+// The sandbox's name service reads files, which nobody can who may open none.
+TEST(Users, AreMissedOnceWhenTheNameServiceFails) {
+  EXPECT_TRUE(support::passes_in_child([] {
+    static std::string told;
+    VornQazSetIncidentSink([](const char* kind, const char* what, const char* text) {
+      told += std::string(kind) + "|" + what + "|" + text + "\n";
+    });
+    VORNUser* user = nullptr;
+    EXPECT_EQ(-1, VORNUserGet("no-such-account", &user));
+    EXPECT_EQ("", told) << "an account that doesn't exist is nothing to tell";
+    const rlimit none{0, 0};
+    setrlimit(RLIMIT_NOFILE, &none);
+    EXPECT_EQ(-1, VORNUserGetByUID(5999, &user));
+    EXPECT_EQ(-1, VORNUserGet("nobody-asked-for-yet", &user));
+    EXPECT_EQ(
+        "users_unknown|Too many open files|the name service fails (Too many open files), so "
+        "accounts are missing from the reports; see to the services that the passwd line of "
+        "/etc/nsswitch.conf names\n",
+        told);
+  }));
 }
 
 TEST(AccountNames, AreSafeWhereverReportsWriteThem) {

@@ -3,11 +3,16 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
 #include <set>
 
 #include "base/text_containers.hpp"
 #include "machine/file_system.hpp"
+#include "machine/volume_space.hpp"
 #include "support.hpp"
+#include "vorn/report.h"
 #include "vorn/volume.h"
 
 namespace {
@@ -95,6 +100,115 @@ TEST(Volumes, OfTheNetworkAreThoseOfSharesThatSaySo) {
   const std::string log = support::syslog_text();
   EXPECT_TRUE(log.starts_with("share \"local\" is left out")) << log;
   EXPECT_NE(std::string::npos, log.find("write network = yes")) << log;
+}
+
+TEST(Volumes, KeepQuotasByTheirMountOptions) {
+  const std::pair<const char*, bool> cases[] = {
+      {"rw", false},
+      {"rw,usrquota,grpquota", true},
+      {"rw,usrjquota=aquota.user,jqfmt=vfsv1", true},
+      {"rw,usrjquota=,jqfmt=vfsv1", false},
+      {"rw,quota", true},
+      {"rw,uquota", true},
+      {"rw,uqnoenforce,inode64", true},
+      {"rw,noquota", false},
+      {"rw,grpquota,prjquota,gqnoenforce,pqnoenforce,grpjquota=x", false},
+      {"rw,nousrquota,x=usrquota", false}};
+  for (const auto& [options, expected] : cases) {
+    const auto mounts = mounts_of(std::string("20 1 8:1 / / rw - xfs /dev/sda1 ") + options + "\n");
+    ASSERT_EQ(1U, mounts.size());
+    EXPECT_EQ(expected, mounts[0].has_user_quotas) << options;
+  }
+  EXPECT_EQ(0, VORNVolumeHasQuotas("/nowhere"));
+}
+
+TEST(Volumes, AreFoundByPath) {
+  const support::TempFolder folder;
+  std::filesystem::create_symlink("/tmp/vol-storage-1", folder.path("link"));
+  char path[32] = "";
+  EXPECT_EQ(18, VORNVolumeOfPath(folder.path("link").c_str(), path, sizeof path));
+  EXPECT_STREQ("/tmp/vol-storage-1", path);
+  EXPECT_EQ(5, VORNVolumeOfPath("/proc/self", path, 6));
+  EXPECT_STREQ("/proc", path) << "no volume, but a mount";
+  for (const auto& [bad, size] : {std::pair("/proc/self", 5), {"/nowhere", 32}, {"", 32}}) {
+    EXPECT_EQ(-1, VORNVolumeOfPath(bad, path, static_cast<std::size_t>(size))) << bad;
+    EXPECT_STREQ("", path);
+  }
+  // A folder of a device that is mounted more than once has the volume of the enumeration.
+  char* const source = realpath(VORN_TEST_SOURCE_DIR, nullptr);
+  char long_path[4096] = "";
+  ASSERT_LT(0, VORNVolumeOfPath(source, long_path, sizeof long_path));
+  free(source);
+  VORNMountVolInfo* volumes = VORNMountVolAllEnum(nullptr, VORN_VOLUMES_OF_USAGE);
+  bool is_there = false;
+  for (const auto* volume = volumes; volume != nullptr; volume = volume->next) {
+    is_there = is_there || std::strcmp(volume->path, long_path) == 0;
+  }
+  VORNMountVolInfoFree(volumes);
+  EXPECT_TRUE(is_there) << long_path;
+}
+
+// --- Measuring ----------------------------------------------------------------------------------
+
+namespace {
+
+std::vector<std::string> told;  // to the sink
+
+class Measuring : public testing::Test {
+ protected:
+  Measuring() {
+    told.clear();
+    VornQazSetIncidentSink([](const char* kind, const char* what, const char* text) {
+      told.push_back(std::string(kind) + "|" + what + "|" + text);
+    });
+  }
+  ~Measuring() override { VornQazSetIncidentSink(nullptr); }
+
+  // Bytes free of `volume` that long after the start; -1 when it can't be measured.
+  long long free_after(const host::Volume& volume, std::chrono::seconds time) {
+    const auto space = measurements_.of(volume, start_ + time);
+    return space ? static_cast<long long>(space->free) : -1;
+  }
+
+ private:
+  host::Measurements measurements_;
+  const host::Measurements::Clock::time_point start_ = host::Measurements::Clock::now();
+};
+
+}  // namespace
+
+TEST_F(Measuring, CountsForFiveMinutes) {
+  const host::Volume volume = {7, "/tmp/vol-storage-1", VORN_FS_MEMORY, true};
+  const host::Volume other = {8, "/tmp/vol-storage-2", VORN_FS_MEMORY, true};
+  using namespace std::chrono_literals;
+  const long long before = free_after(volume, 0s);
+  EXPECT_EQ(4'194'304, before);
+  support::write_file(volume.path + "/file", std::string(65536, 'x'));
+  EXPECT_EQ(before, free_after(volume, 299s));
+  EXPECT_EQ(before, free_after(other, 299s));
+  EXPECT_EQ(before - 65536, free_after(volume, 300s));
+  std::filesystem::remove(volume.path + "/file");
+  EXPECT_EQ(before - 65536, free_after(volume, 599s));
+  EXPECT_EQ(before, free_after(volume, 600s));
+  EXPECT_TRUE(told.empty());
+}
+
+TEST_F(Measuring, TellsWhatCannotBeMeasured) {
+  using namespace std::chrono_literals;
+  const support::TempFolder folder;
+  const host::Volume gone = {7, folder.path("gone"), VORN_FS_EXT, true};
+  const std::string problem = "volume \"" + gone.path +
+                              "\" is left out, since it can't be measured (No such file or "
+                              "directory); see to its mount";
+  for (const auto time : {0s, 299s, 300s}) {
+    EXPECT_EQ(-1, free_after(gone, time));
+  }
+  // Whoever asks is told each time: a sample is stored before the report that must say so begins.
+  EXPECT_EQ(std::vector(3, "volume_unknown|" + gone.path + "|" + problem), told);
+  EXPECT_EQ(problem + "\n" + problem, support::syslog_text());
+  std::filesystem::create_directory(gone.path);
+  EXPECT_EQ(-1, free_after(gone, 599s));
+  EXPECT_LT(0, free_after(gone, 600s));
 }
 
 TEST(VolumeId, IsSafeShortAndUnique) {

@@ -148,6 +148,12 @@ TEST_F(ActionsTest, ReportRunsItsStepsInOrder) {
   }
 }
 
+TEST_F(ActionsTest, ReportFailsWhenThePlatformFindsNoReport) {
+  platform.success_result = 1;
+  EXPECT_EQ(run(report_action, {"p1"}), -1);
+  EXPECT_EQ(platform.calls.back(), "StatusUpdate p1 success") << "what is stored is stored";
+}
+
 // One failing call each: what is logged, at which position, and whether the run is a failure.
 TEST_F(ActionsTest, ReportLogsWhatFailed) {
   const struct {
@@ -172,10 +178,13 @@ TEST_F(ActionsTest, ReportLogsWhatFailed) {
     mkdir(folder_.path("date").c_str(), 0700);
     EXPECT_EQ(run(report_action, {"p1"}), c.result);
     expect_nested(c.position, c.message);
-    const bool cleaned =
-        std::count(platform.calls.begin(), platform.calls.end(), "ReportCleanTmp p1 loaded") != 0 ||
-        std::count(platform.calls.begin(), platform.calls.end(), "ReportCleanTmp p1 (null)") != 0;
-    EXPECT_EQ(cleaned, c.result < 0);
+    const Calls& calls = platform.calls;
+    if (c.result < 0) {
+      EXPECT_TRUE(calls.end()[-2].starts_with("ReportCleanTmp p1 ")) << calls.end()[-2];
+      EXPECT_EQ(calls.back(), "StatusUpdate p1 fail");
+    } else {
+      EXPECT_EQ(calls.back(), "StatusUpdate p1 success");
+    }
     EXPECT_FALSE(support::exists(folder_.path("stat.db.p1")));
     std::filesystem::remove_all(folder_.path("it's final"));
   }
@@ -201,7 +210,8 @@ TEST_F(ActionsTest, ReportNeedsWhatTheProfileMustSay) {
     platform.config["p1"].erase(c.key);
     EXPECT_EQ(run(report_action, {"p1"}), -1);
     expect_nested(c.position, c.message);
-    EXPECT_EQ(platform.calls.back(), "ReportCleanTmp p1 loaded");
+    EXPECT_EQ(platform.calls.end()[-2], "ReportCleanTmp p1 loaded");
+    EXPECT_EQ(platform.calls.back(), "StatusUpdate p1 fail");
   }
   platform.config["p1"] = {{"report_list", "nothing_known"}};
   platform.real_paths = paths;
@@ -215,7 +225,7 @@ TEST_F(ActionsTest, ReportRefusesMissingUnknownAndRunningProfiles) {
   expect_simple("src/vornreport:340", "bad parameter\n");
   EXPECT_EQ(run(report_action, {"nobody"}), -1);
   expect_nested("src/vornreport:309", "Get section failed, section=nobody");
-  EXPECT_EQ(platform.calls.back(), "ReportCleanTmp nobody (null)");
+  EXPECT_EQ(platform.calls.back(), "StatusUpdate nobody fail");
   platform.running = {"p1"};
   platform.calls.clear();
   EXPECT_EQ(run(report_action, {"p1"}), 0);

@@ -5,6 +5,8 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <array>
+#include <cstddef>
 #include <cstdlib>
 #include <memory>
 #include <optional>
@@ -27,6 +29,21 @@ using IterPtr = std::unique_ptr<libmnt_iter, IterFree>;
 
 std::string text_or_empty(const char* text) {
   return text == nullptr ? "" : text;
+}
+
+// The names that file systems have for it; where it counts without limits, users' usage is there
+// all the same. Quotas of groups and projects aren't users'.
+bool has_user_quotas(const char* options) {
+  const auto is_set = [options](const char* name, bool with_value = false) {
+    char* value = nullptr;
+    std::size_t size = 0;
+    return mnt_optstr_get_option(options, name, &value, &size) == 0 && (!with_value || size > 0);
+  };
+  constexpr std::array kNames{"usrquota", "quota", "uquota", "uqnoenforce", "qnoenforce"};
+  return options != nullptr && !is_set("noquota") &&
+         (std::any_of(kNames.begin(), kNames.end(),
+                      [&](const char* name) { return is_set(name); }) ||
+          is_set("usrjquota", true));
 }
 
 struct Place {
@@ -69,6 +86,7 @@ std::vector<Mount> read_mounts(const char* table) {
     mount.target = text_or_empty(mnt_fs_get_target(fs));
     mount.type = text_or_empty(mnt_fs_get_fstype(fs));
     mount.kind = kind_of_name(mount.type);
+    mount.has_user_quotas = has_user_quotas(mnt_fs_get_options(fs));
     if (!mount.target.empty()) {
       mounts.push_back(std::move(mount));
     }

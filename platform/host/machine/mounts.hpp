@@ -18,9 +18,10 @@ struct Mount {
   std::string target;  // where
   std::string type;
   VornFsKind kind = VORN_FS_OTHER;
-  bool visible = true;       // no later mount covers it
-  bool is_folder = true;     // containers mount single files too
-  bool holds_share = false;  // set by those who ask for volumes
+  bool has_user_quotas = false;  // by its options: usage of users is counted
+  bool visible = true;           // no later mount covers it
+  bool is_folder = true;         // containers mount single files too
+  bool holds_share = false;      // set by those who ask for volumes
 };
 
 inline constexpr const char* kOwnMountTable = "/proc/self/mountinfo";

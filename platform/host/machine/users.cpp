@@ -16,6 +16,7 @@
 
 #include "base/formats.hpp"
 #include "base/host_log.hpp"
+#include "base/incident.hpp"
 #include "base/text_containers.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/report.h"
@@ -66,13 +67,14 @@ constexpr bool means_unknown(int error) {
   return error == 0 || error == ENOENT || error == ESRCH || error == EBADF || error == EPERM;
 }
 
-void log_failing_service(int error) {
+void tell_failing_service(int error) {
   static bool logged = false;
   if (!std::exchange(logged, true)) {
-    log_line(
-        "the name service fails (%s), so accounts are missing from the reports; see to the "
-        "services that the passwd line of /etc/nsswitch.conf names",
-        std::strerror(error));
+    const std::string problem = "the name service fails (" + std::string(std::strerror(error)) +
+                                "), so accounts are missing from the reports; see to the services "
+                                "that the passwd line of /etc/nsswitch.conf names";
+    log_line("%s", problem.c_str());
+    tell_incident("users_unknown", std::strerror(error), problem);
   }
 }
 
@@ -94,7 +96,7 @@ Found ask_name_service(Ask ask) {
       buffer.resize(buffer.size() * 2);
     } else if (error != EINTR) {
       if (!means_unknown(error)) {
-        log_failing_service(error);
+        tell_failing_service(error);
       }
       return std::nullopt;
     }

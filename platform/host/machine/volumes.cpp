@@ -8,10 +8,8 @@
 #include <limits>
 #include <map>
 #include <memory>
-#include <optional>
 #include <set>
 #include <tuple>
-#include <utility>
 
 #include "base/host_log.hpp"
 #include "base/text_containers.hpp"
@@ -133,32 +131,7 @@ std::string cut_volume_id(const std::vector<Volume>& volumes, std::string_view c
   return id;
 }
 
-Space space_of(const struct statvfs& measured) {
-  const std::uint64_t block = measured.f_frsize != 0 ? measured.f_frsize : measured.f_bsize;
-  const std::uint64_t used = measured.f_blocks - std::min(measured.f_bfree, measured.f_blocks);
-  // Some file systems count below zero when users have taken what is reserved for root.
-  const bool negative = (measured.f_bavail >> 63U) != 0;
-  const std::uint64_t available = negative ? 0 : measured.f_bavail;
-  return {(used + available) * block, available * block};
-}
-
 namespace {
-
-// What a caller holds as a VORNMountVolInfo, with the text of its path.
-struct Record : VORNMountVolInfo {
-  Record(std::string mount_path, Space space) : text(std::move(mount_path)) {
-    path = text.data();
-    free_size = space.free;
-    total_size = space.total;
-    next = nullptr;
-  }
-  std::string text;
-};
-
-struct FreeRecords {
-  void operator()(VORNMountVolInfo* volumes) const { VORNMountVolInfoFree(volumes); }
-};
-using Records = std::unique_ptr<VORNMountVolInfo, FreeRecords>;
 
 // Once for the run: a report asks for every row.
 const std::string& known_cut_volume_id(const std::string& cut) {
@@ -169,47 +142,6 @@ const std::string& known_cut_volume_id(const std::string& cut) {
     entry = known.emplace(cut, cut_volume_id(server.volumes, cut)).first;
   }
   return entry->second;
-}
-
-// Each device is measured once a run. A run stores a sample and then compares with it: measured
-// anew, what was written in between, over a second, would pass for the speed at which it fills up.
-std::optional<Space> measure(const Volume& volume) {
-  static std::map<dev_t, Space> known;
-  if (const auto before = known.find(volume.device); before != known.end()) {
-    return before->second;
-  }
-  const ErrnoKeeper keeper;
-  struct statvfs measured {};
-  int result = -1;
-  do {
-    result = statvfs(volume.path.c_str(), &measured);
-  } while (result != 0 && errno == EINTR);
-  if (result != 0) {
-    log_line("volume \"%s\" is left out, since it can't be measured (%s); see to its mount",
-             volume.path.c_str(), std::strerror(errno));
-    return std::nullopt;
-  }
-  return known.emplace(volume.device, space_of(measured)).first->second;
-}
-
-Records measure_volumes() {
-  Records first;
-  VORNMountVolInfo* last = nullptr;
-  for (const Volume& volume : read_volumes().volumes) {
-    const std::optional<Space> space = volume.holds_data ? measure(volume) : std::nullopt;
-    if (!space) {
-      continue;
-    }
-    Records added(new Record(volume.path, *space));
-    VORNMountVolInfo* record = added.get();
-    if (last == nullptr) {
-      first = std::move(added);
-    } else {
-      last->next = added.release();
-    }
-    last = record;
-  }
-  return first;
 }
 
 // One line for a share that adds nothing to any report.
@@ -246,26 +178,6 @@ void add_volume_paths(const ServerVolumes& server, const std::vector<Share>& sha
 
 }  // namespace host
 
-VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int /*selector*/) try {
-  if (filter != nullptr) {
-    errno = EINVAL;
-    return nullptr;
-  }
-  const host::ErrnoKeeper keeper;
-  return host::measure_volumes().release();
-} catch (...) {
-  errno = ENOMEM;
-  return nullptr;
-}
-
-void VORNMountVolInfoFree(VORNMountVolInfo* volumes) {
-  while (volumes != nullptr) {
-    VORNMountVolInfo* next = volumes->next;
-    delete static_cast<host::Record*>(volumes);
-    volumes = next;
-  }
-}
-
 int VornQazGetVolumePathHash(VLIBCSzHash** hash) try {
   if (hash == nullptr) {
     errno = EINVAL;
@@ -285,6 +197,47 @@ int VornQazGetVolumePathHash(VLIBCSzHash** hash) try {
 } catch (...) {
   errno = ENOMEM;
   return -1;
+}
+
+int VORNVolumeOfPath(const char* path, char* mount_path, size_t size) try {
+  if (path == nullptr || mount_path == nullptr || size == 0) {
+    errno = EINVAL;
+    return -1;
+  }
+  *mount_path = '\0';
+  const int saved_errno = errno;
+  const host::ServerVolumes server = host::read_volumes();
+  const host::Mount* mount = host::mount_holding(server.mounts, path);
+  if (mount == nullptr) {
+    errno = ENOENT;
+    return -1;
+  }
+  const host::Volume* volume = server.holding(path);
+  const std::string& text = volume != nullptr && volume->holds_data ? volume->path : mount->target;
+  if (text.size() >= size) {
+    errno = ENAMETOOLONG;
+    return -1;
+  }
+  std::memcpy(mount_path, text.c_str(), text.size() + 1);
+  errno = saved_errno;
+  return static_cast<int>(text.size());
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
+
+int VORNVolumeHasQuotas(const char* mount_path) try {
+  const host::ErrnoKeeper keeper;
+  if (mount_path == nullptr) {
+    return 0;
+  }
+  const auto mounts = host::read_mounts(host::kOwnMountTable);
+  const bool found = std::any_of(mounts.begin(), mounts.end(), [=](const host::Mount& mount) {
+    return mount.visible && mount.has_user_quotas && mount.target == mount_path;
+  });
+  return found ? 1 : 0;
+} catch (...) {
+  return 0;
 }
 
 int VornQazVolumeGetId(const char* mount_path, char* id, size_t size) try {

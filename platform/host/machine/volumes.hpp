@@ -2,11 +2,8 @@
 #ifndef VORN_HOST_VOLUMES_HPP
 #define VORN_HOST_VOLUMES_HPP
 
-#include <sys/statvfs.h>
 #include <sys/types.h>
 
-#include <cstddef>
-#include <cstdint>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -57,14 +54,6 @@ std::string volume_id(std::string_view path);
 // The identifier for a path that may be cut: that of the volume whose path begins so; when several
 // do, one of its own that ends in "...", with one syslog line; of `cut` itself when none does.
 std::string cut_volume_id(const std::vector<Volume>& volumes, std::string_view cut);
-
-struct Space {
-  std::uint64_t total;  // bytes: used and free ones
-  std::uint64_t free;   // for users
-};
-
-// As df counts: what is reserved for root is neither used nor free, so it isn't in the total.
-Space space_of(const struct statvfs& measured);
 
 }  // namespace host
 

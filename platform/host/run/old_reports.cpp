@@ -11,10 +11,13 @@
 #include <cstdio>
 #include <cstring>
 #include <memory>
+#include <tuple>
 #include <utility>
 
 #include "base/host_log.hpp"
 #include "base/text_containers.hpp"
+#include "report_format/facts_file.hpp"
+#include "report_format/reports.hpp"
 #include "run/page.hpp"
 #include "run/run_paths.hpp"
 #include "vorn/base/file_io.hpp"
@@ -27,7 +30,8 @@ struct CloseFts {
   void operator()(FTS* walk) const { fts_close(walk); }
 };
 
-// The name's time, and its number within one second (1 for the first, which has none in its name).
+// The name's local time, and its number within one second (1 for the first, which has none in its
+// name).
 struct Stamp {
   std::time_t time;
   int number;
@@ -64,11 +68,12 @@ std::optional<Stamp> stamp_of(std::string_view name) {
   time.tm_min = part(14, 2);
   time.tm_sec = part(17, 2);
   time.tm_isdst = -1;
-  const std::tm written = time;
-  Stamp stamp{std::mktime(&time), 1};
-  if (time.tm_mon != written.tm_mon || time.tm_mday != written.tm_mday) {
+  std::tm day = time;  // in UTC, which leaves out no hour, as the zone that the name is of did not
+  timegm(&day);
+  if (time.tm_mon != day.tm_mon || time.tm_mday != day.tm_mday) {
     return std::nullopt;  // the 31st of June
   }
+  Stamp stamp{std::mktime(&time), 1};
   name.remove_prefix(kForm.size());
   if (!name.empty()) {
     stamp.number = name.front() == '-' ? whole_number(name.substr(1)).value_or(0) : 0;
@@ -81,10 +86,12 @@ std::string path_below(const Fd& folder, const std::string& name) {
   return "/proc/self/fd/" + std::to_string(folder.get()) + "/" + name;
 }
 
-bool is_whole_report(const Fd& folder, const std::string& name) {
-  const Fd report(
-      openat(folder.get(), name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-  return report && page_is_complete_at(report.get(), "report.html");
+Fd open_report(const Fd& folder, const std::string& name) {
+  return Fd(openat(folder.get(), name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+}
+
+bool is_whole_report(const Fd& report) {
+  return report && page_is_complete_at(report.get(), report_format::kPageFile);
 }
 
 unsigned long long size_on_disk(const Fd& folder, const std::string& name) {
@@ -102,8 +109,26 @@ unsigned long long size_on_disk(const Fd& folder, const std::string& name) {
   return size;
 }
 
+// What a report is ordered by, and it.
+struct Dated {
+  StoredReport report;
+  int number;
+  // No run of a right clock is a day ahead. It was before those that the right clock dated, so that
+  // it doesn't count as the newest for years.
+  bool is_ahead;
+
+  bool operator<(const Dated& other) const {
+    constexpr std::size_t kStampLength = 19;
+    return std::tuple(!is_ahead, report.made, report.name.substr(0, kStampLength), number) <
+           std::tuple(!other.is_ahead, other.report.made, other.report.name.substr(0, kStampLength),
+                      other.number);
+  }
+};
+
 std::vector<StoredReport> list_reports(const Fd& folder, ReportSize size) {
-  std::vector<std::pair<Stamp, StoredReport>> found;
+  constexpr std::time_t kDay = 86400;
+  const std::time_t latest = std::time(nullptr) + kDay;
+  std::vector<Dated> found;
   for (std::string& name : entries_of(folder)) {
     const std::optional<Stamp> stamp = stamp_of(name);
     struct stat status {};
@@ -111,26 +136,26 @@ std::vector<StoredReport> list_reports(const Fd& folder, ReportSize size) {
         !S_ISDIR(status.st_mode)) {
       continue;
     }
-    const bool is_whole = is_whole_report(folder, name);
-    const unsigned long long bytes = size == ReportSize::measured ? size_on_disk(folder, name) : 0;
-    found.emplace_back(*stamp, StoredReport{std::move(name), stamp->time, is_whole, bytes});
+    const Fd opened = open_report(folder, name);
+    const std::time_t made =
+        (opened ? report_format::read_started(opened.get()) : std::nullopt).value_or(stamp->time);
+    StoredReport report{std::move(name), made, is_whole_report(opened), 0};
+    if (size == ReportSize::measured) {
+      report.size = size_on_disk(folder, report.name);
+    }
+    found.push_back({std::move(report), stamp->number, made > latest});
   }
-  // By name: the hour that a clock repeats in autumn has its names in one order only.
-  std::sort(found.begin(), found.end(), [](const auto& a, const auto& b) {
-    constexpr std::size_t kStampLength = 19;
-    const int order = a.second.name.compare(0, kStampLength, b.second.name, 0, kStampLength);
-    return order != 0 ? order < 0 : a.first.number < b.first.number;
-  });
+  std::sort(found.begin(), found.end());
   std::vector<StoredReport> reports;
   reports.reserve(found.size());
-  for (auto& [stamp, report] : found) {
-    reports.push_back(std::move(report));
+  for (Dated& dated : found) {
+    reports.push_back(std::move(dated.report));
   }
   return reports;
 }
 
 bool remove_from(const Fd& folder, const std::string& path, const std::string& name) {
-  if (!stamp_of(name) || !is_whole_report(folder, name)) {
+  if (!stamp_of(name) || !is_whole_report(open_report(folder, name))) {
     log_line("%s/%s is no finished report, so it isn't removed; look into it", path.c_str(),
              name.c_str());
     errno = EINVAL;
@@ -191,7 +216,7 @@ void remove_old_reports(const std::string& folder, std::size_t keep, std::string
   std::erase_if(reports, [](const StoredReport& report) { return !report.is_whole; });
   std::size_t excess = reports.size() - std::min(keep, reports.size());
   for (const StoredReport& report : reports) {
-    // After the clock was set back the newest isn't the last one.
+    // After the clock was set back a little the newest isn't the last one.
     if (excess > 0 && report.name != newest) {
       --excess;
       remove_from(opened, folder, report.name);

@@ -16,7 +16,7 @@ namespace host {
 // A folder that is named as a run names its finished report.
 struct StoredReport {
   std::string name;             // YYYY-MM-DD_HH-MM-SS, with -2, -3... for later ones of one second
-  std::time_t made = 0;         // the name's local time
+  std::time_t made = 0;         // when its run began, by its facts; else the name's local time
   bool is_whole = false;        // its report.html is a complete page; nothing else is ever removed
   unsigned long long size = 0;  // bytes on disk, with everything in it; only if asked for
 };
@@ -24,9 +24,9 @@ struct StoredReport {
 enum class ReportSize { left_out, measured };
 
 // The reports in `folder`, which belongs to one profile (report_dir and the profile's name), oldest
-// first. What isn't named as a report, and what is a link, isn't listed. Nothing, after one log
-// line, when `folder` is a link, not this user's, or can't be read; an absent one is an empty
-// answer.
+// first; those dated more than a day ahead, by a clock that was wrong, come before all others. What
+// isn't named as a report, and what is a link, isn't listed. Nothing, after one log line, when
+// `folder` is a link, not this user's, or can't be read; an absent one is an empty answer.
 std::optional<std::vector<StoredReport>> stored_reports(const std::string& folder, ReportSize size);
 
 // Removes the whole report `name` of `folder` and follows no link on the way. It loses its name

@@ -1,4 +1,4 @@
-// The course of a run: taking its profile, its status word, and clearing up after it.
+// The course of a run: taking its profile, clearing up after it, and its end.
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -14,6 +14,8 @@
 #include "base/host_log.hpp"
 #include "base/text_containers.hpp"
 #include "config/profile.hpp"
+#include "report_format/facts_file.hpp"
+#include "report_format/run_state.hpp"
 #include "run/old_reports.hpp"
 #include "run/page.hpp"
 #include "run/run_lock.hpp"
@@ -26,31 +28,28 @@
 namespace host {
 namespace {
 
-int store_status(const std::string& profile, std::string_view word) {
+using report_format::RunStatus;
+
+bool store_status(const std::string& profile, const RunStatus& status) {
   const int saved_errno = errno;
   const std::string path = VORN_PATH_STATUS "/" + profile;
   AtomicFile file(path);
-  // Monitoring that isn't root reads the word, whatever this process's umask.
-  if (file.fd() >= 0 && fchmod(file.fd(), 0644) == 0 &&
-      write_all(file.fd(), std::string(word) + "\n") && file.commit()) {
+  // Monitoring that isn't root reads it, whatever this process's umask.
+  if (file.fd() >= 0 && fchmod(file.fd(), 0644) == 0 && write_all(file.fd(), status_text(status)) &&
+      file.commit()) {
     errno = saved_errno;
-    return 0;
+    return true;
   }
-  log_line(R"(status "%.*s" of profile "%s" can't be stored in %s (%s))",
-           static_cast<int>(word.size()), word.data(), profile.c_str(), path.c_str(),
-           std::strerror(errno));
-  return -1;
+  log_line(R"(status "%s" of profile "%s" can't be stored in %s (%s))", status.word.c_str(),
+           profile.c_str(), path.c_str(), std::strerror(errno));
+  return false;
 }
 
-// The page is the product of a run. When it isn't whole, nothing may look like a report: what
-// stands at the finished name takes its unfinished name back first, so that a removal which is cut
-// short leaves something that the next run recognises.
+// When a report isn't whole, nothing may look like one: what stands at the finished name takes its
+// unfinished name back first, so that a removal which is cut short leaves something that the next
+// run recognises.
 void take_back(const ReportRun& run) {
   const ErrnoKeeper keeper;
-  log_line(
-      "profile \"%s\": report page %s is missing or cut short, so the run counts as failed; "
-      "check the messages above and the free space",
-      run.profile.c_str(), run.page.c_str());
   rename(run.finished.c_str(), run.unfinished.c_str());
   if (!remove_tree(run.unfinished)) {
     log_line("unfinished report %s can't be removed (%s); remove it by hand",
@@ -58,8 +57,35 @@ void take_back(const ReportRun& run) {
   }
 }
 
+std::string name_of(const ReportRun& run) {
+  return run.finished.substr(run.finished.rfind('/') + 1);
+}
+
+// What is to be stored of a report run that ends as `word` says. The page is its product: without a
+// whole one there is no success, and no report.
+RunStatus outcome_of(const ReportRun& run, std::string_view word) {
+  const bool is_whole = page_is_complete(run.page.c_str());
+  if (word == report_format::kSuccess && is_whole) {
+    const auto facts = report_format::read_facts(run.finished);
+    const std::size_t incidents = facts ? facts->incidents.size() : 0;
+    return {std::string(word), name_of(run), static_cast<int>(incidents)};
+  }
+  if (word == report_format::kSuccess) {
+    log_line(
+        "profile \"%s\": report page %s is missing or cut short, so the run counts as failed; "
+        "check the messages above and the free space",
+        run.profile.c_str(), run.page.c_str());
+  }
+  if (!is_whole) {
+    take_back(run);
+  }
+  return {report_format::kFail, "", 0};
+}
+
+// As VornQazStatusUpdate.
 int update_status(const std::string& profile, std::string_view word) {
-  if (word != "collect_data" && word != "success" && word != "fail") {
+  using report_format::kCollecting;
+  if (word != kCollecting && word != report_format::kSuccess && word != report_format::kFail) {
     log_line(R"(profile "%s": "%.80s" is no status word)", profile.c_str(),
              std::string(word).c_str());
     errno = EINVAL;
@@ -69,22 +95,19 @@ int update_status(const std::string& profile, std::string_view word) {
     errno = ENOLCK;  // taking it has failed, and said so
     return -1;
   }
-  const bool reporting = report_run() && report_run()->profile == profile;
-  if (reporting && word == "success" && !page_is_complete(report_run()->page.c_str())) {
-    take_back(*report_run());
-    word = "fail";
-  }
   std::optional<ReportRun> ended;
-  if (reporting && word != "collect_data") {
+  if (word != kCollecting && report_run() && report_run()->profile == profile) {
     ended.swap(report_run());
   }
-  const int result = store_status(profile, word);
-  if (ended && word == "success" && result == 0 && ended->keep > 0) {
-    const std::size_t slash = ended->finished.rfind('/');
-    remove_old_reports(ended->finished.substr(0, slash), ended->keep,
-                       std::string_view(ended->finished).substr(slash + 1));
+  const RunStatus status = ended ? outcome_of(*ended, word) : RunStatus{std::string(word), "", 0};
+  if (!store_status(profile, status)) {
+    return -1;
   }
-  return result;
+  if (!status.report.empty() && ended->keep > 0) {
+    remove_old_reports(ended->finished.substr(0, ended->finished.rfind('/')), ended->keep,
+                       status.report);
+  }
+  return status.word == word ? 0 : 1;
 }
 
 // The order keeps this off a run that starts at the same time: what is there is noted first, then
@@ -112,10 +135,6 @@ int clean(const std::string& profile, const VLIBCSzHash* hash) {
     }
   }
   remove_statistics(profile);
-  if (holds_profile(profile)) {
-    report_run().reset();
-    result = store_status(profile, "fail") == 0 ? result : -1;
-  }
   return result;
 }
 

@@ -94,7 +94,8 @@ int VornQazGetTimeZone(char* out, size_t size);
 
 // From now on the platform calls `sink` for what it notices that a reader of the report must know,
 // besides its syslog line: a kind of report_format's table of incidents, what it concerns, and a
-// sentence that says what is wrong and what to do. Null: nobody is told.
+// sentence that says what is wrong and what to do. The same may come more than once, and names in
+// the texts may be any bytes. Null: nobody is told.
 typedef void (*VornIncidentSink)(const char* kind, const char* what, const char* text);
 void VornQazSetIncidentSink(VornIncidentSink sink);
 
