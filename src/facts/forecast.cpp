@@ -277,7 +277,7 @@ Forecast forecast(std::span<const Sample> daily, std::uint64_t size, std::uint64
     told.window = span_of(daily) / kDay;
   } else {
     const std::span<const Sample> samples = recent(daily);
-    told.window = span_of(samples) / kDay;
+    told.window = (span_of(samples) + kDay / 2) / kDay;
     judge(trend_of(samples, jumps), size, free, told);
   }
   return told;
