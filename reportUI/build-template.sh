@@ -139,11 +139,16 @@ section() { # REPORT
   echo '</section>'
 }
 
-# All dictionaries, so that a reader can switch. No text of theirs can end the element.
+# All dictionaries, so that a reader can switch; a file that isn't named by a language's code, such
+# as a copy, is none. No text of theirs can end the element.
 dictionaries() {
   for file in "$here"/lang/*.json; do
     code=${file##*/}
-    printf '<script type="application/json" data-language="%s">' "${code%.json}"
+    code=${code%.json}
+    case $code in
+      '' | -* | *[!A-Za-z0-9-]* | ????????*) continue ;;
+    esac
+    printf '<script type="application/json" data-language="%s">' "$code"
     sed 's/</\\u003c/g' "$file"
     printf '</script>\n'
   done

@@ -10,8 +10,7 @@ from expected import Tree
 from harness import BUILD, ROOT, ProductTest, make_files, needs_root
 from server import Server
 
-REPORTS = ('volume_usage,share_list,file_group,file_owner,quota_usage,duplicate_file,large_file,'
-           'least_modify,most_modify')
+FORMAT = BUILD / 'report_format.json'
 SHARE = 'big & small'
 NAMES = {  # name to how it must be shown; chips in brackets
     'plain \u65e5\u672c.txt': None,
@@ -40,7 +39,8 @@ class Page(ProductTest):
 
     def make(self, name, **keys):
         """Has the machine's report made, as the page `name`."""
-        self.m.profile(name, report_list=REPORTS, volume_history='true', **keys)
+        reports = ','.join(each['name'] for each in json.loads(FORMAT.read_text())['reports'])
+        self.m.profile(name, report_list=reports, volume_history='true', **keys)
         run = self.m.run('--report', name)
         self.assertEqual((run.status, self.m.status(name)), (0, 'success'), run.log_lines)
         shutil.copytree(self.m.report_folders(name)[-1], self.pages / name)
@@ -76,6 +76,6 @@ class Page(ProductTest):
         tests = sorted((ROOT / 'tests/page').glob('*.test.mjs'))
         done = subprocess.run(
             ['node', '--test', *tests], stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True,
-            env=os.environ | {'VORN_PAGES': str(self.pages),
+            env=os.environ | {'VORN_PAGES': str(self.pages), 'VORN_FORMAT': str(FORMAT),
                               'VORN_NODE_MODULES': str(BUILD / 'reportUI/page/node_modules')})
         self.assertEqual(done.returncode, 0, done.stdout)

@@ -1,5 +1,6 @@
 // The pages under test in a real browser. VORN_PAGES is a folder with a folder for each report that
-// test_page.py has had made; VORN_NODE_MODULES holds the browser's driver.
+// test_page.py has had made; VORN_NODE_MODULES holds the browser's driver, VORN_FORMAT is the build's
+// report_format.json.
 import assert from 'node:assert/strict';
 import {execFileSync} from 'node:child_process';
 import fs from 'node:fs';
@@ -15,10 +16,11 @@ const here = path.dirname(fileURLToPath(import.meta.url));
 
 export const SOURCE = path.join(here, '../../reportUI');
 export const LANGUAGES = ['de', 'en', 'es', 'fr', 'ja', 'zh'];
-export const ALL = ['volume_usage', 'share_list', 'file_group', 'file_owner', 'quota_usage',
-                    'duplicate_file', 'large_file', 'least_modify', 'most_modify'];
+export const FORMAT = JSON.parse(fs.readFileSync(process.env.VORN_FORMAT, 'utf8'));
+export const ALL = FORMAT.reports.map(({name}) => name);
 export const axe = fs.readFileSync(require.resolve('axe-core/axe.min.js'), 'utf8');
 export const fileOf = (name, file = 'report.html') => path.join(process.env.VORN_PAGES, name, file);
+export const dictionary = code => JSON.parse(fs.readFileSync(path.join(SOURCE, `template/lang/${code}.json`), 'utf8'));
 export const read = (name, file) => fs.readFileSync(fileOf(name, file), 'utf8');
 
 const folder = fs.mkdtempSync('/var/tmp/vorn-page-');

@@ -2,10 +2,20 @@
 import assert from 'node:assert/strict';
 import test from 'node:test';
 
-import {axe, choose, fileOf, LANGUAGES, withPage} from './browser.mjs';
+import {axe, choose, LANGUAGES, read, withPage} from './browser.mjs';
+import {DAY, facts, growing, incident, NOW, pageOf, volume, withFacts} from './facts.mjs';
 
 const NARROW = {viewport: {width: 390, height: 844}}, ZOOMED = {viewport: {width: 640, height: 400}, deviceScaleFactor: 2};
 const open = (page, value) => page.$$eval('details', (all, to) => all.forEach(each => { each.open = to; }), value);
+
+// All that facts can bring: incidents, long names, each level, a jump; and none of them.
+const rich = withFacts(read('hostile'), facts({
+  complete: false, incidents: ['error', 'warning'].map(level => incident(level, 'report_failed', 'large_file', 'x'.repeat(300))),
+  volumes: ['ok', 'warning', 'critical'].map((level, i) => volume(`/srv/${'long name '.repeat(8 * i)}`, 9, {
+    size: 10, level, forecast: {...growing(24, 19, 33), jump: {date: NOW - DAY, bytes: 5}}})),
+  attention: [{level: 'critical', code: 'volume_full', values: {volume: `/srv/${'x'.repeat(200)}`}, section: 'volume_usage'}]}));
+const bare = withFacts(read('hostile'), null);
+const PAGES = {big: pageOf('big'), rich};
 
 async function assertAccessible(page) {
   await page.evaluate(axe);
@@ -14,9 +24,10 @@ async function assertAccessible(page) {
 }
 
 test('axe finds nothing', async t => {
-  for (const name of ['big', 'hostile']) {
+  await withPage(bare, assertAccessible);
+  for (const [name, text] of Object.entries(PAGES)) {
     for (const [look, options] of Object.entries({light: {}, dark: {colorScheme: 'dark'}, narrow: NARROW})) {
-      await t.test(`${name}, ${look}`, () => withPage(fileOf(name), async page => {
+      await t.test(`${name}, ${look}`, () => withPage(text, async page => {
         await assertAccessible(page);
         await open(page, true);
         await page.waitForTimeout(100);  // a table is filled when it is opened
@@ -27,9 +38,9 @@ test('axe finds nothing', async t => {
 });
 
 test('narrow and zoomed, nothing is cut off', async t => {
-  for (const name of ['big', 'hostile']) {
+  for (const [name, text] of Object.entries(PAGES)) {
     for (const [look, options] of Object.entries({narrow: NARROW, zoomed: ZOOMED})) {
-      await t.test(`${name}, ${look}`, () => withPage(fileOf(name), async page => {
+      await t.test(`${name}, ${look}`, () => withPage(text, async page => {
         for (const language of LANGUAGES) {
           await choose(page, language);
           await open(page, true);
@@ -49,11 +60,11 @@ test('narrow and zoomed, nothing is cut off', async t => {
 
 test('forced colours leave the drawings visible', async () => {
   for (const colorScheme of ['light', 'dark']) {
-    await withPage(fileOf('big'), async page => {
+    await withPage(PAGES.big, async page => {
       await page.emulateMedia({forcedColors: 'active'});
       for (const [part, property] of [
         ['.gauge .value', 'fill'], ['.gauge .track', 'fill'], ['.leaf rect', 'fill'], ['.stack rect', 'fill'],
-        ['.history .line path', 'stroke'], ['.barred .bar', 'backgroundColor'], ['.legend li', '::before']]) {
+        ['.history .line .forecast', 'stroke'], ['.history .line .range', 'fill'], ['.barred .bar', 'backgroundColor'], ['.legend li', '::before']]) {
         const [own, ground] = await page.locator(part).first().evaluate((element, name) => [
           name === '::before' ? getComputedStyle(element, name).backgroundColor : getComputedStyle(element)[name],
           getComputedStyle(document.body).backgroundColor], property);
@@ -64,7 +75,7 @@ test('forced colours leave the drawings visible', async () => {
 });
 
 test('a print has all rows, unfolded, on white, and nothing to press', async () => {
-  await withPage(fileOf('big'), async page => {
+  await withPage(PAGES.big, async page => {
     await page.emulateMedia({media: 'print'});
     await page.evaluate(() => window.dispatchEvent(new Event('beforeprint')));
     assert.equal(await page.locator('button:not(thead button):visible, select:visible, input:visible, nav:visible, a.csv:visible, summary:visible').count(), 0);

@@ -2,7 +2,8 @@
 import assert from 'node:assert/strict';
 import test from 'node:test';
 
-import {fileOf, read, section, textOf, withBlock, withPage} from './browser.mjs';
+import {FORMAT, read, section, textOf, withBlock, withPage} from './browser.mjs';
+import {pageOf} from './facts.mjs';
 
 const shares = withBlock(read('hostile'), 'vornShareListData', `[\n${[
   ['b', '/x', 1024], ['a10', '/', 5], ['Ä', '/', 'nan'], ['a9', '/', 1048576], ['c', '/x', 0], ['d', '/', 2000]].map(
@@ -23,7 +24,7 @@ test('sorting, by number and by text, both ways', () => withPage(shares, async p
   }
 }));
 
-test('filtering, and all rows', () => withPage(fileOf('big'), async page => {
+test('filtering, and all rows', () => withPage(pageOf('big'), async page => {
   const table = page.locator('#large_file .table');
   const visible = () => table.locator('tbody tr:visible').count();
   assert.equal(await visible(), 10);
@@ -41,9 +42,8 @@ test('filtering, and all rows', () => withPage(fileOf('big'), async page => {
   await table.locator('input').fill('no such');
   assert.deepEqual([await visible(), await count.innerText()], [0, '0 of 200']);
   assert.deepEqual((await section(page, 'large_file')).notes, ['These are the first 200 rows. The CSV file holds more.']);
-  assert.deepEqual(await page.$$eval('a.csv', all => all.map(each => each.getAttribute('href')).sort()), [
-    'duplicate_file', 'file_owner', 'large_file', 'least_modify', 'most_modify', 'share_list', 'volume_usage'].map(
-    name => `csv/${name}.csv`));
+  assert.deepEqual(await page.$$eval('a.csv', all => all.map(each => each.getAttribute('href')).sort()), FORMAT.reports
+    .filter(report => report.has_csv_rows).map(({name}) => `csv/${name}.csv`).sort());
 }));
 
 test('sizes tell their bytes to the keyboard', () => withPage(shares, async page => {
@@ -57,7 +57,7 @@ test('sizes tell their bytes to the keyboard', () => withPage(shares, async page
   assert.equal(await page.locator('#share_list .bytes[tabindex="0"]').count(), 1);
 }));
 
-test('the treemap is one stop, in which arrows move', () => withPage(fileOf('big'), async page => {
+test('the treemap is one stop, in which arrows move', () => withPage(pageOf('big'), async page => {
   assert.equal(await page.locator('.treemap [tabindex="0"]').count(), 1);
   await page.locator('.treemap [tabindex="0"]').focus();
   const seen = new Set();
@@ -72,7 +72,7 @@ test('the treemap is one stop, in which arrows move', () => withPage(fileOf('big
   assert.equal(await page.evaluate(() => document.activeElement.closest('.treemap')), null);
 }));
 
-test('every drawing has its data as a table', () => withPage(fileOf('big'), async page => {
+test('every drawing has its data as a table', () => withPage(pageOf('big'), async page => {
   for (const [name, drawing] of [['volume_usage', '.history'], ['share_list', '.treemap'], ['file_group', '.stack']]) {
     assert.ok(await page.locator(`#${name} ${drawing}`).count() > 0, name);
     await page.$$eval(`#${name} details`, all => all.forEach(each => { each.open = true; }));

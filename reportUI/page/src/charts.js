@@ -85,7 +85,7 @@ export function shareMap(rows) {
   const drawing = svg('svg', {class: 'treemap', viewBox: `0 0 ${WIDTH} ${HEIGHT}`, role: 'group',
                               'aria-label': format.nameOf('reports', 'share_list')});
   root.children.forEach(volume => {
-    const plain = shownPlain(volume.data.name);
+    const plain = shownPlain(format.volumeName(volume.data.name));
     const text = `${plain}  ${format.size(volume.value)}`;
     drawing.append(svg('text', {class: 'volume', x: volume.x0 + 2, y: volume.y0 + 15},
                        fitWhole(text, volume.x1 - volume.x0) || fit(plain, volume.x1 - volume.x0)));

@@ -103,3 +103,20 @@ export function readVariable(pieces, name) {
   }
   return undefined;
 }
+
+// The value of `var NAME = VALUE;` where that is JSON in one line; undefined when it is missing, cut
+// or broken.
+export function readJson(pieces, name) {
+  for (const piece of pieces) {
+    const line = new RegExp(`(?:^|\\n)var ${name} = (.*)`).exec(piece)?.[1].trimEnd();
+    if (line === undefined) {
+      continue;
+    }
+    try {
+      return line.endsWith(';') ? JSON.parse(line.slice(0, -1)) : undefined;
+    } catch {
+      return undefined;
+    }
+  }
+  return undefined;
+}

@@ -2,7 +2,6 @@
 
 export const UNKNOWN = '–';
 const UNITS = ['B', 'KiB', 'MiB', 'GiB', 'TiB', 'PiB', 'EiB'];
-const MOST_DAYS = 730;  // beyond that, years
 
 const dictionaries = new Map();
 const formatters = new Map();  // making one takes longer than using it a hundred times
@@ -48,12 +47,20 @@ export function chooseZone(name) {
 export const currentZone = () => zone;
 
 function find(group, key) {
-  return dictionaries.get(language)?.[group]?.[key] ?? dictionaries.get('en')?.[group]?.[key];
+  const texts = [language, 'en'].map(code => dictionaries.get(code)?.[group]?.[key]);
+  return texts.find(text => typeof text === 'string');  // every object has a "constructor"
+}
+export const hasText = (group, key) => find(group, key) !== undefined;
+
+// The text `key` of a group with {placeholders} filled in.
+export function say(key, values = {}, group = 'page') {
+  return (find(group, key) ?? key).replace(/\{(\w+)\}/g, (all, name) => values[name] ?? all);
 }
 
-// The text `key` of the page with {placeholders} filled in.
-export function say(key, values = {}) {
-  return (find('page', key) ?? key).replace(/\{(\w+)\}/g, (all, name) => values[name] ?? all);
+// Like say(), but as text and nodes, for values that are elements.
+export function sayNodes(key, values, group = 'page') {
+  return (find(group, key) ?? key).split(/\{(\w+)\}/).map(
+    (piece, index) => index % 2 ? values[piece] ?? piece : piece);
 }
 export const nameOf = (group, key) => find(group, key) ?? key.replaceAll('_', ' ');
 
@@ -66,16 +73,33 @@ export function seriesOf(name) {
   return series.get(name);
 }
 
-// Like say(), but as text and nodes, for values that are elements.
-export function sayNodes(key, values) {
-  return (find('page', key) ?? key).split(/\{(\w+)\}/).map(
-    (piece, index) => index % 2 ? values[piece] ?? piece : piece);
+// Volumes are called by the path at which they are mounted; the blocks call some by a shorter name.
+let paths = new Map();
+export function callVolumes(known) {
+  paths = new Map(known.map(({id, path}) => [id, path]));
 }
+export const volumeName = id => paths.get(id) || id;
 
 export const isNumber = text => /^[0-9]+$/.test(text);
 
-export function number(value, options) {
-  return Number.isFinite(Number(value)) ? Number(value).toLocaleString(language, options) : UNKNOWN;
+// A count: 12,345.
+export function number(value) {
+  return Number.isFinite(Number(value)) ? Number(value).toLocaleString(language) : UNKNOWN;
+}
+
+// `value` rounded as the mail and the terminal round it: of its exact value, and a tie to the even
+// digit.
+function rounded(value, digits) {
+  const up = Number(value.toFixed(digits));  // where a tie goes up
+  const isTie = value * 2 ** (digits + 1) % 2 === 1;
+  const isOdd = Math.round(up * 10 ** digits) % 2 === 1;
+  return isTie && isOdd ? Number((up - 10 ** -digits).toFixed(digits)) : up;
+}
+
+// A figure as mail and terminal write it, too: at most `digits` decimals, no groups.
+export function figure(value, digits = 0) {
+  return Number.isFinite(value) ? rounded(value, digits).toLocaleString(
+    language, {useGrouping: false, maximumFractionDigits: digits}) : UNKNOWN;
 }
 
 export function size(value) {
@@ -88,23 +112,16 @@ export function size(value) {
     count /= 1024;
     ++unit;
   }
-  return `${number(count, {maximumFractionDigits: count < 10 ? 2 : count < 100 ? 1 : 0})}\u00a0${
-    UNITS[unit]}`;
+  return `${figure(count, count < 10 ? 2 : count < 100 ? 1 : 0)}\u00a0${UNITS[unit]}`;
 }
 
 export const exactSize = value => say('bytes', {n: BigInt(value).toLocaleString(language)});
 
 // `value` is a number of hundredths. What is below 100 is never rounded to it: it isn't full yet.
-export function percent(value, maximumFractionDigits = 1) {
-  const most = value < 100 ? 100 - 10 ** -maximumFractionDigits : Infinity;
+export function percent(value) {
   return Number.isFinite(value) && value >= 0 ?
-    (Math.min(value, most) / 100).toLocaleString(language, {style: 'percent', maximumFractionDigits}) : UNKNOWN;
-}
-
-export function inDays(days) {
-  const relative = new Intl.RelativeTimeFormat(language, {numeric: 'always'});
-  return days < MOST_DAYS ? relative.format(days, 'day') :
-    relative.format(Math.round(days / 365.25), 'year');
+    (rounded(value < 100 ? Math.min(value, 99.9) : value, 1) / 100).toLocaleString(
+      language, {style: 'percent', maximumFractionDigits: 1, useGrouping: false}) : UNKNOWN;
 }
 
 // `seconds` since the epoch; a time of 0 or before stands for none.
@@ -112,6 +129,8 @@ function toDate(seconds) {
   const date = new Date(Number(seconds) * 1000);
   return Number(seconds) > 0 && !Number.isNaN(date.getTime()) ? date : null;
 }
+
+export const isoTime = seconds => toDate(seconds)?.toISOString();
 
 export function time(seconds) {
   const date = toDate(seconds);

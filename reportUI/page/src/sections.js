@@ -1,21 +1,25 @@
-// The reports of the page, in its order. To add one: name its variable and columns here, and its
-// heading and new column names in every dictionary.
+// The reports of the page, in its order. To add one: name it here, with its heading and new column
+// names in every dictionary. Its variable, columns and limit are the program's.
 //
-//   width     values in a row of its block
-//   limit     rows (`limitOf`: numbers in that column) that the page gets at most, and the note
 //   always    without a block the report has failed: it has no way to have no rows
+//   missing   what is said without a block, in place of that
+//   cut       what is said when the page lacks rows of it
 //   mode      a variable whose value chooses the heading
-//   show      the section's content from what was read, a list of elements
+//   show      the section's content, a list of elements, from what was read: {tables, heading, csv}
+//             (`csv`: address of the file with its rows) and the facts
+import {reports as FORMATS} from 'report_format';
+
 import {shareMap, typeBars} from './charts.js';
 import {h, shownPlain} from './dom.js';
 import * as format from './format.js';
+import {history} from './history.js';
+import {outlookOrder, outlookText} from './outlook.js';
 import {table} from './table.js';
-import {history} from './volumes.js';
+import {levelElement} from './volumes.js';
 
 const FILES = [['file', 'path'], ['size', 'size'], ['changed', 'time'], ['share', 'text']];
 
 const rowsOf = ({tables}) => [...tables.values()].flat();
-const csvOf = name => `csv/${name}.csv`;
 const pick = (rows, ...order) => rows.map(row => order.map(index => row[index]));
 
 const bySize = (rows, index) => rows.toSorted(
@@ -37,7 +41,7 @@ function totalsOf(rows) {
 
 // The groups of duplicates: {number, size, files, frees}. A file that two shares hold in common is
 // one file.
-export function groupsOf(rows) {
+function groupsOf(rows) {
   const groups = new Map();
   for (const [number, , file, size] of rows) {
     const group = groups.get(number) ?? {number, size, files: new Set()};
@@ -61,119 +65,103 @@ function showDuplicates(data) {
             String(frees)]),
           {caption: format.say('reclaim'), sorted: 4}),
     table([['group', 'count'], ...FILES], pick(rows, 0, 2, 3, 4, 1),
-          {caption: data.heading, csv: csvOf('duplicate_file')})];
+          {caption: data.heading, csv: data.csv})];
+}
+
+// A row for each volume of the block; what becomes of it, and how it is called, say the facts.
+function usageTable(data, facts) {
+  const known = new Map(facts?.volumes.map(volume => [volume.id, volume]));
+  const rows = rowsOf(data).map(([id, used, free]) => {
+    const [one, two] = [used, free].map(text => format.isNumber(text) ? Number(text) : NaN);
+    const volume = known.get(id);
+    return [format.volumeName(id), String(one / (one + two) * 100), used, free, {
+      text: volume ? outlookText(volume) : format.UNKNOWN,
+      order: volume ? outlookOrder(volume) : NaN}];
+  });
+  const columns = [['volume', 'name'], ['percent', 'percent'], ['used', 'size'], ['free', 'size']];
+  return table(facts ? [...columns.slice(0, 2), ['days', 'outlook'], ...columns.slice(2)] : columns,
+               pick(bySize(rows, 1), ...facts ? [0, 1, 4, 2, 3] : [0, 1, 2, 3]),
+               {caption: format.nameOf('reports', 'volume_usage'), csv: data.csv, sorted: 1});
 }
 
 export const REPORTS = {
   volume_usage: {
-    variable: 'vornVolumeUsageData',
-    width: 5,
     always: true,
-    show: ({volumes, hasHistory}) => [
-      ...history(volumes, hasHistory),
-      table([['volume', 'name'], ['percent', 'percent'], ['days', 'outlook'], ['used', 'size'],
-             ['free', 'size']],
-            volumes.map(({name, percent, outlook, used, free}) => [
-              name, String(percent), {text: outlook.text, order: outlook.order},
-              String(used ?? ''), String(free ?? '')]),
-            {caption: format.nameOf('reports', 'volume_usage'), csv: csvOf('volume_usage'),
-             sorted: 1})]
+    show: (data, facts) => [...facts ? history(facts.volumes, facts.finished) : [],
+                            usageTable(data, facts)]
   },
   share_list: {
-    variable: 'vornShareListData',
-    width: 3,
-    show: data => [
-      shareMap(rowsOf(data)),
-      table([['share', 'name'], ['size', 'size'], ['volume', 'text']], pick(rowsOf(data), 0, 2, 1),
-            {caption: data.heading, csv: csvOf('share_list'), sorted: 1})]
+    show: data => {
+      const rows = rowsOf(data).map(([share, id, bytes]) => [share, bytes, format.volumeName(id)]);
+      return [shareMap(rowsOf(data)),
+              table([['share', 'name'], ['size', 'size'], ['volume', 'text']], rows,
+                    {caption: data.heading, csv: data.csv, sorted: 1})];
+    }
   },
   file_group: {
-    variable: 'vornFileGroupTableData',
-    width: 3,
-    limit: [100, 'cutRows'],
+    cut: 'cutRows',
     show: ({tables}) => [typeBars(tables), ...[...tables].filter(([, rows]) => rows.length).map(
       ([name, rows]) => folded(name === 'vornAll' ? format.say('allFiles') : shownPlain(name), table(
         [['type', 'type'], ['share', 'text'], ['size', 'size']], bySize(rows, 2),
         {caption: name === 'vornAll' ? format.say('allFiles') : shownPlain(name), sorted: 2})))]
   },
   file_owner: {
-    variable: 'vornFileOwnerData',
-    width: 4,
     show: data => [
       table([['owner', 'name'], ['size', 'size'], ['files', 'count']],
             pick(totalsOf(rowsOf(data)), 0, 2, 1),
-            {caption: data.heading, csv: csvOf('file_owner'), sorted: 1}),
+            {caption: data.heading, csv: data.csv, sorted: 1}),
       folded(format.say('byShare'), table(
         [['owner', 'name'], ['share', 'text'], ['size', 'size'], ['files', 'count']],
         pick(rowsOf(data), 0, 1, 3, 2), {caption: format.say('byShare')}))]
   },
   quota_usage: {
-    variable: 'vornQuotaUsageTable',
-    width: 4,
-    limit: [100, 'smallestUsers'],
-    eachTable: true,
     always: true,
     missing: 'noQuotas',
-    show: ({tables}) => [...tables].filter(([, rows]) => rows.length).map(([name, rows]) => table(
+    cut: 'smallestUsers',
+    show: ({tables}) => [...tables].filter(([, rows]) => rows.length).map(([id, rows]) => table(
       [['user', 'name'], ['percent', 'percent'], ['used', 'size'], ['quota', 'quota']],
-      pick(bySize(rows, 3), 0, 3, 2, 1), {caption: shownPlain(name), sorted: 1}))
+      pick(bySize(rows, 3), 0, 3, 2, 1), {caption: shownPlain(format.volumeName(id)), sorted: 1}))
   },
   duplicate_file: {
-    variable: 'vornDuplicateFileData',
-    width: 5,
-    limit: [200, 'firstGroups'],
-    limitOf: 0,
+    cut: 'firstGroups',
     mode: 'vornDuplicateHashMatch',
     show: showDuplicates
   },
   large_file: {
-    variable: 'vornLargeFileData',
-    width: 3,
-    limit: [200, 'firstRows'],
     show: data => [table(
       [['file', 'path'], ['size', 'size'], ['share', 'text']], pick(rowsOf(data), 1, 2, 0),
-      {caption: data.heading, csv: csvOf('large_file'), sorted: 1})]
+      {caption: data.heading, csv: data.csv, sorted: 1})]
   },
   least_modify: {
-    variable: 'vornLeastModifyData',
-    width: 4,
-    limit: [200, 'firstRows'],
     show: data => [table(FILES, pick(rowsOf(data), 1, 2, 3, 0),
-                         {caption: data.heading, csv: csvOf('least_modify')})]
+                         {caption: data.heading, csv: data.csv})]
   },
   most_modify: {
-    variable: 'vornMostModifyData',
-    width: 4,
-    limit: [200, 'firstRows'],
     show: data => [table(FILES, pick(rowsOf(data), 1, 2, 3, 0),
-                         {caption: data.heading, csv: csvOf('most_modify')})]
+                         {caption: data.heading, csv: data.csv})]
   }
 };
-
-// Whether the page got as many rows as it gets at most.
-export function isCut({limit, limitOf, eachTable}, {tables}) {
-  if (!limit) {
-    return false;
-  }
-  const all = [...tables.values()];
-  if (limitOf !== undefined) {
-    return Number(all.flat().at(-1)?.[limitOf]) >= limit[0];
-  }
-  const counts = all.map(rows => rows.length);
-  return (eachTable ? Math.max(0, ...counts) : counts.reduce((sum, n) => sum + n, 0)) >= limit[0];
+for (const {name, variable, columns, has_csv_rows: hasCsv} of FORMATS) {
+  Object.assign(REPORTS[name] ?? {}, {variable, columns, hasCsv});
 }
 
 const note = (key, values) => h('p', {class: 'note'}, format.say(key, values));
 
-// What the section says besides its rows: of damage, of a cut, and of nothing to show.
-function notesOf(report, data, emptyReports) {
+// What is said of a report without a block.
+function absence({always, missing}, known, emptyReports) {
+  return missing ?? (always ? 'missing' : known ? (known.rows ? 'missing' : 'noRows') :
+    {none: 'missing', all: 'noRows', some: 'unclear'}[emptyReports]);
+}
+
+// What the section says besides its rows: of failure, damage, a cut, and of nothing to show.
+// `known`: the facts about the report, if any.
+function notesOf(report, data, known, emptyReports) {
+  const notes = known?.ok === false ? [note('failed')] : [];
   if (!data) {
-    return [note(report.missing ?? (report.always || emptyReports === 'none' ? 'missing' :
-      emptyReports === 'all' ? 'noRows' : 'unclear'))];
+    return notes.length ? notes : [note(absence(report, known, emptyReports))];
   }
-  const rows = [...data.tables.values()].flat().length;
+  const rows = rowsOf(data).length;
   const count = format.number(rows);
-  const notes = [];
   if (!data.whole) {
     notes.push(note(rows ? 'recovered' : 'damaged', {n: count}));
   } else if (data.oddKeys.length) {
@@ -182,8 +170,8 @@ function notesOf(report, data, emptyReports) {
   } else if (rows === 0) {
     notes.push(note('noRows'));
   }
-  if (isCut(report, data)) {
-    notes.push(note(report.limit[1], {n: format.number(report.limit[0])}));
+  if (known && known.shown < known.rows) {
+    notes.push(note(report.cut ?? 'firstRows', {n: format.number(known.limit ?? known.shown)}));
   }
   return notes;
 }
@@ -195,16 +183,20 @@ window.addEventListener('beforeprint', () => document.querySelectorAll('details:
     window.addEventListener('afterprint', () => { details.open = false; }, {once: true});
   }));
 
-// Fills `section` with report `name`. `data` is undefined without a block; `emptyReports` says
-// which of the reports without a block have just found nothing: all, some or none.
-export function fillSection(section, name, data, emptyReports) {
+// Fills `section` with report `name`. `data` is undefined without a block, `facts` without those;
+// `emptyReports` says which of the reports without a block have just found nothing: all, some or
+// none. `mark`: level of an incident that concerns the report, if any.
+export function fillSection(section, name, {data, facts, emptyReports, mark}) {
   const report = REPORTS[name];
-  const rows = data ? [...data.tables.values()].flat() : [];
+  const known = facts?.reports.get(name);
   const heading = format.nameOf('reports', data?.heading ?? name);
+  const csv = report?.hasCsv && !(known && known.csv === undefined) ? `csv/${name}.csv` : undefined;
   section.replaceChildren(
-    h('h2', {id: `${name}-heading`}, name === 'volume_usage' ? format.say('history') : heading),
-    ...report ? notesOf(report, data, emptyReports) : [note('unknown')],
-    ...rows.length ? report.show({...data, heading}).filter(Boolean) : []);
+    h('h2', {id: `${name}-heading`}, name === 'volume_usage' ? format.say('history') : heading,
+      mark && levelElement(mark, false)),
+    ...report ? notesOf(report, data, known, emptyReports) : [note('unknown')],
+    ...data && rowsOf(data).length ? report.show({...data, heading, csv}, facts).filter(Boolean) :
+      []);
   for (const title of section.querySelectorAll('.title')) {
     title.textContent = title.textContent === heading ? '' : title.textContent;
   }

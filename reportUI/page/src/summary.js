@@ -1,106 +1,100 @@
-// The first look: what fills up, when, and because of whom.
+// The first look: what the run has found that needs attention, and what went wrong with it. The
+// facts say both by codes, the dictionaries in words.
+import {attention as FORMATS} from 'report_format';
+
 import {h, shown} from './dom.js';
 import * as format from './format.js';
-import {groupsOf, isCut, REPORTS} from './sections.js';
+import {fillsText} from './outlook.js';
 import {sizeElement} from './table.js';
-import {stateElement} from './volumes.js';
+import {levelElement} from './volumes.js';
 
-const MOST_VOLUMES = 3, MOST_USERS = 3;
-const OVER = 100, NEAR = 90;
+const MOST_INCIDENTS = 8;  // that stand open
 
-const rowsOf = data => data ? [...data.tables.values()].flat() : [];
+// How a value is shown, by the kind that the program gives it.
+const KINDS = {
+  name: value => shown(String(value)),
+  bytes: value => sizeElement(value, null),
+  percent: format.percent,
+  days: value => format.figure(value),
+  count: format.number,
+  time: format.day
+};
 
-function volumeNotices(volumes) {
-  const pressing = volumes.filter(({state}) => state !== 'ok');
-  const order = ['critical', 'warn'];
-  pressing.sort((one, two) => order.indexOf(one.state) - order.indexOf(two.state) ||
-    one.outlook.order - two.outlook.order || two.percent - one.percent);
-  return (pressing.length ? pressing.slice(0, MOST_VOLUMES) : volumes.slice(0, 1)).map(volume => ({
-    to: 'volume_usage', state: volume.state, key: 'noticeVolume',
-    values: {name: shown(volume.name), percent: format.percent(volume.percent),
-             outlook: volume.outlook.text}}));
+function valuesOf({code, values}) {
+  const kinds = Object.hasOwn(FORMATS, code) ? FORMATS[code].values : {};
+  const elements = Object.fromEntries(Object.entries(kinds).map(
+    ([name, kind]) => [name, values[name] === undefined ? format.UNKNOWN :
+      KINDS[kind](values[name])]));
+  return 'days' in kinds ? {...elements, outlook: fillsText(values)} : elements;
 }
 
-function quotaNotices(data) {
-  const users = [...data?.tables ?? []].flatMap(([volume, rows]) => rows.map(
-    ([user, quota, used]) => ({volume, user, quota, used,
-                               percent: Number(used) / Number(quota) * 100})))
-    .filter(({quota, percent}) => Number(quota) > 0 && percent >= NEAR)
-    .sort((one, two) => two.percent - one.percent);
-  const notices = users.slice(0, MOST_USERS).map(user => ({
-    to: 'quota_usage', state: user.percent > OVER ? 'critical' : 'warn',
-    key: user.percent > OVER ? 'noticeOverQuota' : 'noticeNearQuota',
-    values: {user: shown(user.user), volume: shown(user.volume), used: sizeElement(user.used, null),
-             quota: sizeElement(user.quota, null), percent: format.percent(user.percent)}}));
-  if (users.length > MOST_USERS) {
-    notices.push({to: 'quota_usage', state: 'warn', key: 'noticeMoreUsers',
-                  values: {n: format.number(users.length - MOST_USERS)}});
+function line(level, mark, ...content) {
+  return h('li', {class: level}, mark, h('div', {}, ...content));
+}
+
+// A link to a report's section; the bare text when the page has none.
+const linkTo = (report, sections, text) => sections.has(report) ?
+  h('a', {href: `#${report}`}, ...text) : h('span', {}, ...text);
+
+function attentionLine(entry, sections) {
+  const {level, code, section} = entry;
+  return line(level, level === 'ok' ? h('span', {class: 'level', 'aria-hidden': 'true'}, '›') :
+    levelElement(level, false),
+              linkTo(section, sections, format.sayNodes(code, valuesOf(entry), 'attention')));
+}
+
+// What needs attention, each line with a link to its section. `sections`: names of those that the
+// page has. Null when the run has looked at nothing that may need some.
+export function attention({attention: found, volumes, quotas}, sections) {
+  const isCalm = found.every(({level}) => level === 'ok') && (volumes.length || quotas);
+  const content = [
+    isCalm ? h('p', {}, format.say('nothing')) : null,
+    found.length ? h('ul', {class: 'notices'}, ...found.map(
+      entry => attentionLine(entry, sections))) : null].filter(Boolean);
+  return content.length ? h('div', {}, ...content) : null;
+}
+
+// The report that an incident concerns, if any: a share may be called like one.
+function reportOf({kind, what}, sections) {
+  return sections.has(what) && !/^(share|index)_/.test(kind) ? what : undefined;
+}
+
+function incidentLine(incident, sections) {
+  const {level, kind, what, text} = incident;
+  const report = reportOf(incident, sections);
+  const detail = h('span', {lang: 'en'}, shown(text));
+  if (!format.hasText('incidents', kind)) {
+    return line(level, levelElement(level, false), detail);
   }
-  return notices;
+  const sentence = format.sayNodes(
+    kind, {what: report ? format.nameOf('reports', report) : shown(what)}, 'incidents');
+  return line(level, levelElement(level, false), linkTo(report, sections, sentence),
+              h('p', {class: 'detail'}, detail));
 }
 
-function greatest(sums) {
-  let best;
-  for (const [name, bytes] of sums) {
-    if (!best || bytes > best[1]) {
-      best = [name, bytes];
+// The list of incidents, errors first; the rest of a long one is folded. Null without any.
+export function incidents({incidents: all}, sections) {
+  if (!all.length) {
+    return null;
+  }
+  const sorted = [...all.filter(({level}) => level === 'error'),
+                  ...all.filter(({level}) => level !== 'error')];
+  const list = part => h('ul', {class: 'notices'}, ...part.map(
+    incident => incidentLine(incident, sections)));
+  return h('div', {}, list(sorted.slice(0, MOST_INCIDENTS)), sorted.length > MOST_INCIDENTS ?
+    h('details', {},
+      h('summary', {}, format.say('showAll', {n: format.number(sorted.length)})),
+      list(sorted.slice(MOST_INCIDENTS))) : null);
+}
+
+// The worst level of the incidents that concern each report.
+export function marksOf(facts, sections) {
+  const marks = new Map();
+  for (const incident of facts?.incidents ?? []) {
+    const report = reportOf(incident, sections);
+    if (report && marks.get(report) !== 'error') {
+      marks.set(report, incident.level);
     }
   }
-  return best && best[1] > 0 ? best : null;
-}
-
-function shareNotices(data) {
-  const best = greatest(rowsOf(data).map(([share, , bytes]) => [share, Number(bytes)]));
-  return best ? [{to: 'share_list', key: 'noticeShare',
-                  values: {share: shown(best[0]), size: sizeElement(best[1], null)}}] : [];
-}
-
-function ownerNotices(data) {
-  const sums = new Map();
-  for (const [owner, , , bytes] of rowsOf(data)) {
-    sums.set(owner, (sums.get(owner) ?? 0) + (Number(bytes) || 0));
-  }
-  const best = greatest(sums);
-  return best ? [{to: 'file_owner', key: 'noticeOwner',
-                  values: {owner: shown(best[0]), size: sizeElement(best[1], null)}}] : [];
-}
-
-function duplicateNotices(data) {
-  const frees = groupsOf(rowsOf(data)).reduce((sum, group) => sum + group.frees, 0n);
-  if (frees === 0n) {
-    return [];
-  }
-  const kind = data.mode === '1' ? 'noticeConfirmed' : 'noticePossible';
-  return [{to: 'duplicate_file',
-           key: isCut(REPORTS.duplicate_file, data) || !data.whole ? `${kind}More` : kind,
-           values: {size: sizeElement(frees, null)}}];
-}
-
-function oldestNotices(data) {
-  const [first] = rowsOf(data);
-  return first && Number(first[3]) > 0 ? [{
-    to: 'least_modify', key: 'noticeOldest',
-    values: {date: format.day(first[3]),
-             file: shown(first[1].slice(first[1].lastIndexOf('/') + 1))}}] : [];
-}
-
-function line({to, state = 'info', key, values}) {
-  return h('li', {class: state},
-           state === 'info' ? h('span', {class: 'state info', 'aria-hidden': 'true'}, '›') :
-             stateElement(state, false),
-           h('a', {href: `#${to}`}, ...format.sayNodes(key, values)));
-}
-
-const rank = ({state = 'info'}) => ['critical', 'warn'].indexOf(state) + 1 || 3;
-
-// The list of what needs attention, the worst first, each line with a link to its section. `data`: report name to
-// what was read. Null where no report looks for what may need some.
-export function attention(data, volumes) {
-  const notices = [
-    ...volumeNotices(volumes), ...quotaNotices(data.get('quota_usage')),
-    ...shareNotices(data.get('share_list')), ...ownerNotices(data.get('file_owner')),
-    ...duplicateNotices(data.get('duplicate_file')), ...oldestNotices(data.get('least_modify'))];
-  notices.sort((one, two) => rank(one) - rank(two));
-  return notices.length ? h('ul', {class: 'notices'}, ...notices.map(line)) :
-    data.has('volume_usage') || data.has('quota_usage') ? h('p', {}, format.say('nothing')) : null;
+  return marks;
 }

@@ -1,0 +1,55 @@
+// The facts of the run: what the program has found out and judged, as the page's block has them.
+// The page repeats them and judges nothing itself.
+//
+// A value that is missing or of another kind counts as its default, so that a block that somebody
+// has touched throws nowhere.
+import {facts_variable as VARIABLE} from 'report_format';
+
+import {readJson} from './data.js';
+
+const FORMAT = 1;
+const LARGEST = 2 ** 64, LATEST = 32503680000;  // the year 3000
+
+const text = value => typeof value === 'string' ? value : '';
+const number = value => Math.abs(value) <= LARGEST && typeof value === 'number' ? value : 0;
+const time = value => number(value) > 0 && value < LATEST ? value : 0;
+const optional = read => value => value === undefined || value === null ? undefined : read(value);
+const oneOf = (...words) => value => words.includes(value) ? value : words[0];
+const list = read => value => Array.isArray(value) ? value.map(entry => read(entry)) : [];
+const record = fields => value => Object.fromEntries(Object.entries(fields).map(
+  ([key, read]) => [key, read(value?.[key])]));
+
+const level = oneOf('ok', 'warning', 'critical');
+const forecast = record({
+  state: oneOf('short', 'full', 'growing', 'shrinking', 'steady'), window: number,
+  days: optional(number), days_low: optional(number), days_high: optional(number),
+  jump: optional(record({date: time, bytes: number}))
+});
+const sample = value => ({date: time(value?.[0]), used: number(value?.[1])});
+
+const readFields = record({
+  host: text, profile: text, time_zone: text, finished: time,
+  complete: value => value !== false,
+  incidents: list(record({level: oneOf('warning', 'error'), kind: text, what: text, text})),
+  volumes: list(record({id: text, path: text, size: number, used: number, free: number,
+                        percent: number, level, forecast, samples: list(sample)})),
+  quotas: optional(list(() => null)),
+  attention: list(record({level, code: text, section: text, values: value => value ?? {}})),
+  reports: list(record({name: text, rows: number, shown: number, limit: optional(number),
+                        csv: optional(text), ok: value => value !== false}))
+});
+
+// The facts by their keys, with `reports` as a Map by name and samples as {date, used}; undefined
+// when they are missing or broken.
+export function readFacts(pieces) {
+  const json = readJson(pieces, VARIABLE);
+  if (json?.format !== FORMAT) {
+    return undefined;
+  }
+  const facts = readFields(json);
+  for (const volume of facts.volumes) {
+    volume.samples = volume.samples.filter(({date}) => date > 0);
+  }
+  facts.reports = new Map(facts.reports.map(report => [report.name, report]));
+  return facts;
+}
