@@ -3,10 +3,13 @@
 Nothing here uses the program's own code: outputs are read by small readers of their own.
 """
 import ctypes
+import email
+import email.policy
 import json
 import os
 import re
 import shutil
+import signal
 import socket
 import subprocess
 import tempfile
@@ -83,6 +86,28 @@ class Run:
             self.log.close()
             self.log_lines = self.log.lines
         return self
+
+
+class MailServer:
+    """A mail server on loopback; mails() are those that it was given."""
+
+    def __init__(self, test, folder):
+        self.folder = folder
+        folder.mkdir()
+        self.process = subprocess.Popen(
+            ['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py', folder], stdout=subprocess.PIPE, text=True)
+        test.addCleanup(self.end)
+        self.port = int(self.process.stdout.readline())
+
+    def end(self):
+        self.process.send_signal(signal.SIGTERM)
+        self.process.wait()
+        self.process.stdout.close()
+
+    def mails(self):
+        files = sorted(self.folder.glob('*.eml'), key=lambda path: int(path.stem))
+        return [email.message_from_bytes(path.read_bytes(), policy=email.policy.default)
+                for path in files]
 
 
 class Machine:

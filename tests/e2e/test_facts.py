@@ -1,42 +1,16 @@
 """The facts of a run against independent counts, and page, mail and vornctl telling the same."""
 import collections
-import email
-import email.policy
 import json
 import os
-import signal
 import sqlite3
 import subprocess
 import time
 
 from expected import facts
-from harness import ALL, FORMAT, ROOT, ProductTest, make_files, needs_root
+from harness import ALL, FORMAT, ROOT, MailServer, ProductTest, make_files, needs_root
 from server import DAY, SHARES, USERS, Server
 
 MIB = 1 << 20
-
-
-class MailServer:
-    """A mail server on loopback; mails() are those that it was given."""
-
-    def __init__(self, test, folder):
-        self.folder = folder
-        folder.mkdir()
-        self.process = subprocess.Popen(
-            ['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py',
-             folder], stdout=subprocess.PIPE, text=True)
-        test.addCleanup(self.end)
-        self.port = int(self.process.stdout.readline())
-
-    def end(self):
-        self.process.send_signal(signal.SIGTERM)
-        self.process.wait()
-        self.process.stdout.close()
-
-    def mails(self):
-        files = sorted(self.folder.glob('*.eml'), key=lambda path: int(path.stem))
-        return [email.message_from_bytes(path.read_bytes(), policy=email.policy.default)
-                for path in files]
 
 
 def plain(mail):

@@ -7,7 +7,7 @@ import tempfile
 from pathlib import Path
 
 from expected import Tree
-from harness import BUILD, ROOT, ProductTest, make_files, needs_root
+from harness import BUILD, ROOT, MailServer, ProductTest, make_files, needs_root
 from server import Server
 
 FORMAT = BUILD / 'report_format.json'
@@ -44,12 +44,19 @@ class Page(ProductTest):
         run = self.m.run('--report', name)
         self.assertEqual((run.status, self.m.status(name)), (0, 'success'), run.log_lines)
         shutil.copytree(self.m.report_folders(name)[-1], self.pages / name)
+        (self.pages / name / 'status.json').write_text(
+            self.m.shell(f'/usr/vorn/bin/vornctl status {name} --json').out)
         self.m = self.new_machine()
         return run.log_lines
 
     def test_in_the_browser(self):
         Server(self.m, self).history()
-        self.make('big', limit_user='anna,john-doe,chen')
+        mails = MailServer(self, self.m.base / 'mails')
+        self.make('big', limit_user='anna,john-doe,chen', mail_to='admin@files.example',
+                  smtp_url=f'smtp://127.0.0.1:{mails.port}')
+        mail, = mails.mails()
+        (self.pages / 'big/mail.txt').write_text(
+            mail['subject'] + '\n' + mail.get_body(('plain',)).get_content())
 
         self.m.accounts({'root': 0})
         self.m.share('nothing')
