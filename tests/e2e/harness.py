@@ -148,8 +148,10 @@ class Machine:
         return sorted(path for path in folder.glob('*') if path.name != 'template')
 
     def leftovers(self):
-        """What a run that has ended must not leave: temporary files, databases, partial reports."""
-        found = list(self.tmp.glob('vornreport_*')) + list((self.vorn / 'var/stat').iterdir())
+        """What a run that has ended must not leave: temporary files, databases, progress, partial
+        reports."""
+        found = list(self.tmp.glob('vornreport_*')) + [
+            path for name in ('stat', 'progress') for path in (self.vorn / 'var' / name).iterdir()]
         return found + list(self.reports.glob('*/.*partial'))
 
     def stop_at(self, call):

@@ -135,6 +135,7 @@ int clean(const std::string& profile, const VLIBCSzHash* hash) {
     }
   }
   remove_statistics(profile);
+  VornQazProgressEnd(profile.c_str());
   return result;
 }
 
