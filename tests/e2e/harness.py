@@ -95,7 +95,8 @@ class MailServer:
         self.folder = folder
         folder.mkdir()
         self.process = subprocess.Popen(
-            ['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py', folder], stdout=subprocess.PIPE, text=True)
+            ['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py', folder],
+            stdout=subprocess.PIPE, text=True)
         test.addCleanup(self.end)
         self.port = int(self.process.stdout.readline())
 
@@ -176,10 +177,11 @@ class Machine:
         return sorted(path for path in folder.glob('*') if path.name != 'template')
 
     def leftovers(self):
-        """What a run that has ended must not leave: temporary files, databases, partial reports."""
+        """What a run that has ended must not leave: temporary files, databases, progress, partial
+        reports."""
         found = list(self.tmp.glob('vornreport_*')) + [
-            path for folder in ('stat', 'progress') if (self.vorn / 'var' / folder).exists()
-            for path in (self.vorn / 'var' / folder).iterdir()]
+            path for name in ('stat', 'progress') for path in (self.vorn / 'var' / name).rglob('*')
+            if not path.is_dir()]
         return found + list(self.reports.glob('*/.*partial'))
 
     def stop_at(self, call):

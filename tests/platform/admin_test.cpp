@@ -99,11 +99,11 @@ TEST(AdminRuns, KilledAndForgottenOnesLeaveNothingUnfinished) {
   for (const bool is_forgotten : {false, true}) {
     fs::create_directories(folder + "/.2026-01-02_03-04-05.partial/csv");
     fs::create_directories(folder + "/2026-01-01_00-00-00");
-    write_file(VORN_PATH_STAT "/stat.db.k", "x");
+    write_file(VORN_PATH_STAT "/k/stat.db", "x");
     write_file(status, "collect_data\n");
     const auto left = admin::leftovers_of(profile);
     EXPECT_EQ(left, std::optional(std::vector<std::string>{folder + "/.2026-01-02_03-04-05.partial",
-                                                           VORN_PATH_STAT "/stat.db.k"}));
+                                                           VORN_PATH_STAT "/k/stat.db"}));
     ASSERT_EQ(admin::hold_profile("k"), admin::Hold::taken);
     EXPECT_TRUE(is_forgotten ? admin::forget_runs(profile) : admin::end_killed_run(profile));
     EXPECT_EQ(admin::leftovers_of(profile), std::optional(std::vector<std::string>{}));

@@ -1,16 +1,20 @@
 // The process as it is prepared, and SQLite's memory in it.
 #include <gtest/gtest.h>
 #include <sqlite3.h>
+#include <sys/utsname.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cctype>
 #include <csignal>
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <filesystem>
 #include <random>
 
+#include "machine/server.hpp"
 #include "machine/sqlite_memory.hpp"
 #include "support.hpp"
 #include "vorn/report.h"
@@ -49,6 +53,48 @@ TEST(SetEnv, PreparesAProcessStartedAnyhow) {
     EXPECT_EQ("/dev/null", std::filesystem::read_symlink("/proc/self/fd/0"));
     EXPECT_EQ(SIG_IGN, std::signal(SIGPIPE, SIG_DFL));
   }));
+}
+
+TEST(Server, HasANameAndATimeZone) {
+  char text[256] = "x";
+  utsname names{};
+  ASSERT_EQ(0, uname(&names));
+  std::string name = names.nodename;
+  std::erase_if(name, [](unsigned char c) { return std::isalnum(c) == 0 && c != '.' && c != '-'; });
+  EXPECT_EQ(std::ssize(name), VornQazGetHostName(text, sizeof text));
+  EXPECT_EQ(name, text);
+  EXPECT_EQ(-1, VornQazGetHostName(text, name.size()));
+  EXPECT_STREQ("", text);
+  EXPECT_EQ(-1, VornQazGetTimeZone(nullptr, 9));
+
+  const support::TempFolder folder;
+  const std::string link = folder.path("localtime");
+  const std::string file = folder.path("timezone");
+  const struct {
+    const char* target;  // of the link; empty: there is none
+    const char* text;    // of the file
+    const char* expected;
+  } cases[] = {{"/usr/share/zoneinfo/Europe/Berlin", "Asia/Tokyo\n", "Europe/Berlin"},
+               {"../zoneinfo/x/zoneinfo/Etc/GMT+2", "", "Etc/GMT+2"},
+               {"", "America/Port-au-Prince\nmore", "America/Port-au-Prince"},
+               {"/etc/zone", "Asia/Tokyo", "Asia/Tokyo"},
+               {"/usr/share/zoneinfo/", "Asia/Tokyo", "+05:30"},
+               {"/usr/share/zoneinfo/a b", "Asia/Tokyo", "+05:30"},
+               {"", "it's", "+05:30"},
+               {"", "", "+05:30"}};
+  for (const auto& [target, content, expected] : cases) {
+    std::filesystem::remove(link);
+    if (*target != '\0') {
+      std::filesystem::create_symlink(target, link);
+    }
+    support::write_file(file, content);
+    EXPECT_TRUE(support::passes_in_child([&, wanted = expected] {
+      setenv("TZ", "Asia/Kolkata", 1);
+      tzset();
+      EXPECT_EQ(wanted, host::time_zone_of(link.c_str(), file.c_str()));
+    })) << target
+        << content;
+  }
 }
 
 TEST(SqliteMemory, KeepsEveryByteOfEveryBlock) {

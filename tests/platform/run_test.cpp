@@ -73,6 +73,7 @@ TEST_F(Run, HostileProfileNamesFailEveryCall) {
     EXPECT_EQ(VornQazReportCleanTmp(name.c_str(), raw), -1);
     EXPECT_EQ(VornQazScheduleClean(name.c_str(), &raw, "k"), -1);
     EXPECT_EQ(VornQazSendReport(name.c_str(), "l", raw), -1);
+    EXPECT_EQ(VornQazProgressUpdate(name.c_str(), "x"), -1);
   }
 }
 
@@ -145,7 +146,7 @@ TEST_F(Run, TakesItsNamesInTmpFromWhoeverPlantedThem) {
 TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   write_file(folder.path("precious"), "kept");
   const std::string own = std::string(kReports) + "/killed";
-  const std::string database = "/usr/vorn/var/stat/stat.db.killed";
+  const std::string database = "/usr/vorn/var/stat/killed/stat.db";
   support::OtherRun other("killed", [&] {
     init("killed", 1);
     write_file(database, "");
@@ -155,22 +156,24 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   });
   ASSERT_TRUE(other.started());
   const std::string data = temporary("data", other.pid());
+  ASSERT_EQ(VornQazProgressUpdate("killed", "far"), 0);
   write_file(own + "/2020-01-01_00-00-00/report.html", "old report");
   fs::create_directory_symlink(folder.path(), own + "/template");
   fs::create_directory_symlink(folder.path(), own + "/.x.partial");
-  write_file("/usr/vorn/var/stat/stat.db.other", "");
+  write_file("/usr/vorn/var/stat/other/stat.db", "");
 
   // While it lives, clearing up takes nothing from it.
   ASSERT_EQ(init("killed", 0), 0);
   EXPECT_EQ(VornQazReportCleanTmp("killed", hash.get()), 0);
   EXPECT_TRUE(exists(database) && exists(own + "/.x.partial") && exists(data));
+  EXPECT_EQ(read_file(VORN_PATH_PROGRESS "/killed"), "far");
   other.end();
 
   // A run that only collects data comes first, and must not hide the killed one's names.
   EXPECT_TRUE(support::OtherRun("killed").started());
   ASSERT_EQ(begin("killed"), 0);
   EXPECT_FALSE(exists(data) || exists(database) || exists(database + "-journal"));
-  EXPECT_TRUE(exists("/usr/vorn/var/stat/stat.db.other"));
+  EXPECT_TRUE(exists("/usr/vorn/var/stat/other/stat.db"));
   std::set<std::string> left;
   for (const auto& entry : fs::directory_iterator(own)) {
     left.insert(entry.path());
@@ -246,6 +249,46 @@ TEST_F(Run, AStatusThatCannotBeStoredIsTold) {
   EXPECT_EQ(syslog_lines().size(), 1U);
   EXPECT_TRUE(exists(path("real_path_date_final")));
 }
+
+// --- Progress -----------------------------------------------------------------------------------
+
+TEST_F(Run, ProgressIsThereForAnyoneUntilItsEnd) {
+  const std::string folder_path = VORN_PATH_PROGRESS;
+  const std::string file = folder_path + "/far";
+  const auto mode_of = [](const std::string& path) {
+    struct stat status {};
+    return stat(path.c_str(), &status) == 0 ? status.st_mode & 07777 : 0;
+  };
+  fs::remove_all(folder_path);
+  const mode_t mask = umask(077);
+  EXPECT_EQ(VornQazProgressUpdate("far", "begun\n"), 0);
+  EXPECT_EQ(mode_of(folder_path), 0755U);
+  write_file(folder_path + "/.far.new", std::string(9999, 'x'));  // of a run that was killed
+  EXPECT_EQ(VornQazProgressUpdate("far", "half\n"), 0);
+  EXPECT_EQ(VornQazProgressUpdate("other", "x"), 0);
+  umask(mask);
+  EXPECT_EQ(mode_of(file), 0644U);
+  EXPECT_EQ(read_file(file), "half\n");
+  EXPECT_FALSE(exists(folder_path + "/.far.new"));
+
+  fs::remove(file);
+  fs::create_directories(file + "/x");  // in the way
+  errno = 0;
+  EXPECT_EQ(VornQazProgressUpdate("far", "lost"), -1);
+  EXPECT_EQ(errno, 0) << "what the run says next is not about this";
+  EXPECT_FALSE(exists(folder_path + "/.far.new"));
+  fs::remove_all(file);
+  VornQazProgressEnd("far");
+  EXPECT_EQ(VornQazProgressUpdate("far", "again"), 0);
+  VornQazProgressEnd("far");
+  EXPECT_FALSE(exists(file));
+  EXPECT_TRUE(exists(folder_path + "/other"));
+  EXPECT_EQ(VornQazReportCleanTmp("other", nullptr), 0);
+  EXPECT_FALSE(exists(folder_path + "/other"));
+  EXPECT_EQ(support::syslog_text(), "");
+}
+
+// --- Old reports --------------------------------------------------------------------------------
 
 TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
   const std::string own = folder.path("keep");

@@ -6,7 +6,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cctype>
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
@@ -97,16 +96,9 @@ bool read_credentials(const char* profile, const VLIBCSzHash& hash, MailServer& 
   return true;
 }
 
-// The kernel takes any bytes for a host name; a header takes only these.
 std::string host_name() {
   char name[256] = "";
-  static_cast<void>(gethostname(name, sizeof name - 1));
-  std::string host = name;
-  const auto is_odd = [](char c) {
-    return std::isalnum(static_cast<unsigned char>(c)) == 0 && c != '.' && c != '-';
-  };
-  host.erase(std::remove_if(host.begin(), host.end(), is_odd), host.end());
-  return host.empty() ? "localhost" : host;
+  return VornQazGetHostName(name, sizeof name) > 0 ? name : "localhost";
 }
 
 std::string new_message_id(std::time_t now, const std::string& host) {

@@ -104,10 +104,9 @@ void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
   }
 }
 
-// Removes what a killed run of the profile has left. Nothing here is fatal: the new run's names are
-// unused ones, and the database is checked when it is opened.
+// Removes the reports that a killed run of the profile has begun. Nothing here is fatal: the new
+// run's names are unused ones.
 void remove_leftovers(const std::string& profile, const std::string& folder) {
-  remove_statistics(profile);
   for (const std::string& left : unfinished_reports(folder).value_or(std::vector<std::string>{})) {
     if (!remove_tree(left)) {
       log_line("unfinished report %s can't be removed (%s); remove it by hand", left.c_str(),
@@ -116,12 +115,19 @@ void remove_leftovers(const std::string& profile, const std::string& folder) {
   }
 }
 
+// The statistics database is reached by path, by the program and by SQLite, so it gets a folder
+// that is new and this user's alone.
+bool make_statistics_folder(const std::string& profile) {
+  return remove_statistics(profile) && make_folders(VORN_PATH_STAT) &&
+         mkdir((VORN_PATH_STAT "/" + profile).c_str(), 0700) == 0;
+}
+
 bool prepare(const ReportRun& run) {
   if (!claim_temporary_names()) {
     return false;
   }
   if (mkdir(run.unfinished.c_str(), 0777) == 0 &&
-      mkdir((run.unfinished + "/csv").c_str(), 0777) == 0 && make_folders(VORN_PATH_STAT)) {
+      mkdir((run.unfinished + "/csv").c_str(), 0777) == 0 && make_statistics_folder(run.profile)) {
     return true;
   }
   log_line("profile \"%s\": the folders of a run, %s and %s, can't be made (%s); free some space",
@@ -233,14 +239,20 @@ std::optional<std::string> report_dir(const char* profile, const VLIBCSzHash& ha
 }
 
 std::string statistics_path(const std::string& profile) {
-  return VORN_PATH_STAT "/stat.db." + profile;
+  return VORN_PATH_STAT "/" + profile + "/stat.db";
 }
 
-void remove_statistics(const std::string& profile) {
+bool remove_statistics(const std::string& profile) {
   const ErrnoKeeper keeper;
-  const std::string path = statistics_path(profile);
-  unlink(path.c_str());
-  unlink((path + "-journal").c_str());
+  const std::string before = VORN_PATH_STAT "/stat.db." + profile;  // of an older version
+  unlink(before.c_str());
+  unlink((before + "-journal").c_str());
+  const std::string folder = VORN_PATH_STAT "/" + profile;
+  if (remove_tree(folder)) {
+    return true;
+  }
+  log_line("%s can't be removed (%s); remove it by hand", folder.c_str(), std::strerror(errno));
+  return false;
 }
 
 std::vector<std::string> entries_of(const Fd& folder) {

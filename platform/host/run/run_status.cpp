@@ -110,10 +110,7 @@ int update_status(const std::string& profile, std::string_view word) {
   return status.word == word ? 0 : 1;
 }
 
-// The order keeps this off a run that starts at the same time: what is there is noted first, then
-// the holder is looked for, and only what was noted is removed. A run that starts behind the look
-// makes folders of its own, which aren't on the note; its statistics database is safe but for the
-// microseconds between the look and the removal, since a run removes an old one before it makes it.
+// Only the holder removes what runs have begun, so this takes the profile when nobody has it.
 int clean(const std::string& profile, const VLIBCSzHash* hash) {
   remove_temporary_names(getpid());
   int result = 0;
@@ -124,7 +121,7 @@ int clean(const std::string& profile, const VLIBCSzHash* hash) {
     result = found ? 0 : -1;
     unfinished = found.value_or(std::vector<std::string>{});
   }
-  if (held_by_other(profile)) {
+  if (!holds_profile(profile) && take_profile(profile) != TakeResult::taken) {
     return result;
   }
   for (const std::string& path : unfinished) {
@@ -135,6 +132,7 @@ int clean(const std::string& profile, const VLIBCSzHash* hash) {
     }
   }
   remove_statistics(profile);
+  VornQazProgressEnd(profile.c_str());
   return result;
 }
 

@@ -57,7 +57,7 @@ int VornQazInitLocation(VLIBCSzHash** hash, int flags);
 int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report);
 
 // Removes what an unfinished run of `profile` left: its `.partial` folders, its statistics database
-// with journal, and this process's temporary names in /tmp. Never a finished report, and nothing
+// with journal, its progress, and this process's temporary names in /tmp. Never a finished report, and nothing
 // while another live process holds the profile. `hash` is the profile with its paths; null when
 // loading it failed, then only what needs no configuration is removed. Declares nothing: the status
 // stays what it is. 0 or -1.
