@@ -106,7 +106,7 @@ void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
 
 // Removes the reports that a killed run of the profile has begun. Nothing here is fatal: the new
 // run's names are unused ones.
-void remove_leftovers(const std::string& profile, const std::string& folder) {
+void remove_leftovers(const std::string& folder) {
   for (const std::string& left : unfinished_reports(folder).value_or(std::vector<std::string>{})) {
     if (!remove_tree(left)) {
       log_line("unfinished report %s can't be removed (%s); remove it by hand", left.c_str(),
@@ -149,7 +149,7 @@ std::optional<ReportRun> begin_report_run(const char* profile, const VLIBCSzHash
   if (!config_is_readable(VORN_PATH_SHARES) || !make_report_folder(dir, folder)) {
     return std::nullopt;
   }
-  remove_leftovers(profile, folder);
+  remove_leftovers(folder);
   ReportRun run = unused_run(profile, folder);
   if (!prepare(run)) {
     return std::nullopt;
