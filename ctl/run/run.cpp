@@ -130,6 +130,10 @@ void check_start(const Options& options, const Section& profile) {
   if (count_reports(profile.value("report_list")) == 0) {
     throw Failure("profile " + profile.name + " selects no report; set its key report_list");
   }
+  if (!options.data) {
+    // Where the report couldn't go, hours of counting would be for nothing.
+    reports_in(folder_of_reports(profile), ReportSize::left_out);
+  }
   if (admin::last_run(profile.name).state == admin::RunState::running) {
     fail_as_running(profile.name);
   }

@@ -57,7 +57,8 @@ class Server:
             file.truncate(size * GIB)
         call('mkfs.ext4', '-q', '-m', '0', '-O', '^quota,^has_journal,^resize_inode', '-T',
              'largefile4', '-E', 'lazy_itable_init=1,nodiscard', image)
-        call('mount', '-o', 'loop,usrquota,noinit_itable', image, folder)
+        quota = ',usrquota' if name == 'home' else ''
+        call('mount', '-o', f'loop,noinit_itable{quota}', image, folder)
         self.test.addCleanup(call, 'umount', folder)
         device = subprocess.check_output(['findmnt', '-n', '-o', 'SOURCE', folder], text=True).strip()
         self.machine.options += ['--bind', device, device]

@@ -251,10 +251,16 @@ class Status(CtlTest):
     def test_status(self):
         folder = self.stored('weekly', {'2026-01-02_03-04-05': WHOLE, '2026-01-03_03-04-05': CUT})
         (folder / '2026-01-02_03-04-05/report.json').write_text(json.dumps({
-            'format': 1, 'volumes': [
+            'format': 1, 'complete': False, 'volumes': [
                 {'path': '/srv/a', 'size': 100, 'percent': 90.0,
-                 'forecast': {'state': 'growing', 'days': 12}},
-                {'path': '/', 'size': 100, 'percent': 95.0, 'forecast': {'state': 'steady'}}]}))
+                 'forecast': {'state': 'growing', 'days': 12, 'days_low': 9, 'days_high': 20}},
+                {'path': '/', 'size': 100, 'percent': 95.0, 'forecast': {'state': 'steady'}}],
+            'incidents': [{'level': 'error', 'kind': 'share_missing', 'what': 'x', 'text': 'Gone.'}],
+            'attention': [
+                {'level': 'critical', 'code': 'volume_fills', 'section': 'volume_usage', 'values': {
+                    'volume': '/srv/a', 'days': 12, 'days_low': 9, 'days_high': 20}},
+                {'level': 'ok', 'code': 'share_largest', 'section': 'share_list',
+                 'values': {'share': 'x', 'bytes': 1}}]}))
         (self.m.vorn / 'var/status').mkdir(parents=True, exist_ok=True)
         self.m.profile('far', report_list='share_list', report_dir='relative')
         states = {'weekly': ('success', 'success'), 'far': ('fail', 'fail'),
@@ -271,13 +277,20 @@ class Status(CtlTest):
         self.assertIn('report_dir "relative" is not absolute', run.err)
         weekly = found['weekly']
         self.assertEqual(weekly['last_report']['path'], f'{folder}/2026-01-02_03-04-05/report.html')
-        self.assertEqual(weekly['fullest_volume'],
-                         {'volume': '/srv/a', 'percent': 90.0, 'days_to_full': 12})
-        self.assertEqual([found['new'][key] for key in ('last_report', 'fullest_volume')],
-                         [None, None])
+        self.assertEqual([weekly['volume']['path'], weekly['volume']['forecast']['days'],
+                          weekly['complete'], weekly['incidents'][0]['what'],
+                          weekly['attention'][0]['text']],
+                         ['/srv/a', 12, False, 'x', '/srv/a: full in about 12 days (9 to 20)'])
+        self.assertEqual({found['new'][key] for key in ('last_report', 'volume', 'complete',
+                                                        'incidents', 'attention')}, {None})
         self.assertRegex(self.ctl('status', 'weekly').out,
-                         r'weekly +success +2026-01-02 03:04 +\S+ KiB +- +90 % of '
-                         r'/srv/a +12\n$')
+                         r'weekly +success +2026-01-02 03:04 +\S+ KiB +- +/srv/a, 90% +full in about '
+                         r'12 days \(9 to 20\)\nweekly: Share x is missing.*\n'
+                         r'weekly: /srv/a: full in about 12 days \(9 to 20\)\n$')
+        listed, = (entry for entry in json.loads(self.ctl('reports', 'weekly', '--json').out)
+                   if entry['level'])
+        self.assertEqual((listed['level'], listed['incidents']), ('critical', 1))
+        self.assertRegex(self.ctl('reports', 'weekly').out, r'yes, lacking 1 +critical +/')
 
     def test_next_run(self):
         now = datetime.datetime.now()

@@ -25,8 +25,10 @@ class Settings(ProductTest):
                 ('bad line', {}, (config, f'[weekly]\nreport_list = {REPORTS}\nword\n'),
                  [r'vornreport\.conf:3: malformed line', 'section=weekly']),
                 ('no shares', {}, ('etc/share.conf', None), [r'share\.conf can\'t be read']),
-                ('no script', {}, (script, None), ['page .* is missing or cut', 'no link to']),
-                ('bad script', {}, (script, '#!/bin/sh\nexit 1\n'), ['page .* is missing or cut']),
+                ('no script', {}, (script, None), ['create template failed']),
+                ('bad script', {}, (script, '#!/bin/sh\nexit 1\n'), ['create template failed']),
+                ('empty script', {}, (script, '#!/bin/sh\n'),
+                 ['page .* is missing or cut', 'no link to']),
                 ('no profile', {}, None, ['section=unheard', 'init profile failed']),
                 ('no name', {}, None, [r'"\.\./x" is no profile name', 'init profile failed'])):
             with self.subTest(name):

@@ -3,7 +3,7 @@ import os
 import re
 import signal
 
-from expected import (DAY, MARK, SCRIPT, Tree, block, csv, csv_line, data_blocks, local_time,
+from expected import (DAY, MARK, SCRIPT, Tree, block, csv, csv_line, data_blocks, facts, local_time,
                       totals)
 from harness import ProductTest, make_files, needs_root
 
@@ -85,13 +85,14 @@ class Reports(ProductTest):
         return self.assertSucceeded(self.done, profile)
 
     def assertHolds(self, folder, blocks, **csv_files):
-        """A whole page with the blocks, the CSV files, and nothing else."""
+        """A whole page with the blocks, the CSV files, the facts, and nothing else."""
         page = (folder / 'report.html').read_bytes()
         self.assertTrue(page.startswith(b'<!DOCTYPE html>\n') and page.endswith(b'\n</html>\n'))
         self.assertEqual(data_blocks(folder), blocks)
         self.assertEqual({path.stem: path.read_bytes() for path in folder.rglob('*.csv')},
                          csv_files)
-        self.assertEqual(len(list(folder.rglob('*'))), 2 + len(csv_files))
+        facts(folder)
+        self.assertEqual(len(list(folder.rglob('*'))), 3 + len(csv_files))
 
     def owner_rows(self):
         names = {uid: name for name, uid in ACCOUNTS.items()}

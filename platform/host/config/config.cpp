@@ -41,14 +41,14 @@ int get_section(const char* file, std::string_view section, VLIBCSzHash& hash) {
   if (result != FindResult::found) {
     return find_failure(result, __LINE__);
   }
-  int keys = 0;
+  hash.origin = {file, std::string(section), {}};
   for (std::size_t i = range.header + 1; i < range.end; ++i) {
     if (lines[i].kind == LineKind::entry) {
       hash.set(lines[i].name, lines[i].value);
-      ++keys;
+      hash.origin->entries.emplace(lines[i].name, lines[i].value);
     }
   }
-  return keys;
+  return static_cast<int>(hash.origin->entries.size());
 }
 
 // --- Rewriting ----------------------------------------------------------------------------------
@@ -119,14 +119,47 @@ std::string rewritten(const std::vector<ConfigLine>& lines, const SectionRange& 
   return text;
 }
 
+// The entries that `hash` means, now that the section holds `lines`: of a section that it was read
+// from what it has changed since, and all the rest as the section has it. Somebody else may have
+// changed that in between. The views are those of `hash` and `lines`.
+Entries meant_entries(const VLIBCSzHash& hash, const std::vector<ConfigLine>& lines,
+                      const SectionRange& range, const char* file, std::string_view section) {
+  Entries wanted = hash.sorted();
+  if (!hash.origin || hash.origin->file != file || hash.origin->section != section) {
+    return wanted;
+  }
+  const auto& before = hash.origin->entries;
+  Entries meant;
+  for (std::size_t i = range.header + 1; i < range.end; ++i) {
+    if (lines[i].kind != LineKind::entry) {
+      continue;
+    }
+    const char* value = hash.find(lines[i].name);
+    const auto known = before.find(lines[i].name);
+    const bool is_removed = value == nullptr && known != before.end();
+    const bool is_changed = value != nullptr && (known == before.end() || known->second != value);
+    if (!is_removed) {
+      meant.emplace_back(lines[i].name, is_changed ? std::string_view(value) : lines[i].value);
+    }
+  }
+  for (const VLIBCSzHash::Entry& entry : wanted) {
+    const auto known = before.find(entry.first);
+    const bool is_there = std::any_of(meant.begin(), meant.end(),
+                                      [&](const auto& e) { return e.first == entry.first; });
+    if (!is_there && (known == before.end() || known->second != entry.second)) {
+      meant.push_back(entry);
+    }
+  }
+  return meant;
+}
+
 int set_section(const char* file, std::string_view section, const VLIBCSzHash& hash,
                 std::string_view format) {
-  const Entries entries = hash.sorted();
   if (!valid_format(format)) {
     log_line("%s: not rewritten: the line format needs %%s twice and a line end", file);
     return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
-  if (!entries_fit(file, format, entries)) {
+  if (!entries_fit(file, format, hash.sorted())) {
     return fail(VLIBC_ERR_BAD_PARAMETER, __LINE__);
   }
   return rewrite_config(file, [&](std::string_view text) -> std::optional<std::string> {
@@ -141,7 +174,7 @@ int set_section(const char* file, std::string_view section, const VLIBCSzHash& h
       find_failure(result, __LINE__);
       return std::nullopt;
     }
-    return rewritten(lines, range, format, entries);
+    return rewritten(lines, range, format, meant_entries(hash, lines, range, file, section));
   });
 }
 
