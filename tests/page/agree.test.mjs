@@ -12,7 +12,7 @@ const plain = text => text.replaceAll('\u00a0', ' ').replace(/\s+/g, ' ').trim()
 test('what needs attention is said alike by page, mail and vornctl', () => withPage(fileOf('big'), async page => {
   const said = (await textOf(page, '#attention li')).map(plain);
   const pressing = status.attention.filter(({level}) => level !== 'ok').map(({text}) => plain(text));
-  assert.ok(pressing.length > 2, JSON.stringify(status.attention));
+  assert.ok(pressing.length > 1, JSON.stringify(status.attention));
   for (const sentence of pressing) {
     assert.ok(said.some(line => line.includes(sentence)), `${sentence}\n${said.join('\n')}`);
     assert.ok(mail.includes(sentence), `${sentence}\n${mail}`);
@@ -27,5 +27,5 @@ test('cards tell the volumes of the facts, the most pressing first', () => withP
   assert.deepEqual(status.volume, facts.volumes[0]);
   const first = plain((await textOf(page, '.card'))[0]);
   const outlook = /full in about \d+ days \(\d+ to \d+\)/.exec(mail)?.[0];
-  assert.ok(outlook && first.includes(outlook), `${outlook}: ${first}`);
+  assert.ok(outlook && first.toLowerCase().includes(outlook), `${outlook}: ${first}`);
 }));
