@@ -238,7 +238,9 @@ systemctl list-timers --no-legend
         self.assertEqual(len(data_rows(text, 'vornVolumeUsageData')), 2, text[:1000])
         self.assertEqual(len(list((self.base / 'mails').iterdir())), 1)
         page, = elsewhere.glob('elsewhere/*/report.html')
-        self.assertEqual((page.group(), page.stat().st_mode & 0o777), ('users', 0o640))
+        for path in (page, page.with_name('report.json')):
+            self.assertEqual((path.owner(), path.group(), path.stat().st_mode & 0o777),
+                             ('root', 'users', 0o640), path)
         self.assertEqual({path for path in self.left() if 'vorn' in path},
                          {'/' + str(path.relative_to(self.root)) for path in (own, own.parent)})
 

@@ -64,6 +64,36 @@ TEST(TargetLink, StandsForTheReportFolder) {
   EXPECT_EQ("refused", link_of({{"report_dir", base}}, page)) << "cut short";
 }
 
+TEST(TargetLink, OpensPageAndFactsToTheGroupOfTheFolder) {
+  const support::TempFolder folder;
+  const std::string report = folder.path("reports/weekly/now");
+  support::write_file(report + "/report.html", "<!doctype html>\n</html>\n");
+  support::write_file(report + "/elsewhere", "");
+  const gid_t group = geteuid() == 0 ? 100 : getegid();  // only root can give files away
+  ASSERT_EQ(0, chown(report.c_str(), static_cast<uid_t>(-1), group));
+  ASSERT_EQ(0, chmod((report + "/elsewhere").c_str(), 0600));
+  const auto make_link = [&] {
+    return link_of({{"report_dir", folder.path("reports")}}, report + "/report.html");
+  };
+  std::filesystem::create_symlink(report + "/elsewhere", report + "/report.json");
+  EXPECT_NE("refused", make_link());
+  std::filesystem::remove(report + "/report.json");
+  support::write_file(report + "/report.json", "{}");
+  for (const char* name : {"/report.html", "/report.json"}) {
+    ASSERT_EQ(0, chmod((report + name).c_str(), 0600));
+  }
+  EXPECT_NE("refused", make_link());
+  for (const auto& [name, mode] :
+       {std::pair("/report.html", 0640), {"/report.json", 0640}, {"/elsewhere", 0600}}) {
+    struct stat status {};
+    ASSERT_EQ(0, stat((report + name).c_str(), &status));
+    EXPECT_EQ(static_cast<mode_t>(mode), status.st_mode & 07777U) << name;
+    EXPECT_EQ(mode == 0640 ? group : getegid(), status.st_gid) << name;
+    EXPECT_EQ(geteuid(), status.st_uid) << name;
+  }
+  EXPECT_EQ("", syslog_text());
+}
+
 // --- Mail ---------------------------------------------------------------------------------------
 
 // The server script as a child process; ended with the scope.

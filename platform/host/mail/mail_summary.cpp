@@ -212,16 +212,14 @@ class Summary {
 std::string subject_of(const Summary& plain, const MailTopic& topic,
                        const std::optional<Facts>& facts) {
   const std::string notice = facts ? shortened(plain.headline(*facts)) : "";
-  const std::string subject = notice.empty()
-                                  ? plain.about("subject", topic)
-                                  : plain.about("subjectWith", topic, {{"notice", notice}});
+  std::string subject = notice.empty() ? plain.about("subject", topic)
+                                       : plain.about("subjectWith", topic, {{"notice", notice}});
   if (!facts || facts->incidents.empty()) {
     return subject;
   }
-  return has_error(*facts)
-             ? plain.say("incomplete", {{"subject", subject}})
-             : plain.say("incidents",
-                         {{"subject", subject}, {"n", std::to_string(facts->incidents.size())}});
+  const std::string count = std::to_string(facts->incidents.size());
+  return has_error(*facts) ? plain.say("incomplete", {{"subject", subject}})
+                           : plain.say("incidents", {{"subject", subject}, {"n", count}});
 }
 
 // --- Plain --------------------------------------------------------------------------------------
@@ -280,7 +278,11 @@ std::string html_table(const std::vector<Line>& lines) {
   constexpr const char* kValue = R"(</th><td style="vertical-align: top; padding: 2px 0"><strong>)";
   std::string table = "<table style=\"border-collapse: collapse\">\n";
   for (const auto& [label, text, details] : lines) {
-    table += label.empty() ? kSentence + text : kLabel + label + kValue + text + "</strong>";
+    if (label.empty()) {
+      table.append(kSentence).append(text);
+    } else {
+      table.append(kLabel).append(label).append(kValue).append(text).append("</strong>");
+    }
     table += "</td></tr>\n";
   }
   return table + "</table>\n";

@@ -15,6 +15,7 @@
 
 #include "base/host_log.hpp"
 #include "base/text_containers.hpp"
+#include "report_format/reports.hpp"
 #include "run/page.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
@@ -67,20 +68,25 @@ std::optional<std::string> below(const std::string& folder, const char* file) {
   return relative.string();
 }
 
+void open_to_group(const std::string& path, gid_t group) {
+  constexpr mode_t kMode = 0640;
+  const host::Fd file = host::open_regular(AT_FDCWD, path.c_str());
+  if (file &&
+      (fchown(file.get(), static_cast<uid_t>(-1), group) != 0 || fchmod(file.get(), kMode) != 0)) {
+    host::log_line("report \"%s\" can't be opened to its group (%s)", path.c_str(),
+                   std::strerror(errno));
+  }
+}
+
 // The page was made for its owner alone, in /tmp. Whoever may enter its folder (a web server, say,
-// by a setgid report_dir) may read it from now on, as the CSV files beside it.
-void open_to_group(const std::string& page) {
+// by a setgid report_dir) may read it from now on, as the CSV files and the facts beside it.
+void open_report_to_group(const std::string& page) {
   const host::ErrnoKeeper keeper;
   const std::string folder = page.substr(0, page.rfind('/'));
-  const host::Fd file(open(page.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
   struct stat status {};
-  if (file && stat(folder.c_str(), &status) == 0) {
-    constexpr mode_t kMode = 0640;
-    if (fchown(file.get(), static_cast<uid_t>(-1), status.st_gid) != 0 ||
-        fchmod(file.get(), kMode) != 0) {
-      host::log_line("report \"%s\" can't be opened to its group (%s)", page.c_str(),
-                     std::strerror(errno));
-    }
+  if (stat(folder.c_str(), &status) == 0) {
+    open_to_group(page, status.st_gid);
+    open_to_group(folder + "/" + report_format::kFactsFile, status.st_gid);
   }
 }
 
@@ -91,7 +97,7 @@ int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size
     errno = ENOENT;
     return -1;
   }
-  open_to_group(target_file);
+  open_report_to_group(target_file);
   const char* configured = hash.find("report_dir");
   const std::string report_dir =
       configured == nullptr || *configured == '\0' ? VORN_PATH_REPORTS : configured;

@@ -57,10 +57,10 @@ int VornQazInitLocation(VLIBCSzHash** hash, int flags);
 int VornQazInitRealPath(const char* profile, VLIBCSzHash** hash, int for_report);
 
 // Removes what an unfinished run of `profile` left: its `.partial` folders, its statistics database
-// with journal, its progress, and this process's temporary names in /tmp. Never a finished report, and nothing
-// while another live process holds the profile. `hash` is the profile with its paths; null when
-// loading it failed, then only what needs no configuration is removed. Declares nothing: the status
-// stays what it is. 0 or -1.
+// with journal, its progress, and this process's temporary names in /tmp. Never a finished report,
+// and nothing while another live process holds the profile. `hash` is the profile with its paths;
+// null when loading it failed, then only what needs no configuration is removed. Declares nothing:
+// the status stays what it is. 0 or -1.
 int VornQazReportCleanTmp(const char* profile, const VLIBCSzHash* hash);
 
 // Puts `text` in the place of what VORN_PATH_PROGRESS tells of the run of `profile`: atomically, so

@@ -37,9 +37,9 @@ void VORNMountVolInfoFree(VORNMountVolInfo* volumes);
 // the enumeration). A share whose folder doesn't exist is left out. 0, or -1 with `*hash` null.
 int VornQazGetVolumePathHash(VLIBCSzHash** hash);
 
-// Writes the mount path of the volume that holds `path` (links followed), as the enumeration has it,
-// into `mount_path`; of a path on a file system that is no volume the mount's own. The length, or -1
-// when it can't be told or doesn't fit.
+// Writes the mount path of the volume that holds `path` (links followed), as the enumeration has
+// it, into `mount_path`; of a path on a file system that is no volume the mount's own. The length,
+// or -1 when it can't be told or doesn't fit.
 int VORNVolumeOfPath(const char* path, char* mount_path, size_t size);
 
 // Non-zero when the volume mounted at `mount_path` keeps users' quotas, by its mount options.

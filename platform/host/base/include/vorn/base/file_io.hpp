@@ -55,9 +55,9 @@ class ErrnoKeeper {
 // Never blocks on a pipe.
 std::optional<std::string> read_file(const std::string& path, std::size_t limit);
 
-// Opens the regular file `name` of the open folder `folder` for reading; AT_FDCWD is this process's.
-// No descriptor, with errno, for something else and for a link in the last component. Never blocks
-// on a pipe.
+// Opens the regular file `name` of the open folder `folder` for reading; AT_FDCWD is this
+// process's. No descriptor, with errno, for something else and for a link in the last component.
+// Never blocks on a pipe.
 Fd open_regular(int folder, const char* name);
 // The first `most` bytes of an open file, less when it is shorter; nothing with errno when it can't
 // be read.
