@@ -5,6 +5,7 @@ Nothing here uses the program's own code: outputs are read by small readers of t
 import ctypes
 import email
 import email.policy
+import fcntl
 import json
 import os
 import re
@@ -277,3 +278,17 @@ def private_mounts():
 def needs_root(test):
     """For tests of what a plain user's machine can't have; a server's, and the build's, must."""
     return unittest.skipIf(os.geteuid(), 'only root can give files away and mount')(test)
+
+
+def needs_loop_devices(test):
+    """For tests that mount an image; a container may have no devices for that."""
+    get_free = 0x4C82
+    try:
+        with open('/dev/loop-control', 'rb') as control:
+            number = fcntl.ioctl(control, get_free)
+        with open(f'/dev/loop{number}', 'rb'):
+            return needs_root(test)
+    except OSError as error:
+        return needs_root(unittest.skip(
+            f'no loop devices to mount images with ({error.filename}: {error.strerror}); '
+            'run modprobe loop, and let a container have /dev/loop-control and /dev/loop*')(test))

@@ -3,15 +3,19 @@ removed and purged by the real tools, with everything they write kept in memory.
 import os
 import re
 import shutil
+import stat
 import subprocess
 import tempfile
 import unittest
 from pathlib import Path
 
 from expected import data_rows
-from harness import BUILD, LIMIT, ROOT, needs_root, private_mounts
+from harness import BUILD, LIMIT, ROOT, needs_loop_devices, needs_root, private_mounts
 
 CGROUPS = [Path('/sys/fs/cgroup', name) for name in ('', 'systemd', 'unified')]
+# The package's own folders, and where the tests put what is theirs.
+PLACES = ('usr/vorn', 'usr/share/vornreport', 'usr/share/doc/vornreport', 'srv', 'home/share',
+          'etc/cron.d/vornreport-own', 'vornreport_0.1.0_amd64.deb')
 # Records of dpkg and caches, whatever is installed.
 RECORDS = re.compile(r'/(var/lib/dpkg/(status|available|lock|triggers)|var/cache/|var/log/)')
 ENVIRONMENT = {'PATH': '/usr/sbin:/usr/bin:/sbin:/bin', 'DEBIAN_FRONTEND': 'noninteractive'}
@@ -50,8 +54,29 @@ class Package(unittest.TestCase):
         self.written, self.root, work = (self.base / name for name in ('written', 'root', 'work'))
         for path in (self.written, self.root, work):
             path.mkdir()
-        call('mount', '-t', 'overlay', '-o', f'lowerdir=/,upperdir={self.written},workdir={work}',
-             'private', self.root)
+        call('mount', '-t', 'overlay', '-o',
+             f'lowerdir={self.cover()}:/,upperdir={self.written},workdir={work}', 'private', self.root)
+
+    def cover(self):
+        """A layer above this machine that hides the product, if it is here already, and whatever
+        stands where the tests put what is theirs."""
+        cover, records = self.base / 'cover', Path('/var/lib/dpkg')
+
+        def covering(path):
+            for folder in reversed(path.parents):
+                (cover / folder.relative_to('/')).mkdir(exist_ok=True)
+                shutil.copystat(folder, cover / folder.relative_to('/'))
+            return cover / path.relative_to('/')
+        listed = call('sh', '-c', f'dpkg-deb --fsys-tarfile {self.package} | tar -t')
+        files = re.findall(r'^\./(.*[^/])$', listed, re.MULTILINE)
+        hidden = [Path('/', name) for name in (*PLACES, *files) if name in PLACES or
+                  not name.startswith(PLACES)] + list((records / 'info').glob('vornreport.*'))
+        for path in filter(os.path.lexists, hidden):
+            os.mknod(covering(path), stat.S_IFCHR)  # such a device hides the name below it
+        others = re.sub(r'^Package: vornreport\n(.+\n)*\n?', '', (records / 'status').read_text(),
+                        flags=re.MULTILINE)
+        covering(records / 'status').write_text(others)
+        return cover
 
     def dpkg(self, action, package):
         """As an administrator, or a script, that answers no question."""
@@ -190,6 +215,7 @@ class Package(unittest.TestCase):
                 self.assertEqual(normal(output), normal(shown), command)
         self.assertFalse((self.root / 'usr/vorn').exists())
 
+    @needs_loop_devices
     def test_units(self):
         """The units forbid nothing that a run needs, and leave with the package."""
         self.dpkg('--install', self.package)

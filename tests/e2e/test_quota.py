@@ -5,7 +5,7 @@ import struct
 import subprocess
 
 from expected import SCRIPT, data_blocks
-from harness import PROGRAM, ProductTest, needs_root, private_mounts
+from harness import PROGRAM, ProductTest, needs_loop_devices, private_mounts
 
 ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002, 'carl': 3003, 'john-doe': 3004}
 MANY = {f'u{i:03}': 4000 + i for i in range(150)}
@@ -57,7 +57,7 @@ class Quotas(ProductTest):
     def call(self, *command):
         subprocess.run(list(map(str, command)), check=True, stderr=subprocess.DEVNULL)
 
-    @needs_root
+    @needs_loop_devices
     def test_real_tool(self):
         volume, image = self.m.base / 'volume', self.m.base / 'image'
         volume.mkdir()
