@@ -11,6 +11,7 @@ cd "$root"
 install_missing "${build_packages[@]}" "${test_packages[@]}"
 
 # A later run without sudo must be able to write there.
+# shellcheck disable=SC2317  # the trap calls it
 give_back() {
   if [[ $EUID -eq 0 && -n ${SUDO_UID-} ]]; then
     chown -Rh "$SUDO_UID:${SUDO_GID:-$SUDO_UID}" build
