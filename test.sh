@@ -26,4 +26,4 @@ ctest --test-dir build --output-on-failure --no-tests=error -j2 "$@" || tested=$
 # A test that can't run on this machine says what it lacks.
 sed -n "s/.* skipped ['\"]\(.*\)['\"]\$/test.sh: not everything was tested: \1/p" \
   build/Testing/Temporary/LastTest.log | sort -u
-exit "$tested"
+[[ $tested -eq 0 ]]
