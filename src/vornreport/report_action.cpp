@@ -202,7 +202,9 @@ int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, cha
     return -1;
   }
   const int result = run_selected_reports(profile, profile_hash, report_list, look_ups);
-  note_owners(look_ups.users.get());
+  if (report_format::is_selected(report_format::kFileOwner.name, report_list)) {
+    note_owners(look_ups.users.get());
+  }
   return result;
 }
 

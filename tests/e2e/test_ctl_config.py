@@ -3,12 +3,10 @@ import json
 import os
 import shutil
 
-from harness import ProductTest, Run, needs_root
+from harness import ALL, ProductTest, Run, needs_root
 
 CTL = '/usr/vorn/bin/vornctl'
 SHARES = '# top\n\n# of one\n[one]\n path=/etc ; not a comment\n\n[two]\npath = /usr\n# end'
-REPORTS = ('quota_usage,file_owner,volume_usage,share_list,file_group,duplicate_file,large_file,'
-           'least_modify,most_modify')
 
 
 class ControlTest(ProductTest):
@@ -186,7 +184,7 @@ class Profiles(ControlTest):
         made = before + '\n[n]\nreport_list = '
         add, put = ('profile', 'add', 'n'), ('profile', 'set', 'p')
         self.check_table(self.m.config, before, (
-            (add, f'{made}{REPORTS}\nvolume_history = true\n', ''),
+            (add, f'{made}{ALL}\nvolume_history = true\n', ''),
             ((*add, '--reports', 'large_file, share_list', '--shares', 'my docs,photos', '--language',
               'de-AT', '--mail-to', 'a@b.c ,d@e.f', '--mail-from', 'v@b.c', '--smtp-url',
               'smtps://m:465', '--smtp-user', 'u', '--smtp-password-file', '/tmp/secret',
@@ -226,12 +224,12 @@ class Profiles(ControlTest):
             (('profile', 'remove', 'global'), None, 'no profile')))
 
     def test_show_and_list(self):
-        self.m.config.write_text(self.GLOBAL + f'[p]\nreport_list = {REPORTS}\nmail_to = a@b\n')
+        self.m.config.write_text(self.GLOBAL + f'[p]\nreport_list = {ALL}\nmail_to = a@b\n')
         self.check(('profile', 'list'), out='PROFILE  SHARES  MAIL TO  REPORTS\n'
                                             'p        all     a@b      all\n')
         self.check(('profile', 'show', 'global'), out='KEY          VALUE\n'
                                                       'report_list  volume_usage\n')
-        shown = {'name': 'p', 'report_list': REPORTS, 'mail_to': 'a@b'}
+        shown = {'name': 'p', 'report_list': ALL, 'mail_to': 'a@b'}
         self.assertEqual(json.loads(self.ctl('profile', 'show', 'p', '--json').out), shown)
         self.assertEqual(json.loads(self.ctl('profile', 'list', '--json').out), [shown])
 

@@ -7,10 +7,9 @@ import tempfile
 from pathlib import Path
 
 from expected import Tree
-from harness import BUILD, ROOT, MailServer, ProductTest, make_files, needs_root
+from harness import ALL, BUILD, ROOT, MailServer, ProductTest, make_files, needs_root
 from server import Server
 
-FORMAT = BUILD / 'report_format.json'
 SHARE = 'big & small'
 NAMES = {  # name to how it must be shown; chips in brackets
     'plain \u65e5\u672c.txt': None,
@@ -39,8 +38,7 @@ class Page(ProductTest):
 
     def make(self, name, **keys):
         """Has the machine's report made, as the page `name`."""
-        reports = ','.join(each['name'] for each in json.loads(FORMAT.read_text())['reports'])
-        self.m.profile(name, report_list=reports, volume_history='true', **keys)
+        self.m.profile(name, report_list=ALL, volume_history='true', **keys)
         run = self.m.run('--report', name)
         self.assertEqual((run.status, self.m.status(name)), (0, 'success'), run.log_lines)
         shutil.copytree(self.m.report_folders(name)[-1], self.pages / name)
@@ -83,6 +81,6 @@ class Page(ProductTest):
         tests = sorted((ROOT / 'tests/page').glob('*.test.mjs'))
         done = subprocess.run(
             ['node', '--test', *tests], stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True,
-            env=os.environ | {'VORN_PAGES': str(self.pages), 'VORN_FORMAT': str(FORMAT),
+            env=os.environ | {'VORN_PAGES': str(self.pages), 'VORN_FORMAT': str(BUILD / 'report_format.json'),
                               'VORN_NODE_MODULES': str(BUILD / 'reportUI/page/node_modules')})
         self.assertEqual(done.returncode, 0, done.stdout)

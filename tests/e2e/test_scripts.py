@@ -1,4 +1,4 @@
-"""The scripts, and who includes whom."""
+"""The scripts, the manual, and who includes whom."""
 import json
 import os
 import re
@@ -7,7 +7,7 @@ import tempfile
 import unittest
 from pathlib import Path
 
-from harness import BUILD, ROOT
+from harness import BUILD, FORMAT, ROOT
 
 TEMPLATE = ROOT / 'reportUI/build-template.sh'
 
@@ -25,6 +25,13 @@ class Sources(unittest.TestCase):
         done = subprocess.run(['shellcheck', '-x', *scripts], cwd=ROOT, text=True,
                               stdout=subprocess.PIPE)
         self.assertEqual(done.stdout, '')
+
+
+class Manual(unittest.TestCase):
+    def test_every_report_is_described(self):
+        manual = (ROOT / 'docs/man/vornreport.8').read_text()
+        for report in FORMAT['reports']:
+            self.assertIn(f'\n.It Cm {report["name"]}\n', manual)
 
 
 # --- Who includes whom ---------------------------------------------------------------------------
