@@ -5,7 +5,6 @@
 #include <cwchar>
 #include <nlohmann/json.hpp>
 
-#include "base/ctl.hpp"
 #include "vorn/admin/messages.hpp"
 #include "vorn/base/utf8.hpp"
 

@@ -287,6 +287,7 @@ std::string checked_value(const ProfileKey& key, const std::string& value) {
 
 std::vector<std::string> report_names() {
   std::vector<std::string> names;
+  names.reserve(report_format::kReports.size());
   for (const report_format::ReportFormat* report : report_format::kReports) {
     names.emplace_back(report->name);
   }
