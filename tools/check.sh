@@ -6,7 +6,7 @@ set -euo pipefail
 cd "$(dirname "$0")/.."
 
 mapfile -t sources < <(git ls-files '*.cpp' '*.hpp' '*.h')
-mapfile -t units < <(git ls-files 'src/*.cpp' 'platform/*.cpp' 'ctl/*.cpp')
+mapfile -t units < <(git ls-files 'src/*.cpp' 'platform/*.cpp' 'ctl/*.cpp' 'report_format/*.cpp')
 
 echo "check: formatting"
 clang-format --dry-run -Werror "${sources[@]}"
