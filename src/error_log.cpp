@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <string>
 
@@ -13,29 +14,42 @@
 namespace vornreport {
 namespace {
 
-bool is_control(unsigned char byte) {
+// The length of the control character that `text` begins with, 0 when it begins with none. (Those
+// above ASCII are two bytes in UTF-8, the first of them C2.)
+size_t control_length(const char* text) {
   constexpr unsigned char kDelete = 0x7F;
-  return byte < ' ' || byte == kDelete;
+  constexpr unsigned char kLead = 0xC2;
+  constexpr unsigned char kFirstAbove = 0xA0;
+  const auto byte = static_cast<unsigned char>(text[0]);
+  if (byte == kLead) {
+    const auto next = static_cast<unsigned char>(text[1]);
+    return next > kDelete && next < kFirstAbove ? 2 : 0;
+  }
+  return byte < ' ' || byte == kDelete ? 1 : 0;
+}
+
+size_t count_controls(const char* text) {
+  size_t count = 0;
+  for (; *text != '\0'; ++text) {
+    count += control_length(text) != 0 ? 1 : 0;
+  }
+  return count;
 }
 
 // `text` with its control characters as \x0a, so that no name from disk can end a line and forge
-// the next, or speak to a terminal. (Those above ASCII are two bytes in UTF-8, the first of them
-// C2.)
+// the next, or speak to a terminal.
 void append_visible(std::string& out, const char* text) {
-  constexpr unsigned char kLead = 0xC2;
-  constexpr unsigned char kFirstAbove = 0xA0;
   for (const char* c = text != nullptr ? text : "(null)"; *c != '\0'; ++c) {
-    const auto byte = static_cast<unsigned char>(*c);
-    const auto next = static_cast<unsigned char>(c[1]);
-    const bool is_pair = byte == kLead && next >= 0x80 && next < kFirstAbove;
-    if (!is_pair && !is_control(byte)) {
+    const size_t length = control_length(c);
+    if (length == 0) {
       out += *c;
-      continue;
     }
-    char escape[16];
-    std::snprintf(escape, sizeof escape, is_pair ? "\\x%02x\\x%02x" : "\\x%02x", byte, next);
-    out += escape;
-    c += is_pair ? 1 : 0;
+    for (size_t i = 0; i < length; ++i) {
+      char escape[8];
+      std::snprintf(escape, sizeof escape, "\\x%02x", static_cast<unsigned char>(c[i]));
+      out += escape;
+    }
+    c += length > 1 ? length - 1 : 0;
   }
 }
 
@@ -52,7 +66,7 @@ void append_value(std::string& out, const std::string& conversion, Value value) 
 
 // As vsnprintf, but texts of %s come out visible. Knows the conversions that messages have: s, d,
 // u, X, f, the lengths ll and z, and m.
-[[gnu::format(printf, 1, 0)]] std::string format_text(const char* format, va_list args) {
+[[gnu::format(printf, 1, 0)]] std::string visible_text(const char* format, va_list args) {
   const int error = errno;
   std::string out;
   while (*format != '\0') {
@@ -89,6 +103,29 @@ void append_value(std::string& out, const std::string& conversion, Value value) 
   }
   errno = error;
   return out;
+}
+
+// The message as it is shown. Few have a name with a control character in them: those that hold no
+// more than their format itself are as printf makes them.
+[[gnu::format(printf, 1, 0)]] std::string format_text(const char* format, va_list args) {
+  const int error = errno;
+  va_list again;
+  va_copy(again, args);
+  char* text = nullptr;
+  const int length = vasprintf(&text, format, args);
+  errno = error;
+  std::string result;
+  if (length >= 0 && count_controls(text) == count_controls(format)) {
+    result.assign(text, static_cast<size_t>(length));
+  } else {
+    result = visible_text(format, again);
+  }
+  if (length >= 0) {
+    std::free(text);  // NOLINT(cppcoreguidelines-no-malloc): vasprintf's
+  }
+  va_end(again);
+  errno = error;
+  return result;
 }
 
 // The one place that builds the two channels. syslog() and printf() may change errno, and the
