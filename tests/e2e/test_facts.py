@@ -7,7 +7,7 @@ import subprocess
 import time
 
 from expected import facts
-from harness import ALL, FORMAT, ROOT, MailServer, ProductTest, make_files, needs_root
+from harness import ALL, FORMAT, ROOT, MailServer, ProductTest, make_files, needs_loop_devices
 from server import DAY, SHARES, USERS, Server
 
 MIB = 1 << 20
@@ -26,7 +26,7 @@ def amounts(rows):
     return sums
 
 
-@needs_root
+@needs_loop_devices
 class PreparedServer(ProductTest):
     """Four volumes, quotas and half a year of history."""
 

@@ -7,7 +7,7 @@ import tempfile
 from pathlib import Path
 
 from expected import Tree
-from harness import ALL, BUILD, ROOT, MailServer, ProductTest, make_files, needs_root
+from harness import ALL, BUILD, ROOT, MailServer, ProductTest, make_files, needs_loop_devices
 from server import Server
 
 SHARE = 'big & small'
@@ -28,7 +28,7 @@ NAMES = {  # name to how it must be shown; chips in brackets
 }
 
 
-@needs_root
+@needs_loop_devices
 class Page(ProductTest):
     def setUp(self):
         super().setUp()
