@@ -51,8 +51,9 @@ class Run : public testing::Test {
     return init(profile, 1);
   }
   // What the program does between VornQazInitRealPath and the last status.
-  void publish(const std::string& page) {
+  void publish(const std::string& page, const std::string& facts = "{\"format\":1}") {
     write_file(path("real_path_date") + "/report.html", page);
+    write_file(path("real_path_date") + "/report.json", facts);
     fs::rename(path("real_path_date"), path("real_path_date_final"));
   }
 
@@ -206,6 +207,16 @@ TEST_F(Run, SuccessNeedsACompletePage) {
   }
 }
 
+TEST_F(Run, SuccessNeedsTheFacts) {
+  for (const char* facts : {"", "{", "[]"}) {
+    ASSERT_EQ(begin("facts"), 0);
+    publish(kWhole, facts);
+    EXPECT_EQ(VornQazStatusUpdate("facts", "success"), 1);
+    EXPECT_FALSE(exists(path("real_path_date_final")) || exists(path("real_path_date")));
+    EXPECT_EQ(syslog_lines().size(), 1U) << facts;
+  }
+}
+
 TEST_F(Run, OnlyItsEndStoresHowItEnded) {
   ASSERT_EQ(begin("end"), 0);
   ASSERT_EQ(VornQazStatusUpdate("end", "collect_data"), 0);
@@ -233,8 +244,7 @@ TEST_F(Run, TheStatusCountsTheReportsIncidents) {
   ASSERT_EQ(begin("told"), 0);
   report_format::Facts facts;
   facts.incidents.resize(2);
-  write_file(path("real_path_date") + "/report.json", to_line(facts));
-  publish(kWhole);
+  publish(kWhole, to_line(facts));
   ASSERT_EQ(VornQazStatusUpdate("told", "success"), 0);
   const report_format::RunStatus status = report_format::status_of(status_of("told"));
   EXPECT_EQ(status.report, fs::path(path("real_path_date_final")).filename());

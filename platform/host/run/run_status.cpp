@@ -1,4 +1,5 @@
 // The course of a run: taking its profile, clearing up after it, and its end.
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -15,6 +16,7 @@
 #include "base/text_containers.hpp"
 #include "config/profile.hpp"
 #include "report_format/facts_file.hpp"
+#include "report_format/reports.hpp"
 #include "report_format/run_state.hpp"
 #include "run/old_reports.hpp"
 #include "run/page.hpp"
@@ -61,22 +63,37 @@ std::string name_of(const ReportRun& run) {
   return run.finished.substr(run.finished.rfind('/') + 1);
 }
 
-// What is to be stored of a report run that ends as `word` says. The page is its product: without a
-// whole one there is no success, and no report.
-RunStatus outcome_of(const ReportRun& run, std::string_view word) {
-  const bool is_whole = page_is_complete(run.page.c_str());
-  if (word == report_format::kSuccess && is_whole) {
-    const auto facts = report_format::read_facts(run.finished);
-    const std::size_t incidents = facts ? facts->incidents.size() : 0;
-    return {std::string(word), name_of(run), static_cast<int>(incidents)};
+// Whether the report is on the disk: its page, its facts, and the names that lead to them. What is
+// only in memory when "success" is stored could be gone after a power cut, and the word not.
+bool is_durable(const ReportRun& run) {
+  for (const std::string& path : {run.page, run.finished + "/" + report_format::kFactsFile,
+                                  run.finished, run.finished.substr(0, run.finished.rfind('/'))}) {
+    const Fd opened(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+    if (!opened || fsync(opened.get()) != 0) {
+      log_line("profile \"%s\": %s can't be brought to the disk (%s); see to its volume",
+               run.profile.c_str(), path.c_str(), std::strerror(errno));
+      return false;
+    }
   }
-  if (word == report_format::kSuccess) {
+  return true;
+}
+
+// What is to be stored of a report run that ends as `word` says. The page with its facts is its
+// product: without them there is no success, and no report.
+RunStatus outcome_of(const ReportRun& run, std::string_view word) {
+  const ErrnoKeeper keeper;
+  const bool is_whole = page_is_complete(run.page.c_str());
+  const auto facts = is_whole ? report_format::read_facts(run.finished) : std::nullopt;
+  if (word == report_format::kSuccess && facts && is_durable(run)) {
+    return {std::string(word), name_of(run), static_cast<int>(facts->incidents.size())};
+  }
+  if (word == report_format::kSuccess && !facts) {
     log_line(
         "profile \"%s\": report page %s is missing or cut short, so the run counts as failed; "
         "check the messages above and the free space",
         run.profile.c_str(), run.page.c_str());
   }
-  if (!is_whole) {
+  if (!is_whole || word == report_format::kSuccess) {
     take_back(run);
   }
   return {report_format::kFail, "", 0};

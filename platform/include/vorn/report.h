@@ -36,9 +36,9 @@ int VornQazProfileRunning(const char* profile);
 // Stores the status word of `profile`, atomically: "collect_data", "success" or "fail". Only the
 // holder of the profile can.
 // This is the end of a report run (VornQazInitRealPath with for_report 1), and the only one: of it
-// "success" is stored only when the finished report is complete; otherwise "fail" is stored, one
-// syslog line says why, and what looked like a report is removed. Behind the word the status file
-// tells more (report_format/run_state.hpp).
+// "success" is stored only when the finished report, page and facts, is complete and on the disk;
+// otherwise "fail" is stored, one syslog line says why, and what looked like a report is removed.
+// Behind the word the status file tells more (report_format/run_state.hpp).
 // 0 when the word was stored; 1 when "fail" was, in place of "success"; -1 when nothing could be.
 // After a success the oldest finished reports beyond the profile's key `keep_reports` (a number
 // from 1 on; unset: all are kept) are removed, never the one just made.
