@@ -68,8 +68,7 @@ report_format::VolumeFacts volume_facts(const MeasuredVolume& volume, const RunF
 auto pressure(const report_format::VolumeFacts& volume) {
   constexpr int64_t kNever = INT64_MAX;
   const bool is_full = volume.size != 0 && volume.forecast.state == ForecastState::kFull;
-  return std::tuple(volume.level, is_full,
-                    -volume.forecast.days.value_or(kNever), volume.percent);
+  return std::tuple(volume.level, is_full, -volume.forecast.days.value_or(kNever), volume.percent);
 }
 
 std::vector<report_format::VolumeFacts> volumes_of(const RunFacts& run, const FactsSource& source) {

@@ -50,8 +50,8 @@ std::vector<report_format::Sample> daily_samples(std::vector<report_format::Samp
 // the 14 days before the last sample is told in every state; its date is that of the later sample.
 //
 // `days` is rounded down, `days_low` too, `days_high` up and at most 36500. `window` is 0 for
-// kFull; for kShort it is that of all samples, rounded down, otherwise that of the trend, rounded to
-// the nearest day: the runs of 30 days don't come at the same second.
+// kFull; for kShort it is that of all samples, rounded down, otherwise that of the trend, rounded
+// to the nearest day: the runs of 30 days don't come at the same second.
 report_format::Forecast forecast(std::span<const report_format::Sample> daily, std::uint64_t size,
                                  std::uint64_t free);
 

@@ -23,8 +23,8 @@ std::optional<std::string> report_dir(const char* profile, const VLIBCSzHash& ha
 
 // The statistics database of `profile`.
 std::string statistics_path(const std::string& profile);
-// Removes it with its folder. Only for who holds the profile: a run has its rows there. False after a
-// log line.
+// Removes it with its folder. Only for who holds the profile: a run has its rows there. False after
+// a log line.
 bool remove_statistics(const std::string& profile);
 
 // Opens the folder of a profile's reports, if nobody but this user decides what stands in it; no

@@ -21,16 +21,16 @@ extern "C" {
 // line with file, line and reason; a missing section is not. `*hash` is unchanged on failure.
 int VLIBCFileGetSection(const char* file, const char* section, VLIBCSzHash** hash);
 
-// Rewrites section `section` of `file` so that it holds exactly the entries of `hash`. When `hash` was
-// read from this section, what it has changed since is applied to the section as it is now: what
-// somebody else has changed in between stays.
-// Keys that stay keep their place, keys that `hash` lacks lose their line, new ones follow the last
-// key of the section in sorted order; each is written with `line_format`, which holds "%s" twice
-// (key, value) and ends in "\n". Every other byte of the file is kept, comments inside the section
-// included. The file is replaced atomically (temporary file beside it, fsync, rename, same owner
-// and mode) under a lock against a second writer, for which it waits at most ten seconds.
-// `new_name` must be null (a platform may rename the section with it; this one doesn't).
-// 0; -1 on failure with nothing changed, one syslog line that says why, and VLIBCErrGet set.
+// Rewrites section `section` of `file` so that it holds exactly the entries of `hash`. When `hash`
+// was read from this section, what it has changed since is applied to the section as it is now:
+// what somebody else has changed in between stays. Keys that stay keep their place, keys that
+// `hash` lacks lose their line, new ones follow the last key of the section in sorted order; each
+// is written with `line_format`, which holds "%s" twice (key, value) and ends in "\n". Every other
+// byte of the file is kept, comments inside the section included. The file is replaced atomically
+// (temporary file beside it, fsync, rename, same owner and mode) under a lock against a second
+// writer, for which it waits at most ten seconds. `new_name` must be null (a platform may rename
+// the section with it; this one doesn't). 0; -1 on failure with nothing changed, one syslog line
+// that says why, and VLIBCErrGet set.
 int VLIBCFileSetSection(const char* file, const char* section, const char* new_name,
                         const VLIBCSzHash* hash, const char* line_format);
 
