@@ -90,6 +90,21 @@ class Running(CtlTest):
         self.check(['run', 'global', '--data'], 1, '',
                    r'(.*\n)+vornctl: collecting data .* failed.*')
 
+    def test_a_report_that_lacks_something(self):
+        with self.m.shares.open('a') as file:
+            file.write(f'[gone]\npath = {self.m.base}/gone\n[same]\npath = {self.m.base}/shares/photos\n')
+        page = rf'{self.m.reports}/weekly/[-_\d]*/report\.html\n'
+        self.check(['run', 'weekly'], 3, page, r'shares photos and same hold the same files.*\n'
+                   r'vornctl: share gone is missing .*')
+        entry, = json.loads(self.ctl('status', 'weekly', '--json').out)
+        self.assertEqual((entry['status'], entry['complete'],
+                          sorted((each['kind'], each['what']) for each in entry['incidents'])),
+                         ('success', False, [('share_missing', 'gone'),
+                                             ('share_overlap', 'photos, same')]))
+        self.assertIn('\nincidents = 2\n', (self.m.vorn / 'var/status/weekly').read_text())
+        doctor = self.ctl('doctor').out
+        self.assertIn('share gone is missing', doctor)
+
     def test_failure_tells_what_the_log_says(self):
         logs = self.m.base / 'logs'
         logs.mkdir()
