@@ -1,6 +1,6 @@
 """What must not end in a report, and what a report must survive."""
 
-from expected import data_rows
+from expected import data_rows, facts
 from harness import PROGRAM, SCRIPTS, ProductTest, make_files
 
 PAGE = 4096  # file systems in memory grow by pages
@@ -54,14 +54,16 @@ class Settings(ProductTest):
             for name, path in (('007', '/'), ("it's", '/'), ('relative', 'a/b'), ('gone', '/gone'),
                                ('file', '/etc/hostname'), ('remote', '/proc')):
                 file.write(f'[{name}]\npath = {path}\n')
-        for name, keys, lines in (
-                ('shares', {}, [
+        missing = {('share_missing', name) for name in ('relative', 'gone', 'file', 'remote')}
+        for name, keys, lacking, lines in (
+                ('shares', {}, missing, [
                     '"007" is left out: it is a number', '"it\'s" is left out',
                     '"relative" can\'t be read: its path is not absolute',
                     'Failed to stat [/gone]', 'Failed to stat [/etc/hostname]']),
-                ('lang', {'language': '../../x'}, ['language "../../x" is no code']),
-                ('typo', {'share_list': 'good,god'}, ['share_list names "god"']),
-                ('mail', {'mail_to': 'a@b.c', 'smtp_url': 'smtp://127.0.0.1:1'},
+                ('lang', {'language': '../../x'}, missing, ['language "../../x" is no code']),
+                ('typo', {'share_list': 'good,god'}, {('share_missing', 'god')},
+                 ['share_list names "god"']),
+                ('mail', {'mail_to': 'a@b.c', 'smtp_url': 'smtp://127.0.0.1:1'}, missing,
                  ['send mail failed, profile=mail'])):
             with self.subTest(name):
                 self.m.profile(name, **{'report_list': REPORTS} | keys)
@@ -69,6 +71,9 @@ class Settings(ProductTest):
                 for line in lines:
                     self.assertIn(line, '\n'.join(run.log_lines))
                 self.assertEqual(self.m.status(name), 'success')
+                told = facts(self.m.report_folders(name)[0])
+                self.assertEqual(({(each['kind'], each['what']) for each in told['incidents']},
+                                  told['complete']), (lacking, False))
                 page = (self.m.report_folders(name)[0] / 'report.html').read_text()
                 self.assertIn("\nvar vornLang = 'en';\n", page)
                 row, = data_rows(page, 'vornShareListData')

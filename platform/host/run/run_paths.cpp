@@ -16,6 +16,7 @@
 #include <string_view>
 
 #include "base/host_log.hpp"
+#include "base/incident.hpp"
 #include "base/text_containers.hpp"
 #include "config/config_file.hpp"
 #include "config/profile.hpp"
@@ -91,15 +92,19 @@ ReportRun unused_run(const std::string& profile, const std::string& folder) {
 
 // --- Preparing a report run ---------------------------------------------------------------------
 
-// One line for each name that the profile selects and share.conf lacks: most likely a typing error.
+// One line and an incident for each name that the profile selects and share.conf lacks: most likely
+// a typing error.
 void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
   const char* list = hash.find("share_list");
-  for (const std::string_view name : comma_words(list == nullptr ? "" : list)) {
+  for (const std::string_view word : comma_words(list == nullptr ? "" : list)) {
+    const std::string name(word);
     const std::vector<Share>* shares = all_shares();
     if (shares != nullptr && std::none_of(shares->begin(), shares->end(),
-                                          [name](const Share& s) { return s.name == name; })) {
+                                          [&](const Share& s) { return s.name == name; })) {
       log_line(R"(profile "%s": share_list names "%s", which is no share of %s; correct the name)",
-               profile, std::string(name).c_str(), VORN_PATH_SHARES);
+               profile, name.c_str(), VORN_PATH_SHARES);
+      tell_incident("share_missing", name,
+                    "share_list names " + name + ", which is no share; correct the name");
     }
   }
 }
