@@ -1,6 +1,7 @@
 // Prints, as JSON, what the page's script and the tests must know of reports and facts: the build
 // hands it to them, so that nothing of it is written twice.
 #include <cstdio>
+#include <exception>
 #include <nlohmann/json.hpp>
 
 #include "report_format/attention.hpp"
@@ -48,10 +49,13 @@ Json incidents() {
 
 }  // namespace
 
-int main() {
+int main() try {
   const Json json{{"facts_variable", report_format::kFactsVariable},
                   {"reports", reports()},
                   {"attention", attention()},
                   {"incidents", incidents()}};
   return std::puts(json.dump(1).c_str()) >= 0 && std::fflush(stdout) == 0 ? 0 : 1;
+} catch (const std::exception& error) {
+  std::fprintf(stderr, "%s\n", error.what());
+  return 1;
 }

@@ -130,8 +130,9 @@ int VornQazGetTimeSecond(char* out, size_t size);
 
 // Writes the MD5 digest of the first `size` bytes of the file `path` into `digest`, as 32
 // hexadecimal digits without terminator (`digest_size` must be 32). Follows no link in the last
-// component. 0; 2 when the file vanished, is no regular file any more, has another size or changes
-// while it is read, an expected outcome on a server in use; -1 for any other failure.
+// component. 0; 2 when the file vanished, may not be read, is no regular file any more, has another
+// size or changes while it is read, an expected outcome on a server in use; -1 for any other
+// failure.
 int VornQazGetFileMd5(const char* path, unsigned long long size, char* digest, size_t digest_size);
 
 // Finishes a CSV file: puts a UTF-8 byte order mark before it unless it has one. Atomic; harmless
