@@ -79,6 +79,7 @@ void append_value(std::string& out, const std::string& conversion, Value value) 
     format += length;
     const bool is_long =
         conversion.find("ll") != std::string::npos || conversion.find('z') != std::string::npos;
+    // NOLINTBEGIN(clang-analyzer-valist.Uninitialized): the caller's is
     switch (conversion.back()) {
       case 's':
         append_visible(out, va_arg(args, const char*));
@@ -100,6 +101,7 @@ void append_value(std::string& out, const std::string& conversion, Value value) 
         }
         break;
     }
+    // NOLINTEND(clang-analyzer-valist.Uninitialized)
   }
   errno = error;
   return out;

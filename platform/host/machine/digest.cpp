@@ -80,8 +80,8 @@ Fd open_to_read(const char* path) {
 }
 
 // Whether an open failed since the file isn't what it was: it is gone or a link, a socket or a
-// device now, may not be read, or a client holds it for writing (a lease, which O_NONBLOCK doesn't wait
-// for).
+// device now, may not be read, or a client holds it for writing (a lease, which O_NONBLOCK doesn't
+// wait for).
 constexpr bool means_changed(int error) {
   return error == ENOENT || error == ENOTDIR || error == ELOOP || error == ENXIO ||
          error == ENODEV || error == ESTALE || error == EWOULDBLOCK || error == EACCES ||
