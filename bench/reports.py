@@ -149,7 +149,7 @@ class Bench:
         self.work = Path(work).resolve()
         self.stage = self.work / 'stage'
         formats = json.loads((arguments.build / 'report_format.json').read_text())
-        self.all = ','.join(report['name'] for report in formats['reports'])
+        self.every_report = ','.join(report['name'] for report in formats['reports'])
         subprocess.run(['cmake', '--install', str(arguments.build)], check=True,
                        stdout=subprocess.DEVNULL, env=os.environ | {'DESTDIR': str(self.stage)})
         self.config = self.stage / 'usr/vorn/etc/vornreport.conf'
@@ -200,7 +200,7 @@ class Bench:
         script = ROOT / 'bench/pipelines.sh'
         find, shell, once, report = self.compare(
             lambda: self.timed(*command), lambda: self.timed(script, tree, pipes),
-            lambda: self.timed(script, tree, pipes, 'once'), lambda: self.report(shares, self.all))
+            lambda: self.timed(script, tree, pipes, 'once'), lambda: self.report(shares, self.every_report))
         yield f'find, {self.files} files', find, ''
         yield 'pipelines.sh', shell, f'{shell / find:.2f} x find'
         yield 'pipelines.sh, one list for all', once, f'{once / find:.2f} x find'
@@ -215,7 +215,7 @@ class Bench:
             make_index(folder, ((f'{place}/{name}', name, size, age)
                                 for place, name, size, age, _ in facts(count)), str(count))
             runs.append(lambda folder=folder: self.report(
-                [('rows', folder, folder / 'index.db')], self.all))
+                [('rows', folder, folder / 'index.db')], self.every_report))
         one, ten = self.compare(*runs)
         yield f'all nine reports, {self.files} rows', one, ''
         yield ('ten times the rows', ten,

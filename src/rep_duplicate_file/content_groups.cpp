@@ -29,12 +29,12 @@ RowCounts g_rows;
 
 void count_groups(const QAZLLNode* groups) {
   for (; groups != nullptr; groups = groups->next) {
-    const dup_file_node* first = file_of(groups);
-    for (const dup_file_node* file = first; file != nullptr; file = file->next) {
+    const dup_file_node& first = *file_of(groups);
+    for (const dup_file_node* file = &first; file != nullptr; file = file->next) {
       g_tally.file(file->share_folder, file->path.c_str());
       ++g_rows.rows;
     }
-    g_tally.end_group(first->size);
+    g_tally.end_group(first.size);
   }
 }
 
