@@ -63,13 +63,18 @@ std::string name_of(const ReportRun& run) {
   return run.finished.substr(run.finished.rfind('/') + 1);
 }
 
+// As fsync(). A file system that knows no such thing for folders says so, which is no failure.
+bool bring_to_disk(int fd) {
+  return fsync(fd) == 0 || errno == EINVAL || errno == ENOSYS || errno == EOPNOTSUPP;
+}
+
 // Whether the report is on the disk: its page, its facts, and the names that lead to them. What is
 // only in memory when "success" is stored could be gone after a power cut, and the word not.
 bool is_durable(const ReportRun& run) {
   for (const std::string& path : {run.page, run.finished + "/" + report_format::kFactsFile,
                                   run.finished, run.finished.substr(0, run.finished.rfind('/'))}) {
     const Fd opened(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
-    if (!opened || fsync(opened.get()) != 0) {
+    if (!opened || !bring_to_disk(opened.get())) {
       log_line("profile \"%s\": %s can't be brought to the disk (%s); see to its volume",
                run.profile.c_str(), path.c_str(), std::strerror(errno));
       return false;
