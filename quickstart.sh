@@ -74,7 +74,7 @@ write_configuration() {
     share_name "$folder"
     printf '[%s]\npath = %s\n' "$name" "$folder" >>"$stage/usr/vorn/etc/share.conf"
   done
-  in_sandbox -- /usr/vorn/bin/vornctl profile add "$profile" --report-dir "$report_dir"
+  in_sandbox -- /usr/vorn/bin/vornctl profile add "$profile"
 }
 
 # The product in its place; the machine's own /tmp, so that a folder in it can be reported on.
@@ -85,11 +85,27 @@ in_sandbox() { # [SANDBOX-OPTION...] -- COMMAND...
 # The user who called sudo gets what was made for them.
 give_back() {
   if [[ $EUID -eq 0 && -n ${SUDO_UID-} ]]; then
-    chown -Rh "$SUDO_UID:${SUDO_GID:-$SUDO_UID}" "$root/build" "$report_dir" 2>/dev/null || true
+    chown -Rh "$SUDO_UID:${SUDO_GID:-$SUDO_UID}" "$root/build" 2>/dev/null || true
   fi
   if [[ -n $log_dir ]]; then
     rm -rf "$log_dir"
   fi
+}
+
+# As the user who called sudo: root writes nothing where a user decides what stands in the way.
+as_user() {
+  if [[ $EUID -eq 0 && -n ${SUDO_UID-} ]]; then
+    setpriv --reuid "$SUDO_UID" --regid "${SUDO_GID:-$SUDO_UID}" --clear-groups -- "$@"
+  else
+    "$@"
+  fi
+}
+
+# The product writes reports only where nobody but root does, so the report was made in the stage.
+hand_over() { # REPORT-FOLDER
+  as_user mkdir -p "$report_dir/$profile"
+  tar -C "${1%/*}" --owner 0 --group 0 -cf - "${1##*/}" |
+    as_user tar -C "$report_dir/$profile" --no-same-owner -xf -
 }
 
 # A system log of its own for the run: whatever comes in at the socket goes to a file.
@@ -136,11 +152,7 @@ cmake --build "$build" --parallel "$(nproc)"
 
 echo "== Report"
 rm -rf "$stage"
-mkdir -p "$stage" "$report_dir"
-if [[ $EUID -eq 0 ]]; then
-  # The product writes reports only where nobody else does; an earlier run has given them away.
-  chown -Rh 0:0 "$report_dir"
-fi
+mkdir -p "$stage"
 DESTDIR=$stage cmake --install "$build" >/dev/null
 write_configuration
 start_log
@@ -150,12 +162,13 @@ stop_log
 # Quotas are rare; the page says it when there are none.
 sed '/src\/rep_quota_usage:/d' "$log_dir/lines" >&2
 
-page=''
+made=''
 if [[ $(head -n 1 "$stage/usr/vorn/var/status/$profile" 2>/dev/null) == success ]]; then
-  page=$(find "$report_dir/$profile" -mindepth 2 -maxdepth 2 -name report.html \
-    -newer "$stage/usr/vorn/etc/vornreport.conf" | sort | tail -n 1)
+  made=$(find "$stage/usr/vorn/var/reports/$profile" -mindepth 2 -maxdepth 2 -name report.html)
 fi
-[[ -n $page ]] || fail "the report failed; its log stands above, all its output in $stage/output"
+[[ -n $made ]] || fail "the report failed; its log stands above, all its output in $stage/output"
+hand_over "${made%/*}"
+page=$report_dir/$profile/$(basename "${made%/*}")/report.html
 
 if [[ $(wc -l <"${page%/*}/csv/share_list.csv") -lt 2 ]]; then
   echo "There are no files in these folders." >&2

@@ -27,6 +27,9 @@ std::string status_text(const RunStatus& status) {
     text +=
         "report = " + status.report + "\nincidents = " + std::to_string(status.incidents) + "\n";
   }
+  if (status.mail_failed) {
+    text += "mail = failed\n";
+  }
   return text;
 }
 
@@ -41,6 +44,8 @@ RunStatus status_of(std::string_view text) {
       status.report = *report;
     } else if (const auto count = value_in(line, "incidents")) {
       std::from_chars(count->data(), count->data() + count->size(), status.incidents);
+    } else if (value_in(line, "mail") == "failed") {
+      status.mail_failed = true;
     }
   }
   return status;

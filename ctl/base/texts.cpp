@@ -37,6 +37,10 @@ const char* word_for(admin::RunState state) {
   return "unknown";
 }
 
+std::string unsent_mail(const std::string& profile) {
+  return "the mail of the last report reached nobody; run vornctl profile test-mail " + profile;
+}
+
 const report_format::Texts& english() {
   static const report_format::Texts texts(VORN_PATH_TEMPLATE "/lang", "en");
   return texts;

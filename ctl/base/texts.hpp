@@ -12,6 +12,8 @@
 namespace ctl {
 
 const char* word_for(admin::RunState state);
+// What is said of a profile whose last report's mail reached nobody.
+std::string unsent_mail(const std::string& profile);
 // What reports say, as it stands in their dictionaries.
 const report_format::Texts& english();
 std::string size_text(std::uint64_t bytes);  // "1.5 GiB", as in them

@@ -107,9 +107,6 @@ std::string report_dir_problem(const std::string& value) {
   while (lstat(folder.c_str(), &status) != 0 && folder.has_relative_path()) {
     folder = folder.parent_path();
   }
-  if (stat(folder.c_str(), &status) == 0 && !S_ISDIR(status.st_mode)) {
-    return in_quotes(folder.string()) + " is no folder; name another";
-  }
   if (access(folder.c_str(), W_OK | X_OK) != 0) {
     return in_quotes(folder.string()) + " can't be written (" + std::strerror(errno) +
            "); name a folder that can";

@@ -124,7 +124,11 @@ void check_last_report(Findings& findings, const Section& profile) try {
 void check_last_runs(Findings& findings, const Configuration& configuration) {
   for (const Section& profile : configuration.profiles) {
     const std::string subject = "last run of " + profile.name;
-    const RunState state = admin::last_run(profile.name).state;
+    const admin::LastRun last = admin::last_run(profile.name);
+    const RunState state = last.state;
+    if (last.status.mail_failed) {
+      findings.add(Level::warning, subject, unsent_mail(profile.name));
+    }
     if (state == RunState::failed || state == RunState::ended_early) {
       findings.add(Level::warning, subject, word_for(state),
                    "look into the system log, then run vornctl run " + profile.name);

@@ -16,6 +16,7 @@
 #include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "base/stored_reports.hpp"
+#include "base/texts.hpp"
 #include "report_format/facts_file.hpp"
 #include "report_format/reports.hpp"
 #include "run/commands.hpp"
@@ -197,8 +198,8 @@ bool has_collected(const Section& profile, std::time_t start) {
 }
 
 // Prints the page of the report, and what it lacks to standard error.
-void show_report(const Section& profile, const std::string& report) {
-  const std::string folder = folder_of_reports(profile) + "/" + report;
+void show_report(const Section& profile, const report_format::RunStatus& status) {
+  const std::string folder = folder_of_reports(profile) + "/" + status.report;
   print_line(folder + "/" + report_format::kPageFile);
   const auto facts = report_format::read_facts(folder);
   if (!facts) {
@@ -207,7 +208,10 @@ void show_report(const Section& profile, const std::string& report) {
   for (const report_format::Incident& incident : facts->incidents) {
     warn(incident.text);
   }
-  if (!facts->incidents.empty()) {
+  if (status.mail_failed) {
+    warn(unsent_mail(profile.name));
+  }
+  if (!facts->incidents.empty() || status.mail_failed) {
     throw Failure("", kWithIncidents);
   }
 }
@@ -245,7 +249,7 @@ void run(const Options& options) {
       last.status.report == before) {
     fail_with_log("the run of profile " + profile.name + " failed", log, child, output);
   }
-  show_report(profile, last.status.report);
+  show_report(profile, last.status);
 }
 
 }  // namespace

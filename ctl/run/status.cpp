@@ -29,6 +29,7 @@ struct NextRun {
 struct ProfileStatus {
   std::string name;
   admin::RunState state = admin::RunState::unknown;
+  bool mail_failed = false;
   std::optional<admin::StoredReport> last;
   std::optional<report_format::Facts> facts;  // of that report
   std::optional<NextRun> next;
@@ -59,7 +60,9 @@ void add_report(const Section& profile, ProfileStatus& status) try {
 ProfileStatus status_of(const Section& profile, const std::vector<Job>& jobs, std::time_t now) {
   ProfileStatus status;
   status.name = profile.name;
-  status.state = admin::last_run(profile.name).state;
+  const admin::LastRun last = admin::last_run(profile.name);
+  status.state = last.state;
+  status.mail_failed = last.status.mail_failed;
   status.next = next_of(profile.name, jobs, now);
   add_report(profile, status);
   return status;
@@ -84,10 +87,15 @@ void add_facts(Json& entry, const report_format::Facts& facts) {
 void print_as_json(const std::vector<ProfileStatus>& all) {
   Json array = Json::array();
   for (const ProfileStatus& status : all) {
-    Json entry{{"profile", status.name},     {"status", word_for(status.state)},
-               {"last_report", nullptr},     {"next_run", nullptr},
-               {"complete", nullptr},        {"volume", nullptr},
-               {"incidents", Json(nullptr)}, {"attention", Json(nullptr)}};
+    Json entry{{"profile", status.name},
+               {"status", word_for(status.state)},
+               {"mail_failed", status.mail_failed},
+               {"last_report", nullptr},
+               {"next_run", nullptr},
+               {"complete", nullptr},
+               {"volume", nullptr},
+               {"incidents", Json(nullptr)},
+               {"attention", Json(nullptr)}};
     if (status.last) {
       entry["last_report"] = {{"path", status.last->page},
                               {"made", json_time(status.last->made)},
@@ -123,6 +131,9 @@ std::string outlook_text(const std::optional<report_format::Facts>& facts) {
 
 // What the last reports have to tell, a line each: what they lack, then what needs attention.
 void print_remarks(const ProfileStatus& status) {
+  if (status.mail_failed) {
+    print_line(status.name + ": " + unsent_mail(status.name));
+  }
   if (!status.facts) {
     return;
   }

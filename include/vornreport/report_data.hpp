@@ -18,8 +18,9 @@ PathText report_data_path();
 // or the one report whose CSV file it is.
 enum class Costs : uint8_t { kRun, kReport };
 
-// Opens a file for appending or writing and logs "open file=%s failed" at `module` and `line` when
-// that fails.
+// Opens a file for appending ("a") or writing ("w", "w+") and logs "open file=%s failed" at
+// `module` and `line` when that fails. It is opened below its folder's handle, through no link, and
+// must be a regular file with one name.
 enum class LogForm : uint8_t { kSimple, kNested };
 FileHandle open_report_file(const char* path, const char* mode, const char* module, int line,
                             LogForm form = LogForm::kNested, Costs costs = Costs::kRun);

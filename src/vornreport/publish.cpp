@@ -42,11 +42,15 @@ int publish_report(const char* profile, const VLIBCSzHash* profile_hash) {
   if (VornGetTargetLink(profile_hash, target, link.data(), link.size()) < 0 ||
       is_unset(link.data())) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 131, "create share link failed");
+    if (set_value(profile_hash, "mail_to") != nullptr) {
+      VornQazStatusMailFailed();
+    }
     return 0;
   }
   report_trace(kDriverModule, 134, "get link=%s\n\n", link.data());
   if (VornQazSendReport(profile, link.data(), profile_hash) < 0) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 136, "send mail failed, profile=%s", profile);
+    VornQazStatusMailFailed();
   }
   return 0;
 }

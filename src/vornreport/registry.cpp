@@ -25,24 +25,24 @@
 namespace vornreport {
 namespace {
 
-constexpr ReportEntry entry(const report_format::ReportFormat& format, ReportSource source,
-                            ReportFunction report, CollectFunction collect = nullptr) {
+constexpr ReportEntry entry(const report_format::ReportFormat& format, ReportFunction report,
+                            CollectFunction collect = nullptr) {
+  const ReportSource source = format.of_files ? ReportSource::kStatistics : ReportSource::kSystem;
   ReportEntry made{{}, source, report, collect};
   std::string_view(format.name).copy(made.name, sizeof made.name - 1);
   return made;
 }
 
 constexpr std::array kRegistry{
-    entry(report_format::kQuotaUsage, ReportSource::kSystem, quota_usage),
-    entry(report_format::kFileOwner, ReportSource::kStatistics, file_owner_db),
-    entry(report_format::kVolumeUsage, ReportSource::kSystem, volume_usage,
-          volume_usage_collect_data),
-    entry(report_format::kShareList, ReportSource::kStatistics, share_list_db),
-    entry(report_format::kFileGroup, ReportSource::kStatistics, file_group_db),
-    entry(report_format::kDuplicateFile, ReportSource::kStatistics, duplicate_file),
-    entry(report_format::kLargeFile, ReportSource::kStatistics, large_file_db),
-    entry(report_format::kLeastModify, ReportSource::kStatistics, least_modify_db),
-    entry(report_format::kMostModify, ReportSource::kStatistics, most_modify_db),
+    entry(report_format::kQuotaUsage, quota_usage),
+    entry(report_format::kFileOwner, file_owner_db),
+    entry(report_format::kVolumeUsage, volume_usage, volume_usage_collect_data),
+    entry(report_format::kShareList, share_list_db),
+    entry(report_format::kFileGroup, file_group_db),
+    entry(report_format::kDuplicateFile, duplicate_file),
+    entry(report_format::kLargeFile, large_file_db),
+    entry(report_format::kLeastModify, least_modify_db),
+    entry(report_format::kMostModify, most_modify_db),
 };
 
 // Everyone else goes by the table of formats.

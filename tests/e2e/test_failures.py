@@ -18,7 +18,7 @@ class Settings(ProductTest):
         for name, keys, damage, lines in (
                 ('quote', {'report_dir': "/var/tmp/it's"}, None,
                  ['report_dir "/var/tmp/it\'s" holds a single quote', 'src/vornreport:313 ']),
-                ('file', {'report_dir': '/etc/hostname/x'}, None, [r'can\'t be made \(Not a dir']),
+                ('file', {'report_dir': '/etc/hostname/x'}, None, [r'is no folder \(Not a dir']),
                 ('no reports', {'report_list': ''}, None, ['No report selected', ':366 .*create']),
                 ('no such report', {'report_list': 'no'}, None, ['create template failed']),
                 ('no file', {}, (config, None), [r'vornreport\.conf', 'section=weekly', ':352 ']),
@@ -28,7 +28,7 @@ class Settings(ProductTest):
                 ('no script', {}, (script, None), ['create template failed']),
                 ('bad script', {}, (script, '#!/bin/sh\nexit 1\n'), ['create template failed']),
                 ('empty script', {}, (script, '#!/bin/sh\n'),
-                 ['page .* is missing or cut', 'no link to']),
+                 ['page .* is missing or lacks', 'no link to']),
                 ('no profile', {}, None, ['section=unheard', 'init profile failed']),
                 ('no name', {}, None, [r'"\.\./x" is no profile name', 'init profile failed'])):
             with self.subTest(name):

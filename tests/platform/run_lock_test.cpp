@@ -75,14 +75,16 @@ TEST(Holding, NoChildOfTheHolderHoldsIt) {
   close(ends[1]);
 }
 
-TEST(Holding, AnUnworkableLockFailsTheStatusOnly) {
+TEST(Holding, AnUnworkableLockFailsTheRun) {
   std::filesystem::create_directories(VORN_PATH_STATUS "/.folder.lock");
   std::filesystem::create_symlink("/tmp/victim", VORN_PATH_STATUS "/.linked.lock");
   for (const char* profile : {"linked", "folder"}) {
+    const std::string status = VORN_PATH_STATUS "/" + std::string(profile);
+    support::write_file(status, "success\n");
     EXPECT_EQ(VornQazProfileRunning(profile), 0);
     EXPECT_EQ(VornQazStatusUpdate(profile, "collect_data"), -1);
     EXPECT_EQ(support::syslog_lines().size(), 1U);
-    EXPECT_FALSE(support::exists(VORN_PATH_STATUS "/" + std::string(profile)));
+    EXPECT_EQ(support::read_file(status), "fail\n");
   }
   EXPECT_FALSE(support::exists("/tmp/victim"));
 }

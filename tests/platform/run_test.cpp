@@ -22,7 +22,10 @@ using support::write_file;
 namespace {
 
 constexpr const char* kReports = VORN_PATH_REPORTS;
-constexpr const char* kWhole = "<!DOCTYPE html>\n</html>\n";
+constexpr const char* kWhole =
+    "<!DOCTYPE html>\n<template id=\"data\">\nvar vornLang = 'en';\nvar vornFacts = {};\n"
+    "</template>\n<body data-empty=\"0\">\n<main id=\"report\">\n"
+    "<section data-report=\"share_list\">\n</section>\n</main>\n<script></script>\n</html>\n";
 
 std::string status_of(const std::string& profile) {
   return read_file(VORN_PATH_STATUS "/" + profile);
@@ -98,22 +101,35 @@ TEST_F(Run, RefusesAReportDirThatWouldHurt) {
 }
 
 TEST_F(Run, RefusesAPlantedReportFolder) {
-  for (const char* name : {"elsewhere", "open", "foreign"}) {
+  for (const char* name : {"elsewhere", "open", "group", "foreign"}) {
     fs::create_directory(folder.path(name));
   }
   fs::create_symlink(folder.path("elsewhere"), folder.path("link"));
   write_file(folder.path("file"), "");
   ASSERT_EQ(chmod(folder.path("open").c_str(), 0777), 0);
+  ASSERT_EQ(chmod(folder.path("group").c_str(), 0770), 0);
   if (chown(folder.path("foreign").c_str(), 1234, 0) != 0) {
     chmod(folder.path("foreign").c_str(), 0777);  // only root gives folders away
   }
   hash = support::make_hash({{"report_dir", folder.path()}});
-  for (const char* profile : {"link", "file", "open", "foreign"}) {
+  for (const char* profile : {"link", "file", "open", "group", "foreign"}) {
     SCOPED_TRACE(profile);
     EXPECT_EQ(begin(profile), -1);
     EXPECT_EQ(VornQazReportCleanTmp(profile, hash.get()), -1);
     EXPECT_EQ(syslog_lines().size(), 2U);
   }
+  // Nor below one that others rename; where it is sticky they can't.
+  for (const auto& [name, result] :
+       {std::pair{"open", -1}, {"group", -1}, {"foreign", -1}, {"link", 0}, {"sticky", 0}}) {
+    SCOPED_TRACE(name);
+    fs::create_directory(folder.path("sticky"));
+    ASSERT_EQ(chmod(folder.path("sticky").c_str(), 01777), 0);
+    hash = support::make_hash({{"report_dir", folder.path(name)}});
+    EXPECT_EQ(begin("weekly"), result);
+    EXPECT_EQ(syslog_lines().size(), result == 0 ? 0U : 1U);
+    EXPECT_EQ(fs::exists(folder.path(std::string(name) + "/weekly")), result == 0);
+  }
+  fs::remove_all(folder.path("elsewhere/weekly"));
   EXPECT_TRUE(fs::is_empty(folder.path("elsewhere")) && fs::is_empty(folder.path("open")));
 }
 
@@ -185,16 +201,19 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
 }
 
 TEST_F(Run, SuccessNeedsACompletePage) {
-  const std::pair<const char*, bool> cases[] = {{kWhole, true},
-                                                {"<!DOCTYPE html>\n<p></html>", false},
-                                                {"<!DOCTYPE html>\n</html>\n<p", false},
-                                                {"<p>cut\noff</p>\n</html>\n", false},
-                                                {"", false},
-                                                {nullptr, false}};  // none was made
+  const std::string whole = kWhole;
+  std::vector<std::pair<std::string, bool>> cases{
+      {whole, true}, {whole + "<p", false}, {"", false}, {"none", false}};
+  // Each of its lines is a part.
+  for (std::size_t begins = 0; begins < whole.size(); begins = whole.find('\n', begins) + 1) {
+    std::string page = whole;
+    cases.emplace_back(page.erase(begins, page.find('\n', begins) + 1 - begins), false);
+  }
+  hash = support::make_hash({{"report_list", "share_list"}});
   for (const auto& [page, good] : cases) {
-    SCOPED_TRACE(page == nullptr ? "none" : page);
+    SCOPED_TRACE(page);
     ASSERT_EQ(begin("page"), 0);
-    if (page != nullptr) {
+    if (page != "none") {
       publish(page);
     }
     EXPECT_EQ(VornQazStatusUpdate("page", "success"), good ? 0 : 1);

@@ -32,54 +32,52 @@ TEST(Shares, AreReadWithTheirPathsAndIndexes) {
                       "file_index = /var/i.db\n[badindex]\npath = /b\nfile_index = i.db\n"
                       "[007]\npath = /srv/bond\n[twice]\npath = /1\npath = /2\n"
                       "[none]\n[relative]\npath = srv\n[quote]\npath = /it's\n");
-  EXPECT_TRUE(support::passes_in_child([] {  // since the file is read once
-    const support::List list = support::make_list();
-    VLIBCSzList* filled = list.get();
-    EXPECT_EQ(6, VORNShareEnum(&filled, VORN_SHARE_ENUM_ALL));
-    EXPECT_EQ(
-        (std::vector<std::string>{"photos", "indexed", "badindex", "none", "relative", "quote"}),
-        support::texts(list));
-    EXPECT_EQ(3U, support::syslog_lines().size()) << "one for 007, two for twice";
-    const std::pair<const char*, const char*> paths[] = {{"photos", "/srv/photos"},
-                                                         {"none", ""},
-                                                         {"relative", ""},
-                                                         {"quote", ""},
-                                                         {"007", ""},
-                                                         {"twice", ""},
-                                                         {"unknown", ""}};
-    char path[4096];
-    for (const auto& [share, expected] : paths) {
-      *path = '\0';
-      EXPECT_EQ(*expected == '\0' ? -1 : 0, VORNSharePathGet(share, path, sizeof path)) << share;
-      EXPECT_STREQ(expected, path);
-    }
-    EXPECT_EQ(0, VORNShareFileIndexDBPathGet("indexed", path, sizeof path));
-    EXPECT_STREQ("/var/i.db", path);
-    EXPECT_EQ(-1, VORNShareFileIndexDBPathGet("badindex", path, sizeof path));
-  }));
+  ASSERT_NE(nullptr, host::read_shares());
+  const support::List list = support::make_list();
+  VLIBCSzList* filled = list.get();
+  EXPECT_EQ(6, VORNShareEnum(&filled, VORN_SHARE_ENUM_ALL));
+  EXPECT_EQ(
+      (std::vector<std::string>{"photos", "indexed", "badindex", "none", "relative", "quote"}),
+      support::texts(list));
+  EXPECT_EQ(3U, support::syslog_lines().size()) << "one for 007, two for twice";
+  const std::pair<const char*, const char*> paths[] = {{"photos", "/srv/photos"},
+                                                       {"none", ""},
+                                                       {"relative", ""},
+                                                       {"quote", ""},
+                                                       {"007", ""},
+                                                       {"twice", ""},
+                                                       {"unknown", ""}};
+  char path[4096];
+  for (const auto& [share, expected] : paths) {
+    *path = '\0';
+    EXPECT_EQ(*expected == '\0' ? -1 : 0, VORNSharePathGet(share, path, sizeof path)) << share;
+    EXPECT_STREQ(expected, path);
+  }
+  EXPECT_EQ(0, VORNShareFileIndexDBPathGet("indexed", path, sizeof path));
+  EXPECT_STREQ("/var/i.db", path);
+  EXPECT_EQ(-1, VORNShareFileIndexDBPathGet("badindex", path, sizeof path));
 }
 
 TEST(Shares, AreWalkedOnTheNetworkWhenTheySaySo) {
   support::write_file(VORN_PATH_SHARES,
                       "[nas]\npath = /mnt/nas\nnetwork = Yes\n[local]\npath = /mnt\nnetwork = no\n"
                       "[odd]\npath = /mnt/nas\nnetwork = 1\n[all]\npath = /\nnetwork = yes\n");
-  EXPECT_TRUE(support::passes_in_child([] {  // since the file is read once
-    EXPECT_EQ(VORN_FS_REMOTE, host::kind_in_walk(VORN_FS_REMOTE, "/mnt/nas")) << "no share yet";
-    const struct {
-      const char* share;
-      const char* path;
-      bool is_walked;
-    } cases[] = {{"nas", "/mnt/nas", true},   {"nas", "/mnt/nas/deep", true},
-                 {"nas", "/mnt/nas2", false}, {"local", "/mnt/nas", false},
-                 {"odd", "/mnt/nas", false},  {"all", "/mnt/nas", true}};
-    char path[4096];
-    for (const auto& [share, asked, is_walked] : cases) {
-      EXPECT_EQ(0, VORNSharePathGet(share, path, sizeof path));
-      EXPECT_EQ(is_walked, host::is_walked(host::kind_in_walk(VORN_FS_REMOTE, asked))) << asked;
-      EXPECT_EQ(VORN_FS_OTHER, host::kind_in_walk(VORN_FS_OTHER, asked));
-    }
-    EXPECT_NE(std::string::npos, support::syslog_text().find("neither yes nor no"));
-  }));
+  ASSERT_NE(nullptr, host::read_shares());
+  EXPECT_EQ(VORN_FS_REMOTE, host::kind_in_walk(VORN_FS_REMOTE, "/mnt/nas")) << "no share yet";
+  const struct {
+    const char* share;
+    const char* path;
+    bool is_walked;
+  } cases[] = {{"nas", "/mnt/nas", true},   {"nas", "/mnt/nas/deep", true},
+               {"nas", "/mnt/nas2", false}, {"local", "/mnt/nas", false},
+               {"odd", "/mnt/nas", false},  {"all", "/mnt/nas", true}};
+  char path[4096];
+  for (const auto& [share, asked, is_walked] : cases) {
+    EXPECT_EQ(0, VORNSharePathGet(share, path, sizeof path));
+    EXPECT_EQ(is_walked, host::is_walked(host::kind_in_walk(VORN_FS_REMOTE, asked))) << asked;
+    EXPECT_EQ(VORN_FS_OTHER, host::kind_in_walk(VORN_FS_OTHER, asked));
+  }
+  EXPECT_NE(std::string::npos, support::syslog_text().find("neither yes nor no"));
 }
 
 TEST(MatchShare, ReadsTheListAsNames) {

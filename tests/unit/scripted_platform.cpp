@@ -260,6 +260,8 @@ int VornQazProgressUpdate(const char* /*profile*/, const char* text) {
   return 0;
 }
 
+void VornQazStatusMailFailed(void) {}
+
 void VornQazProgressEnd(const char* profile) {
   platform.progress.push_back(std::string("end ") + profile);
 }

@@ -78,7 +78,12 @@ std::optional<std::string> link_to(const Section& profile, const std::string& pa
 }
 
 std::string report_dir_problem(const std::string& value) {
-  return text_or_empty(host::report_dir_error(value));
+  const char* error = host::report_dir_error(value);
+  if (error != nullptr) {
+    return error;
+  }
+  const std::string problem = host::report_dir_problem(value);
+  return problem.empty() ? "" : "can't be used: " + problem;
 }
 
 std::string link_base_problem(const std::string& value) {

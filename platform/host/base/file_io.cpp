@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <cctype>
 #include <cerrno>
 #include <cstdlib>
 #include <filesystem>
@@ -11,6 +12,8 @@
 
 namespace host {
 namespace {
+
+constexpr std::size_t kRandomLetters = 6;  // as many as mkostemp puts in
 
 Fd open_regular_with(int folder, const char* name, int flags) {
   Fd fd(openat(folder, name, O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
@@ -77,7 +80,8 @@ bool write_all(int fd, std::string_view text) {
 
 AtomicFile::AtomicFile(std::string path) : path_(std::move(path)) {
   const std::size_t slash = path_.rfind('/') + 1;  // 0 without a slash: npos wraps around
-  temporary_ = path_.substr(0, slash) + "." + path_.substr(slash) + ".XXXXXX";
+  temporary_ =
+      path_.substr(0, slash) + "." + path_.substr(slash) + "." + std::string(kRandomLetters, 'X');
   fd_ = Fd(mkostemp(temporary_.data(), O_CLOEXEC));
   if (!fd_) {
     temporary_.clear();
@@ -88,6 +92,25 @@ AtomicFile::~AtomicFile() {
   if (!temporary_.empty()) {
     const ErrnoKeeper keeper;
     unlink(temporary_.c_str());
+  }
+}
+
+void AtomicFile::remove_leftovers(const std::string& path) {
+  const ErrnoKeeper keeper;
+  const std::size_t slash = path.rfind('/') + 1;
+  const std::string beginning = "." + path.substr(slash) + ".";
+  const auto is_leftover = [&](const std::string& name) {
+    return name.size() == beginning.size() + kRandomLetters && name.starts_with(beginning) &&
+           std::all_of(name.begin() + static_cast<std::ptrdiff_t>(beginning.size()), name.end(),
+                       [](unsigned char c) { return std::isalnum(c) != 0; });
+  };
+  std::error_code error;
+  for (std::filesystem::directory_iterator entry(slash > 0 ? path.substr(0, slash) : ".", error),
+       end;
+       !error && entry != end; entry.increment(error)) {
+    if (is_leftover(entry->path().filename()) && entry->is_regular_file(error)) {
+      unlink(entry->path().c_str());
+    }
   }
 }
 

@@ -221,12 +221,12 @@ int VornQazCsvFile(const char* path) try {
     return -1;
   }
   char start[3];
-  if (pread(original.get(), start, sizeof start, 0) == sizeof start &&
-      std::string_view(start, sizeof start) == kMark) {
+  const ssize_t got = pread(original.get(), start, sizeof start, 0);
+  if (got == sizeof start && std::string_view(start, sizeof start) == kMark) {
     return 0;
   }
   host::AtomicFile marked(path);
-  if (marked.fd() < 0 || fchmod(marked.fd(), status.st_mode & 0777U) != 0 ||
+  if (got < 0 || marked.fd() < 0 || fchmod(marked.fd(), status.st_mode & 0777U) != 0 ||
       !host::write_all(marked.fd(), kMark) || !host::copy_file(original.get(), marked.fd()) ||
       !marked.commit()) {
     const int error = errno;

@@ -14,6 +14,9 @@ std::optional<std::string> read_config(const char* file);
 // Whether `file` can be read; one log line when it can't.
 bool config_is_readable(const char* file);
 
+// Removes what killed writers of `file` have left beside it, unless one is at work.
+void remove_unfinished_rewrites(const char* file);
+
 // Puts in the place of `file` what `change` makes of its text: atomically, with the same owner and
 // mode, under a lock against a second writer, for which it waits at most ten seconds. A link to the
 // file stays. 0; -1 on failure with nothing changed, one log line, and VLIBCErrGet set. `change`

@@ -28,14 +28,24 @@ const char* remedy(int error) {
   return error == EACCES || error == EPERM ? "; do this as root" : "";
 }
 
+std::string resolved(const char* file) {
+  const std::unique_ptr<char, decltype(&std::free)> real(realpath(file, nullptr), &std::free);
+  return real ? real.get() : file;
+}
+
+Fd open_lock(const std::string& file, std::string& path) {
+  const std::size_t slash = file.rfind('/') + 1;
+  path = file.substr(0, slash) + "." + file.substr(slash) + ".lock";
+  return Fd(open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
+}
+
 // Taken beside the file, because the file itself is replaced; never removed, because a writer that
 // waits on a removed lock file would not keep out one that made it anew.
 Fd lock_beside(const std::string& file) {
   constexpr std::chrono::milliseconds kPause{20};
   constexpr std::chrono::seconds kLongestWait{10};
-  const std::size_t slash = file.rfind('/') + 1;
-  const std::string path = file.substr(0, slash) + "." + file.substr(slash) + ".lock";
-  Fd lock(open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
+  std::string path;
+  Fd lock = open_lock(file, path);
   if (!lock) {
     log_line("%s can't be changed: lock file %s can't be opened (%s)%s", file.c_str(), path.c_str(),
              std::strerror(errno), remedy(errno));
@@ -90,11 +100,20 @@ bool replace(const std::string& file, std::string_view text) {
 
 }  // namespace
 
+void remove_unfinished_rewrites(const char* file) {
+  const ErrnoKeeper keeper;
+  const std::string target = resolved(file);
+  std::string path;
+  const Fd lock = open_lock(target, path);
+  if (lock && flock(lock.get(), LOCK_EX | LOCK_NB) == 0) {
+    AtomicFile::remove_leftovers(target);
+  }
+}
+
 int rewrite_config(const char* file, const TextChange& change) {
   const int saved_errno = errno;
   // An administrator's link to the file stays; what it leads to is what gets replaced.
-  const std::unique_ptr<char, decltype(&std::free)> resolved(realpath(file, nullptr), &std::free);
-  const std::string target = resolved ? resolved.get() : file;
+  const std::string target = resolved(file);
   const Fd lock = lock_beside(target);
   if (!lock) {
     return -1;

@@ -9,6 +9,7 @@
 #include <unordered_set>
 
 #include "base/host_log.hpp"
+#include "base/silence.hpp"
 #include "base/text_containers.hpp"
 #include "vorn/base/utf8.hpp"
 #include "vorn/base/words.hpp"
@@ -82,6 +83,11 @@ Share make_share(const std::string& name, const VLIBCSzHash& section, const char
     share.file_index = index;
   }
   return share;
+}
+
+std::optional<std::vector<Share>>& known_shares() {
+  static std::optional<std::vector<Share>> shares;
+  return shares;
 }
 
 // The share whose folder was asked for last: a run walks one share after another, and asks for each
@@ -197,8 +203,17 @@ bool is_in_network_share(std::string_view path) {
 }
 
 const std::vector<Share>* all_shares() {
-  static const std::optional<std::vector<Share>> shares = load_shares(VORN_PATH_SHARES);
+  std::optional<std::vector<Share>>& shares = known_shares();
+  if (!shares) {
+    shares = load_shares(VORN_PATH_SHARES);
+  }
   return shares ? &*shares : nullptr;
+}
+
+const std::vector<Share>* read_shares() {
+  share_in_walk() = nullptr;
+  known_shares().reset();
+  return all_shares();
 }
 
 }  // namespace host
@@ -233,6 +248,14 @@ int VORNSharePathGet(const char* share, char* path, size_t size) try {
     host::log_line("share \"%s\" can't be read: %s in %s", share, found->path_error.c_str(),
                    VORN_PATH_SHARES);
     errno = EINVAL;
+    return -1;
+  }
+  if (host::is_silent(found->path)) {
+    host::log_line(
+        "share \"%s\" can't be read: %s doesn't answer; see to the server or daemon behind its "
+        "mount",
+        share, found->path.c_str());
+    errno = ETIMEDOUT;
     return -1;
   }
   host::share_in_walk() = found;

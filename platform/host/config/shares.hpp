@@ -31,8 +31,10 @@ std::optional<std::vector<Share>> load_shares(const char* file);
 // and that share is walked on network file systems too.
 bool is_in_network_share(std::string_view path);
 
-// The server's shares, read once in the life of the process; null when that failed.
+// The server's shares, read the first time somebody asks; null when that failed.
 const std::vector<Share>* all_shares();
+// The same, read anew; what was handed out before is gone.
+const std::vector<Share>* read_shares();
 
 }  // namespace host
 

@@ -17,6 +17,7 @@
 #include "base/text_containers.hpp"
 #include "report_format/reports.hpp"
 #include "run/page.hpp"
+#include "run/run_paths.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
@@ -91,7 +92,12 @@ void open_report_to_group(const std::string& page) {
 }
 
 int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size_t size) {
-  if (!host::page_is_complete(target_file)) {
+  // Of the run that is being made every part is looked at; older ones were found whole.
+  const std::optional<host::ReportRun>& run = host::report_run();
+  const bool is_complete = run && run->page == target_file
+                               ? host::page_is_whole(target_file, run->report_list)
+                               : host::page_is_complete(target_file);
+  if (!is_complete) {
     host::log_line("no link to \"%s\": it is no complete report page; see the errors of this run",
                    target_file);
     errno = ENOENT;

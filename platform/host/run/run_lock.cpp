@@ -5,22 +5,17 @@
 // killed run doesn't block the next one. Its one trap is that closing *any* descriptor of the file
 // drops the lock, so this process opens the file of a profile that it holds exactly once.
 //
-// The file's content is the holder's process id. It is only read by the next holder, to know which
-// names in /tmp a killed run has left.
+// The file's content is the holder's process id, for whoever asks.
 #include "run/run_lock.hpp"
 
 #include <fcntl.h>
 #include <unistd.h>
 
-#include <array>
 #include <cerrno>
-#include <charconv>
-#include <csignal>
 #include <cstring>
 #include <utility>
 
 #include "base/host_log.hpp"
-#include "run/run_temporary.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
@@ -49,31 +44,12 @@ struct flock whole_file() {
   return range;
 }
 
-pid_t stored_pid(int fd) {
-  std::array<char, 16> text{};
-  const ssize_t size = pread(fd, text.data(), text.size(), 0);
-  pid_t pid = 0;
-  if (size > 0) {
-    std::from_chars(text.data(), text.data() + size, pid);
-  }
-  return pid;
-}
-
-bool alive(pid_t pid) {
-  return kill(pid, 0) == 0 || errno != ESRCH;
-}
-
-// Leaves this process's id for the next holder and clears up after the last one. A process id that
-// is in use again belongs to somebody else's run by now, so its names stay.
-void succeed_last_holder(int fd) {
+// Leaves this process's id for whoever asks who it is.
+void note_holder(int fd) {
   const ErrnoKeeper keeper;
-  const pid_t last = stored_pid(fd);
-  if (last > 0 && last != getpid() && !alive(last)) {
-    remove_temporary_names(last);
-  }
   const std::string id = std::to_string(getpid()) + "\n";
   if (ftruncate(fd, 0) != 0 || pwrite(fd, id.data(), id.size(), 0) < 0) {
-    // The lock holds all the same; only names in /tmp may stay behind if this run is killed.
+    // The lock holds all the same.
     log_line("can't note this run in %s (%s); free some space", VORN_PATH_STATUS,
              std::strerror(errno));
   }
@@ -92,7 +68,7 @@ TakeResult take_profile(const std::string& profile) {
   }
   struct flock range = whole_file();
   if (file && fcntl(file.get(), F_SETLK, &range) == 0) {
-    succeed_last_holder(file.get());
+    note_holder(file.get());
     held() = {profile, getpid(), std::move(file)};
     return TakeResult::taken;
   }

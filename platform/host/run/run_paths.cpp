@@ -17,10 +17,13 @@
 
 #include "base/host_log.hpp"
 #include "base/incident.hpp"
+#include "base/silence.hpp"
 #include "base/text_containers.hpp"
+#include "base/trusted_folder.hpp"
 #include "config/config_file.hpp"
 #include "config/profile.hpp"
 #include "config/shares.hpp"
+#include "report_format/reports.hpp"
 #include "run/old_reports.hpp"
 #include "run/run_lock.hpp"
 #include "run/run_temporary.hpp"
@@ -41,19 +44,13 @@ struct CloseDir {
 
 // --- The profile's own folder -------------------------------------------------------------------
 
-bool make_report_folder(const std::string& dir, const std::string& folder) {
-  const int saved_errno = errno;
-  if (!make_folders(dir.empty() ? "/" : dir) ||
-      (mkdir(folder.c_str(), 0777) != 0 && errno != EEXIST)) {
-    log_line("report folder %s can't be made (%s); make the folder above it writable",
-             folder.c_str(), std::strerror(errno));
-    return false;
+// One line when the folder can't be used; an absent one is silent.
+Fd tell_unusable(const std::string& folder, TrustedFolder opened) {
+  if (!opened.problem.empty()) {
+    const ErrnoKeeper keeper;
+    log_line("report folder %s can't be used: %s", folder.c_str(), opened.problem.c_str());
   }
-  if (!open_report_folder(folder)) {
-    return false;
-  }
-  errno = saved_errno;
-  return true;
+  return std::move(opened.folder);
 }
 
 // --- The run's own folder -----------------------------------------------------------------------
@@ -109,9 +106,14 @@ void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
   }
 }
 
-// Removes the reports that a killed run of the profile has begun. Nothing here is fatal: the new
-// run's names are unused ones.
-void remove_leftovers(const std::string& folder) {
+// Removes what killed processes have left: the reports that a run of the profile has begun, and
+// files that were about to take another's place. Nothing here is fatal: the new run's names are
+// unused ones.
+void remove_leftovers(const std::string& profile, const std::string& folder) {
+  AtomicFile::remove_leftovers(VORN_PATH_STATUS "/" + profile);
+  remove_unfinished_rewrites(VORN_PATH_CONFIG);
+  remove_unfinished_rewrites(VORN_PATH_SHARES);
+  remove_dead_names();
   for (const std::string& left : unfinished_reports(folder).value_or(std::vector<std::string>{})) {
     if (!remove_tree(left)) {
       log_line("unfinished report %s can't be removed (%s); remove it by hand", left.c_str(),
@@ -131,8 +133,10 @@ bool prepare(const ReportRun& run) {
   if (!claim_temporary_names()) {
     return false;
   }
-  if (mkdir(run.unfinished.c_str(), 0777) == 0 &&
-      mkdir((run.unfinished + "/csv").c_str(), 0777) == 0 && make_statistics_folder(run.profile)) {
+  // Not more: a default access control list of the folder above would be given it.
+  constexpr mode_t kMode = 0750;
+  if (mkdir(run.unfinished.c_str(), kMode) == 0 &&
+      mkdir((run.unfinished + "/csv").c_str(), kMode) == 0 && make_statistics_folder(run.profile)) {
     return true;
   }
   log_line("profile \"%s\": the folders of a run, %s and %s, can't be made (%s); free some space",
@@ -143,23 +147,51 @@ bool prepare(const ReportRun& run) {
   return false;
 }
 
+// Without any share the report would be empty, and look like a good one. Every later look at the
+// shares is at those that are read here.
+bool has_shares_to_report(const VLIBCSzHash& hash) {
+  const std::vector<Share>* shares = read_shares();
+  if (shares == nullptr) {
+    return false;
+  }
+  const char* list = hash.find("report_list");
+  const auto& reports = report_format::kReports;
+  const bool needs_shares =
+      list != nullptr && std::any_of(reports.begin(), reports.end(), [list](const auto* report) {
+        return report->of_files && report_format::is_selected(report->name, list);
+      });
+  if (needs_shares && shares->empty()) {
+    log_line("%s holds no share that can be used; add one with vornctl share add NAME FOLDER",
+             VORN_PATH_SHARES);
+    errno = ENOENT;
+    return false;
+  }
+  return true;
+}
+
 std::optional<ReportRun> begin_report_run(const char* profile, const VLIBCSzHash& hash,
-                                          const std::string& dir, const std::string& folder) {
+                                          const std::string& folder) {
   if (!holds_profile(profile)) {
     log_line(R"(profile "%s" is not held by this process, so it can't run it)", profile);
     errno = ENOLCK;
     return std::nullopt;
   }
-  // Without any share the report would be empty, and look like a good one.
-  if (!config_is_readable(VORN_PATH_SHARES) || !make_report_folder(dir, folder)) {
+  if (is_silent(folder)) {
+    log_line("report folder %s doesn't answer; see to the server or daemon behind its mount",
+             folder.c_str());
     return std::nullopt;
   }
-  remove_leftovers(folder);
+  if (!has_shares_to_report(hash) || !tell_unusable(folder, open_trusted(folder, Missing::made))) {
+    return std::nullopt;
+  }
+  remove_leftovers(profile, folder);
   ReportRun run = unused_run(profile, folder);
   if (!prepare(run)) {
     return std::nullopt;
   }
   warn_of_unknown_shares(profile, hash);
+  const char* report_list = hash.find("report_list");
+  run.report_list = report_list == nullptr ? "" : report_list;
   run.keep = reports_to_keep(profile, hash);
   return run;
 }
@@ -172,7 +204,7 @@ int init_paths(const char* profile, VLIBCSzHash& hash, bool for_report) {
   const std::string folder = *dir + "/" + profile;
   ReportRun run;
   if (for_report) {
-    report_run() = begin_report_run(profile, hash, *dir, folder);
+    report_run() = begin_report_run(profile, hash, folder);
     if (!report_run()) {
       return -1;
     }
@@ -193,23 +225,13 @@ int init_paths(const char* profile, VLIBCSzHash& hash, bool for_report) {
 }  // namespace
 
 Fd open_report_folder(const std::string& folder) {
-  Fd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-  struct stat status {};
-  if (!opened || fstat(opened.get(), &status) != 0) {
-    if (errno != ENOENT) {
-      const bool replaced = errno == ELOOP || errno == ENOTDIR;
-      log_line("report folder %s can't be used (%s); move it away", folder.c_str(),
-               replaced ? "it is a link or a file" : std::strerror(errno));
-    }
-    return {};
-  }
-  if (status.st_uid != geteuid() || (status.st_mode & S_IWOTH) != 0) {
-    log_line("report folder %s belongs to another user or is writable by everyone; move it away",
-             folder.c_str());
-    errno = EPERM;
-    return {};
-  }
-  return opened;
+  return tell_unusable(folder, open_trusted(folder, Missing::refused));
+}
+
+std::string report_dir_problem(const std::string& dir) {
+  const ErrnoKeeper keeper;
+  // As the folder above one; no profile's reports have this name.
+  return open_trusted(dir + "/global", Missing::refused).problem;
 }
 
 const char* report_dir_error(std::string_view dir) {

@@ -27,9 +27,12 @@ std::string statistics_path(const std::string& profile);
 // a log line.
 bool remove_statistics(const std::string& profile);
 
-// Opens the folder of a profile's reports, if nobody but this user decides what stands in it; no
-// descriptor and a log line otherwise. An absent one is silent, with ENOENT.
+// Opens the folder of a profile's reports, if nobody but root decides what stands in it and above
+// it (base/trusted_folder.hpp); no descriptor and a log line otherwise. An absent one is silent,
+// with ENOENT.
 Fd open_report_folder(const std::string& folder);
+// What keeps `dir` from having such folders, with a remedy; empty when nothing does.
+std::string report_dir_problem(const std::string& dir);
 // The names in an open folder, "." and ".." left out; those up to where it couldn't be read on.
 std::vector<std::string> entries_of(const Fd& folder);
 // The name that a report has while it isn't finished, by the name that it gets.
@@ -42,10 +45,12 @@ std::optional<std::vector<std::string>> unfinished_reports(const std::string& fo
 // The report run that this process is in the middle of.
 struct ReportRun {
   std::string profile;
-  std::string unfinished;  // real_path_date
-  std::string finished;    // real_path_date_final
-  std::string page;        // real_path_report_final
-  std::size_t keep = 0;    // reports that the profile keeps; 0: all
+  std::string unfinished;     // real_path_date
+  std::string finished;       // real_path_date_final
+  std::string page;           // real_path_report_final
+  std::string report_list{};  // of the profile
+  std::size_t keep = 0;       // reports that the profile keeps; 0: all
+  bool mail_failed = false;
 };
 
 std::optional<ReportRun>& report_run();

@@ -59,6 +59,15 @@ void take_back(const ReportRun& run) {
   }
 }
 
+// A run that couldn't take its profile comes to nothing, and the word of the one before must not
+// stand for it.
+void tell_unlocked(const std::string& profile) {
+  const ErrnoKeeper keeper;
+  if (!store_status(profile, {.word = report_format::kFail})) {
+    unlink((VORN_PATH_STATUS "/" + profile).c_str());
+  }
+}
+
 std::string name_of(const ReportRun& run) {
   return run.finished.substr(run.finished.rfind('/') + 1);
 }
@@ -87,21 +96,22 @@ bool is_durable(const ReportRun& run) {
 // product: without them there is no success, and no report.
 RunStatus outcome_of(const ReportRun& run, std::string_view word) {
   const ErrnoKeeper keeper;
-  const bool is_whole = page_is_complete(run.page.c_str());
+  const bool is_whole = page_is_whole(run.page.c_str(), run.report_list);
   const auto facts = is_whole ? report_format::read_facts(run.finished) : std::nullopt;
   if (word == report_format::kSuccess && facts && is_durable(run)) {
-    return {std::string(word), name_of(run), static_cast<int>(facts->incidents.size())};
+    return {std::string(word), name_of(run), static_cast<int>(facts->incidents.size()),
+            run.mail_failed};
   }
   if (word == report_format::kSuccess && !facts) {
     log_line(
-        "profile \"%s\": report page %s is missing or cut short, so the run counts as failed; "
+        "profile \"%s\": report page %s is missing or lacks a part, so the run counts as failed; "
         "check the messages above and the free space",
         run.profile.c_str(), run.page.c_str());
   }
   if (!is_whole || word == report_format::kSuccess) {
     take_back(run);
   }
-  return {report_format::kFail, "", 0};
+  return {.word = report_format::kFail};
 }
 
 // As VornQazStatusUpdate.
@@ -121,7 +131,7 @@ int update_status(const std::string& profile, std::string_view word) {
   if (word != kCollecting && report_run() && report_run()->profile == profile) {
     ended.swap(report_run());
   }
-  const RunStatus status = ended ? outcome_of(*ended, word) : RunStatus{std::string(word), "", 0};
+  const RunStatus status = ended ? outcome_of(*ended, word) : RunStatus{.word = std::string(word)};
   if (!store_status(profile, status)) {
     return -1;
   }
@@ -166,7 +176,11 @@ int VornQazProfileRunning(const char* profile) {
     return 0;
   }
   try {
-    return host::take_profile(profile) == host::TakeResult::busy ? 1 : 0;
+    const host::TakeResult taken = host::take_profile(profile);
+    if (taken == host::TakeResult::failed) {
+      host::tell_unlocked(profile);
+    }
+    return taken == host::TakeResult::busy ? 1 : 0;
   } catch (const std::exception&) {
     return 1;  // without a lock nothing may run
   }
@@ -180,6 +194,12 @@ int VornQazStatusUpdate(const char* profile, const char* status) {
     return host::update_status(profile, status);
   } catch (const std::exception&) {
     return -1;
+  }
+}
+
+void VornQazStatusMailFailed(void) {
+  if (host::report_run()) {
+    host::report_run()->mail_failed = true;
   }
 }
 

@@ -4,12 +4,18 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
+#include <charconv>
+#include <csignal>
 #include <cstdio>
 #include <cstring>
+#include <random>
+#include <string>
 
 #include "base/host_log.hpp"
+#include "run/run_paths.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
@@ -27,8 +33,27 @@ std::array<Name, 3> temporary_names(pid_t pid) {
   return names;
 }
 
+// Anybody may have made a folder there, which isn't ours to remove. False with errno.
+bool move_aside(const char* path) {
+  std::random_device random;
+  for (;;) {
+    const std::string aside = std::string(path) + ".aside-" + std::to_string(random());
+    if (renameat2(AT_FDCWD, path, AT_FDCWD, aside.c_str(), RENAME_NOREPLACE) == 0) {
+      log_line("%s was a folder in the way of this run; it is %s now", path, aside.c_str());
+      return true;
+    }
+    if (errno != EEXIST) {
+      return false;
+    }
+  }
+}
+
+bool is_alive(pid_t pid) {
+  return kill(pid, 0) == 0 || errno != ESRCH;
+}
+
 bool claim(const char* path) {
-  if (unlink(path) != 0 && errno != ENOENT) {
+  if (unlink(path) != 0 && errno != ENOENT && (errno != EISDIR || !move_aside(path))) {
     log_line("%s is in the way and can't be removed (%s); remove it by hand", path,
              std::strerror(errno));
     return false;
@@ -71,6 +96,26 @@ void remove_temporary_names(pid_t pid) {
   const ErrnoKeeper keeper;
   for (const Name& name : temporary_names(pid)) {
     unlink(name.data());
+  }
+}
+
+void remove_dead_names() {
+  const ErrnoKeeper keeper;
+  const Fd folder(open("/tmp", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  for (const std::string& name : entries_of(folder)) {
+    // A number that is in use again belongs to somebody else's run by now, so its names stay.
+    pid_t pid = 0;
+    const char* number = name.data() + name.rfind('.') + 1;
+    std::from_chars(number, name.data() + name.size(), pid);
+    const auto names = temporary_names(pid);
+    struct stat status {};
+    if (pid > 0 && !is_alive(pid) &&
+        std::any_of(names.begin(), names.end(),
+                    [&](const Name& own) { return own.data() == "/tmp/" + name; }) &&
+        fstatat(folder.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+        S_ISREG(status.st_mode) && status.st_uid == geteuid()) {
+      unlinkat(folder.get(), name.c_str(), 0);
+    }
   }
 }
 

@@ -14,6 +14,9 @@ namespace host {
 // that only its owner writes to; any other kind of /tmp is refused.
 bool claim_temporary_names();
 
+// Removes this user's names of processes that are no more.
+void remove_dead_names();
+
 // Removes the names of process `pid`.
 void remove_temporary_names(pid_t pid);
 

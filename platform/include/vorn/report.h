@@ -44,6 +44,9 @@ int VornQazProfileRunning(const char* profile);
 // from 1 on; unset: all are kept) are removed, never the one just made.
 int VornQazStatusUpdate(const char* profile, const char* status);
 
+// Notes that the mail of the report run in progress reached nobody; its status will tell it.
+void VornQazStatusMailFailed(void);
+
 // Adds to `*hash` the paths that don't depend on a profile: `real_path_base`, `real_path_stat_db`.
 // `flags` must be 0. 0 or -1.
 int VornQazInitLocation(VLIBCSzHash** hash, int flags);

@@ -24,12 +24,14 @@ struct ReportFormat {
   std::uint64_t csv_limit;   // 0: none
   LimitOf limit_of = LimitOf::kRows;
   bool has_csv_rows = true;  // whether its rows stand in csv/<name>.csv
+  bool of_files = true;      // whether it is made of what gathering finds in the shares
 };
 
 inline constexpr ReportFormat kQuotaUsage{
-    "quota_usage", "vornQuotaUsageTable", 4, 100, 0, LimitOf::kRowsOfTable, false};
+    "quota_usage", "vornQuotaUsageTable", 4, 100, 0, LimitOf::kRowsOfTable, false, false};
 inline constexpr ReportFormat kFileOwner{"file_owner", "vornFileOwnerData", 4, 0, 0};
-inline constexpr ReportFormat kVolumeUsage{"volume_usage", "vornVolumeUsageData", 5, 0, 0};
+inline constexpr ReportFormat kVolumeUsage{
+    "volume_usage", "vornVolumeUsageData", 5, 0, 0, LimitOf::kRows, true, false};
 inline constexpr ReportFormat kShareList{"share_list", "vornShareListData", 3, 0, 0};
 inline constexpr ReportFormat kFileGroup{"file_group", "vornFileGroupTableData", 3,    100,
                                          10000,        LimitOf::kRows,           false};

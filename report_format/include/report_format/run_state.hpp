@@ -20,8 +20,9 @@ inline constexpr const char* kFail = "fail";
 // Behind it stand "key = value" lines; a reader leaves keys aside that it doesn't know.
 struct RunStatus {
   std::string word;
-  std::string report;  // folder name of the finished report; only of kSuccess
-  int incidents = 0;   // that the report tells
+  std::string report{};      // folder name of the finished report; only of kSuccess
+  int incidents = 0;         // that the report tells
+  bool mail_failed = false;  // its mail reached nobody
 };
 std::string status_text(const RunStatus& status);
 RunStatus status_of(std::string_view text);

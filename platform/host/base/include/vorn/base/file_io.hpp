@@ -77,6 +77,10 @@ class AtomicFile {
   ~AtomicFile();
 
   int fd() const { return fd_.get(); }
+  // Removes what killed processes have left of such files for `path`. Only for who keeps others
+  // from writing one meanwhile.
+  static void remove_leftovers(const std::string& path);
+
   // Flushes to disk and renames. False with errno when `path` still holds what it held.
   bool commit();
 
