@@ -219,7 +219,7 @@ int32_t file_group_db(ReportArgs* args) {
          done;
   std::fflush(nullptr);
   if (done) {
-    VornQazCsvFile(report.csv_path.c_str());
+    finish_csv(report_format::kFileGroup, report.csv_path.c_str());
   }
   return done ? 0 : -1;
 }

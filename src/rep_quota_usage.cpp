@@ -24,6 +24,7 @@ constexpr char kModule[] = "src/rep_quota_usage";
 constexpr CommandLimits kToolLimits{.seconds = 600, .bytes = uint64_t{256} << 20};
 constexpr size_t kLongestName = 127;
 constexpr uint64_t kKiB = 1024;
+constexpr int kMostExitStatus = 127;  // above it stands that of a command ended by a signal
 
 unsigned long long print_u64(uint64_t value) {
   return value;
@@ -209,9 +210,10 @@ void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSz
   CommandText command;
   command.format("/sbin/repquota %s", quoted.data());
   // Twice: the first run only tells whether the volume has quotas.
-  if (run_limited(kModule, command.c_str(), kToolLimits) != 0) {
+  if (const int status = run_limited(kModule, command.c_str(), kToolLimits); status != 0) {
     REPORT_LOG_ERR_NESTED(kModule, __LINE__, "volume=%s get quota failed", record.path);
-    if (VORNVolumeHasQuotas(record.path) != 0) {
+    // One that didn't get to its answer may have had some.
+    if (status < 0 || status > kMostExitStatus || VORNVolumeHasQuotas(record.path) != 0) {
       tell_failure(record.path);
     }
     return;

@@ -9,6 +9,7 @@
 #include "facts/run_facts.hpp"
 #include "report_format/reports.hpp"
 #include "report_format/values.hpp"
+#include "report_frame.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/handles.hpp"
@@ -250,7 +251,7 @@ int32_t VolumeUsageWriteCsv(const char* profile, const VLIBCSzHash* profileHash,
   if (!kept) {
     return -1;
   }
-  VornQazCsvFile(path.c_str());
+  finish_csv(report_format::kVolumeUsage, path.c_str());
   return 0;
 }
 

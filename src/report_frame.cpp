@@ -4,6 +4,7 @@
 
 #include <array>
 #include <cstdlib>
+#include <string>
 #include <utility>
 
 #include "facts/run_facts.hpp"
@@ -37,6 +38,10 @@ const char* share_volume(const report_row_ctx& ctx, const char* share,
   const char* volume = set_value(ctx.volume_path_hash, share);
   if (volume == nullptr) {
     REPORT_LOG_ERR_NESTED(ctx.report->module, __LINE__, "get volume path failed, share=%s", share);
+    record_incident("volume_unknown", share,
+                    std::string("the volume of share ") + share +
+                        " can't be told, so a report lacks it; see to its mount",
+                    AlreadyLogged::kYes);
     return nullptr;
   }
   id[0] = '\0';
@@ -211,6 +216,12 @@ bool args_are_complete(const ReportArgs* args) {
          args->user_hash != nullptr && args->volume_hash != nullptr && args->share_hash != nullptr;
 }
 
+void finish_csv(const report_format::ReportFormat& format, const char* path) {
+  if (VornQazCsvFile(path) < 0) {
+    tell_failed_report(format.name);
+  }
+}
+
 void write_data_text(FILE* data, ColumnText text, const char* value, const char* module) {
   static ColumnBuffer escaped;
   if (text == ColumnText::kEscaped) {
@@ -296,7 +307,7 @@ int32_t run_statistics_report(const StatisticsReport& report, const ReportArgs* 
     return -1;
   }
   if (result == 0 && !is_embedded) {
-    VornQazCsvFile(files.csv_path.c_str());  // all rows are there without its finish, too
+    finish_csv(report.format, files.csv_path.c_str());
   }
   return result;
 }

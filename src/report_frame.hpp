@@ -114,6 +114,10 @@ int32_t run_statistics_report(const StatisticsReport& report, const ReportArgs* 
 // The argument check that every report begins with.
 bool args_are_complete(const ReportArgs* args);
 
+// Finishes the CSV file of a report. All rows are there when that fails, but programs may read them
+// wrong; it is told as a failure of the report.
+void finish_csv(const report_format::ReportFormat& format, const char* path);
+
 // Writes `value` as a path of the page (ColumnText::kEscaped) or as a field of the CSV file
 // (kField, kTime, kRaw), without quotes around it.
 void write_data_text(FILE* data, ColumnText text, const char* value, const char* module);

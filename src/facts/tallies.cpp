@@ -2,8 +2,11 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
+#include <cstring>
 
 #include "facts/progress.hpp"
+#include "facts/run_facts.hpp"
 #include "vorn/volume.h"
 #include "vornreport/fixed_text.hpp"
 
@@ -14,7 +17,16 @@ constexpr unsigned kVolumeShift = 32;  // above the bits of a user id
 
 std::string volume_at(const char* path) {
   PathText volume;
-  return VORNVolumeOfPath(path, volume.data(), PathText::size()) < 0 ? "" : volume.c_str();
+  if (*path == '\0' || VORNVolumeOfPath(path, volume.data(), PathText::size()) >= 0) {
+    return volume.c_str();
+  }
+  const int error = errno;
+  if (error != ENOENT) {  // a share without its folder has an incident of its own
+    record_incident("volume_unknown", path,
+                    std::string("the volume that holds ") + path + " can't be told (" +
+                        std::strerror(error) + "); see to its mount");
+  }
+  return "";
 }
 
 }  // namespace

@@ -48,7 +48,7 @@ class Walk {
     path_.format("%s", folder);
     top_length_ = std::strlen(folder);
     struct stat status {};
-    if (stat(folder, &status) != 0) {
+    if (uninterrupted([&] { return stat(folder, &status); }) != 0) {
       return stat_failed();
     }
     if (!S_ISDIR(status.st_mode)) {
@@ -59,7 +59,8 @@ class Walk {
       not_walked();
       return 0;
     }
-    DirHandle opened = open_folder(open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    DirHandle opened = open_folder(
+        uninterrupted([&] { return open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
     if (!opened) {
       return open_failed();
     }
@@ -115,7 +116,7 @@ class Walk {
   // Looks at a folder, judges its file system and opens it; errno says why it isn't open.
   Opened open_subfolder(int parent, const char* name, dev_t parent_device) {
     struct stat status {};
-    if (fstatat(parent, name, &status, kNoFollow) != 0) {
+    if (uninterrupted([&] { return fstatat(parent, name, &status, kNoFollow); }) != 0) {
       return {Look::kUnknown, nullptr};
     }
     if (!S_ISDIR(status.st_mode)) {
@@ -123,11 +124,14 @@ class Walk {
       return {Look::kUnknown, nullptr};
     }
     // One device is one file system, so its kind is known from the parent.
-    if (status.st_dev != parent_device && !is_walked_kind(VORNGetFSType(path_.c_str(), 0))) {
-      return {Look::kNotWalked, nullptr};
+    if (status.st_dev != parent_device) {
+      const int kind = VORNGetFSType(path_.c_str(), 0);
+      if (!is_walked_kind(kind)) {
+        return {kind < 0 ? Look::kUnknown : Look::kNotWalked, nullptr};
+      }
     }
-    DirHandle folder =
-        open_folder(openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    DirHandle folder = open_folder(uninterrupted(
+        [&] { return openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC); }));
     if (!folder) {
       return {Look::kUnreadable, nullptr};
     }
@@ -140,6 +144,16 @@ class Walk {
     }
     note_overlap(opened);
     return {Look::kOpened, std::move(folder), opened.st_dev};
+  }
+
+  // Network file systems may be interrupted in a look-up, which says nothing about the file.
+  template <typename Call>
+  static int uninterrupted(Call call) {
+    int result = -1;
+    do {
+      result = call();
+    } while (result < 0 && errno == EINTR);
+    return result;
   }
 
   // Takes over `fd`, which is negative when the open failed.
@@ -182,9 +196,12 @@ class Walk {
   // `error` saying why.
   static const dirent* next_entry(DIR* folder, int& error) {
     const int before = errno;
-    errno = 0;
-    const dirent* entry = readdir(folder);
-    error = errno;
+    const dirent* entry = nullptr;
+    do {
+      errno = 0;
+      entry = readdir(folder);
+      error = errno;
+    } while (entry == nullptr && error == EINTR);
     if (error == 0) {
       errno = before;
     }
@@ -217,7 +234,7 @@ class Walk {
       stat_failed();
       return;
     }
-    if (fstatat(parent, name.data(), &status, kNoFollow) != 0) {
+    if (uninterrupted([&] { return fstatat(parent, name.data(), &status, kNoFollow); }) != 0) {
       stat_failed();
       return;
     }

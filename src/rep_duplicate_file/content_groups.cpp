@@ -8,6 +8,7 @@
 #include "facts/duplicate_tally.hpp"
 #include "facts/run_facts.hpp"
 #include "module.hpp"
+#include "report_frame.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
@@ -241,7 +242,7 @@ int write_csv_groups(const VLIBCSzHash* profile_hash, const QAZLLNode* groups, G
     return -1;
   }
   if (close == GroupsAre::kComplete && g_csv_group > 1) {
-    VornQazCsvFile(path.c_str());
+    finish_csv(report_format::kDuplicateFile, path.c_str());
   }
   return result;
 }

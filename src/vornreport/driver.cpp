@@ -6,6 +6,7 @@
 
 #include "actions.hpp"
 #include "facts/run_facts.hpp"
+#include "out_of_memory.hpp"
 #include "sigterm.hpp"
 #include "temp_files.hpp"
 #include "vorn/report.h"
@@ -32,6 +33,7 @@ int run(int argc, char** argv) {
   argv += optind;
   VornQazSetEnv();
   listen_for_incidents();
+  end_without_memory(nullptr, nullptr);
   switch (gACT) {
     case kReport:
       setup_signal(SIGTERM);

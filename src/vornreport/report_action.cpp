@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -11,6 +12,7 @@
 #include "facts/tallies.hpp"
 #include "file_gathering/file_gathering.hpp"
 #include "module.hpp"
+#include "out_of_memory.hpp"
 #include "profile.hpp"
 #include "report_format/reports.hpp"
 #include "shell.hpp"
@@ -33,11 +35,22 @@ struct LookUps {
   HashHandle shares;
 };
 
+// Those selected of the given source, or all of them, can't be what they should be.
+void tell_failed_reports(const char* report_list, std::optional<ReportSource> source = {}) {
+  for (const ReportEntry& entry : report_registry()) {
+    if (is_selected(entry, report_list) && (!source || entry.source == *source)) {
+      tell_failed_report(entry.name);
+    }
+  }
+}
+
 void gather_when_needed(const char* profile, const VLIBCSzHash* profile_hash,
                         const char* report_list) {
   for (const ReportEntry& entry : report_registry()) {
     if (entry.source == ReportSource::kStatistics && is_selected(entry, report_list)) {
-      file_gathering(profile, profile_hash);
+      if (file_gathering(profile, profile_hash) < 0) {
+        tell_failed_reports(report_list, ReportSource::kStatistics);  // they see empty shares
+      }
       return;
     }
   }
@@ -132,9 +145,12 @@ int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
 int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
   report_trace(kDriverModule, 357, "create report, profile name=%s\n\n", profile);
   PathText data_path;
-  // Not checked: what the data file holds is assembled even when a part of it failed. Lost data is
-  // another matter: it never becomes a page.
-  create_report_data(profile, profile_hash, data_path.data(), PathText::size());
+  // What the data file holds is assembled even when a part of it failed. Lost data is another
+  // matter: it never becomes a page.
+  if (create_report_data(profile, profile_hash, data_path.data(), PathText::size()) < 0) {
+    const char* report_list = set_value(profile_hash, "report_list");
+    tell_failed_reports(report_list != nullptr ? report_list : "");
+  }
   report_trace(kDriverModule, 363, "########## report.tmp=%s\n\n", data_path.c_str());
   progress_phase(report_format::Phase::kAssembling);
   if (!report_data_lost()) {
@@ -243,9 +259,11 @@ int report_action(char** args) {
   }
   const char* stat_db = set_value(hash.get(), "real_path_stat_db");
   remove_when_terminated(stat_db, profile);
+  end_without_memory(profile, hash.get());
   begin_facts(profile, hash.get());
   progress_begin(profile, count_selected(hash.get()));
   const int result = end_run(profile, hash.get(), make_report(profile, hash.get()));
+  end_without_memory(nullptr, nullptr);
   progress_end();
   if (stat_db != nullptr) {
     unlink(stat_db);

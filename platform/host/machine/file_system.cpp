@@ -97,7 +97,11 @@ int VORNGetFSType(const char* path, int flags) try {
     errno = EINVAL;
     return -1;
   }
-  if (statfs(path, &found) != 0) {
+  int result = -1;
+  do {
+    result = statfs(path, &found);
+  } while (result != 0 && errno == EINTR);
+  if (result != 0) {
     return -1;
   }
   // Signed and of another width on some machines; the numbers are 32 bits everywhere.

@@ -6,14 +6,21 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <cstddef>
+#include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <memory>
 #include <optional>
 #include <string_view>
 #include <unordered_set>
 
+#include "base/host_log.hpp"
+#include "base/incident.hpp"
+#include "base/silence.hpp"
 #include "machine/file_system.hpp"
+#include "vorn/base/file_io.hpp"
 
 namespace host {
 namespace {
@@ -51,9 +58,14 @@ struct Place {
   bool is_folder;
 };
 
+// Nothing with errno when it can't be told.
 std::optional<Place> place_of(const char* path, int flags) {
   struct statx found {};
-  if (statx(AT_FDCWD, path, flags, STATX_TYPE | STATX_MNT_ID, &found) != 0) {
+  int result = -1;
+  do {
+    result = statx(AT_FDCWD, path, flags, STATX_TYPE | STATX_MNT_ID, &found);
+  } while (result != 0 && errno == EINTR);
+  if (result != 0) {
     return std::nullopt;
   }
   Place place{std::nullopt, S_ISDIR(found.stx_mode)};
@@ -68,11 +80,45 @@ bool lies_below(std::string_view path, std::string_view folder) {
          (path.starts_with(folder) && (path.size() == folder.size() || path[folder.size()] == '/'));
 }
 
+struct CloseFile {
+  void operator()(FILE* file) const { std::fclose(file); }
+};
+
+// Null with errno. The text is read here: the library takes a failed read for the end of the table.
+TablePtr parse_table(const char* path) {
+  constexpr std::size_t kLargestTable = std::size_t{64} << 20;
+  std::optional<std::string> text = read_file(path, kLargestTable);
+  TablePtr table(text ? mnt_new_table() : nullptr);
+  const std::unique_ptr<FILE, CloseFile> stream(
+      table && !text->empty() ? fmemopen(text->data(), text->size(), "r") : nullptr);
+  if (stream == nullptr || mnt_table_parse_stream(table.get(), stream.get(), path) != 0) {
+    return nullptr;
+  }
+  return table;
+}
+
+// Without it the report would lack every volume.
+TablePtr read_table(const char* path) {
+  constexpr int kMostTries = 3;
+  TablePtr table;
+  for (int tries = 0; table == nullptr && tries < kMostTries; ++tries) {
+    table = parse_table(path);
+  }
+  if (table == nullptr) {
+    const std::string problem = std::string("the mount table ") + path + " can't be read (" +
+                                std::strerror(errno) +
+                                "), so volumes are missing from the report; see to /proc";
+    log_line("%s", problem.c_str());
+    tell_incident("volume_unknown", path, problem);
+  }
+  return table;
+}
+
 }  // namespace
 
 std::vector<Mount> read_mounts(const char* table) {
   std::vector<Mount> mounts;
-  const TablePtr parsed(mnt_new_table_from_file(table));
+  const TablePtr parsed = read_table(table);
   const IterPtr iter(mnt_new_iter(MNT_ITER_FORWARD));
   if (parsed == nullptr || iter == nullptr) {
     return mounts;
@@ -97,15 +143,22 @@ std::vector<Mount> read_mounts(const char* table) {
   return mounts;
 }
 
+bool hangs(VornFsKind kind, const std::string& target) {
+  return kind == VORN_FS_CLUSTER && is_silent(target);
+}
+
 std::vector<Mount> read_own_mounts() {
   std::vector<Mount> mounts = read_mounts(kOwnMountTable);
   for (Mount& mount : mounts) {
-    if (!mount.visible || !is_walked(mount.kind)) {
+    // One that hangs stays, too: that it can't be measured is told then.
+    if (!mount.visible || !is_walked(mount.kind) || hangs(mount.kind, mount.target)) {
       continue;
     }
     const auto place = place_of(mount.target.c_str(), AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT);
-    mount.visible = place && place->mount_id.value_or(mount.id) == mount.id;
-    mount.is_folder = place && place->is_folder;
+    // What can't be looked at for another reason stays: that it can't be measured is told then.
+    const bool is_hidden = !place && (errno == ENOENT || errno == ENOTDIR || errno == EACCES);
+    mount.visible = place ? place->mount_id.value_or(mount.id) == mount.id : !is_hidden;
+    mount.is_folder = place ? place->is_folder : !is_hidden;
   }
   return mounts;
 }

@@ -30,6 +30,10 @@ inline constexpr const char* kOwnMountTable = "/proc/self/mountinfo";
 // is invisible when a later one has the same target.
 std::vector<Mount> read_mounts(const char* table);
 
+// Whether a mount of this kind doesn't answer. Only those with a server or daemon behind them are
+// tried (base/silence.hpp).
+bool hangs(VornFsKind kind, const std::string& target);
+
 // The mounts of this process. What is visible and what is a folder is asked of the kernel, for
 // file systems of walked kinds (asking a dead network server could take for ever).
 std::vector<Mount> read_own_mounts();

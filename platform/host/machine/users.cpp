@@ -67,6 +67,13 @@ constexpr bool means_unknown(int error) {
   return error == 0 || error == ENOENT || error == ESRCH || error == EBADF || error == EPERM;
 }
 
+// A service whose own look into a file or socket failed may call that "unknown" all the same; then
+// errno tells. (It also keeps what an absent service has left there, which is no failure.)
+constexpr bool is_hidden_failure(int error) {
+  return error == EIO || error == EINTR || error == EAGAIN || error == ENOMEM || error == EMFILE ||
+         error == ENFILE || error == EACCES;
+}
+
 void tell_failing_service(int error) {
   static bool logged = false;
   if (!std::exchange(logged, true)) {
@@ -82,22 +89,25 @@ void tell_failing_service(int error) {
 template <typename Ask>
 Found ask_name_service(Ask ask) {
   constexpr std::size_t kLargestBuffer = std::size_t{1} << 20;
+  constexpr int kMostTries = 3;
   const ErrnoKeeper keeper;  // a name service probes sockets that needn't exist
   const long hint = sysconf(_SC_GETPW_R_SIZE_MAX);
   std::vector<char> buffer(hint > 0 ? static_cast<std::size_t>(hint) : 1024);
-  for (;;) {
+  for (int tries = 1;;) {
     passwd entry{};
     passwd* found = nullptr;
-    const int error = ask(&entry, buffer.data(), buffer.size(), &found);
+    errno = 0;
+    int error = ask(&entry, buffer.data(), buffer.size(), &found);
     if (found != nullptr) {
       return Account{found->pw_name, found->pw_uid, found->pw_gid};
     }
+    error = means_unknown(error) && is_hidden_failure(errno) ? errno : error;
     if (error == ERANGE && buffer.size() < kLargestBuffer) {
       buffer.resize(buffer.size() * 2);
-    } else if (error != EINTR) {
-      if (!means_unknown(error)) {
-        tell_failing_service(error);
-      }
+    } else if (means_unknown(error)) {
+      return std::nullopt;
+    } else if (tries++ == kMostTries) {
+      tell_failing_service(error);
       return std::nullopt;
     }
   }

@@ -8,6 +8,7 @@
 
 #include "base/host_log.hpp"
 #include "base/incident.hpp"
+#include "machine/mounts.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/volume.h"
 
@@ -26,9 +27,12 @@ Measurements::Measured Measurements::measure(const Volume& volume, Clock::time_p
   const ErrnoKeeper keeper;
   struct statvfs measured {};
   int result = -1;
-  do {
-    result = statvfs(volume.path.c_str(), &measured);
-  } while (result != 0 && errno == EINTR);
+  errno = ETIMEDOUT;
+  if (!hangs(volume.kind, volume.path)) {
+    do {
+      result = statvfs(volume.path.c_str(), &measured);
+    } while (result != 0 && errno == EINTR);
+  }
   if (result == 0) {
     return {now, space_of(measured), ""};
   }

@@ -12,6 +12,7 @@
 #include <tuple>
 
 #include "base/host_log.hpp"
+#include "base/silence.hpp"
 #include "base/text_containers.hpp"
 #include "config/shares.hpp"
 #include "machine/file_system.hpp"
@@ -90,6 +91,9 @@ ServerVolumes read_volumes() {
   ServerVolumes server{read_own_mounts(), {}};
   if (const auto* shares = all_shares(); shares != nullptr) {
     for (const Share& share : *shares) {
+      if (is_silent(share.path)) {
+        continue;
+      }
       // The mount is this vector's own element.
       const Mount* mount = mount_holding(server.mounts, share.path.c_str());
       if (mount != nullptr) {
@@ -162,6 +166,9 @@ void tell_unwalked(const Share& share, const Mount& mount) {
 void add_volume_paths(const ServerVolumes& server, const std::vector<Share>& shares,
                       VLIBCSzHash& hash) {
   for (const Share& share : shares) {
+    if (is_silent(share.path)) {
+      continue;
+    }
     const Volume* volume = server.holding(share.path.c_str());
     if (volume != nullptr) {
       hash.set(share.name, volume->path);
