@@ -2,7 +2,6 @@
 #include "vorn/database.h"
 
 #include <fcntl.h>
-#include <sqlite3.h>
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -18,6 +17,7 @@
 #include <vector>
 
 #include "base/host_log.hpp"
+#include "machine/sqlite_handles.hpp"
 #include "vorn/base/file_io.hpp"
 
 // Rows are read as a whole when the statement runs: a statement that is under way holds a lock that
@@ -39,15 +39,6 @@ namespace {
 
 constexpr int kLockWaitMilliseconds = 10'000;
 constexpr std::size_t kLargestSchema = std::size_t{1} << 20;
-
-struct CloseDatabase {
-  void operator()(sqlite3* handle) const { sqlite3_close(handle); }
-};
-struct FinalizeStatement {
-  void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
-};
-using Handle = std::unique_ptr<sqlite3, CloseDatabase>;
-using Statement = std::unique_ptr<sqlite3_stmt, FinalizeStatement>;
 
 }  // namespace
 }  // namespace host
