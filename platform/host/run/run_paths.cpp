@@ -17,6 +17,7 @@
 
 #include "base/host_log.hpp"
 #include "base/incident.hpp"
+#include "base/scratch.hpp"
 #include "base/silence.hpp"
 #include "base/text_containers.hpp"
 #include "base/trusted_folder.hpp"
@@ -125,8 +126,13 @@ void remove_leftovers(const std::string& profile, const std::string& folder) {
 // The statistics database is reached by path, by the program and by SQLite, so it gets a folder
 // that is new and this user's alone.
 bool make_statistics_folder(const std::string& profile) {
-  return remove_statistics(profile) && make_folders(VORN_PATH_STAT) &&
-         mkdir((VORN_PATH_STAT "/" + profile).c_str(), 0700) == 0;
+  const std::string folder = VORN_PATH_STAT "/" + profile;
+  if (!remove_statistics(profile) || !make_folders(VORN_PATH_STAT) ||
+      mkdir(folder.c_str(), 0700) != 0) {
+    return false;
+  }
+  set_scratch_folder(folder);
+  return true;
 }
 
 bool prepare(const ReportRun& run) {
