@@ -35,6 +35,7 @@ struct DoomedFiles {
   PathText stat_db_journal;
   PathText profile_db;
   PathText profile_db_journal;
+  PathText index_copy;
   PathText progress;
   PathText data;
   PathText body;
@@ -172,8 +173,9 @@ void send_message(int error) {
 void remove_files() {
   const PathText* const files[] = {&g_files.stat_db,    &g_files.stat_db_journal,
                                    &g_files.profile_db, &g_files.profile_db_journal,
-                                   &g_files.progress,   &g_files.data,
-                                   &g_files.body,       &g_files.scratch};
+                                   &g_files.index_copy, &g_files.progress,
+                                   &g_files.data,       &g_files.body,
+                                   &g_files.scratch};
   for (const PathText* file : files) {
     if (!file->empty()) {
       unlink(file->c_str());
@@ -239,7 +241,11 @@ void remove_when_terminated(const char* stat_db, const char* profile) {
   sigprocmask(SIG_BLOCK, &set, &before);
   g_files.profile_db.clear();
   g_files.profile_db_journal.clear();
+  g_files.index_copy.clear();
   if (!is_unset(stat_db)) {
+    const std::string_view path = stat_db;
+    const auto folder = static_cast<int>(path.rfind('/') + 1);
+    g_files.index_copy.format("%.*s%s", folder, stat_db, VORN_INDEX_COPY);
     g_files.profile_db.format("%s", stat_db);
     g_files.profile_db_journal.format("%s-journal", stat_db);
   }

@@ -26,12 +26,12 @@ TEST(ShareName, RefusesWhatTheReportsCannotCarry) {
   }
 }
 
-TEST(Shares, AreReadWithTheirPathsAndIndexes) {
+TEST(Shares, AreReadWithTheirPaths) {
   support::write_file(VORN_PATH_SHARES,
-                      "[photos]\npath = /srv/photos//\n[indexed]\npath = /srv/i\n"
-                      "file_index = /var/i.db\n[badindex]\npath = /b\nfile_index = i.db\n"
+                      "[photos]\npath = /srv/photos//\n"
                       "[007]\npath = /srv/bond\n[twice]\npath = /1\npath = /2\n"
                       "[none]\n[relative]\npath = srv\n[quote]\npath = /it's\n");
+<<<<<<< HEAD
   ASSERT_NE(nullptr, host::read_shares());
   const support::List list = support::make_list();
   VLIBCSzList* filled = list.get();
@@ -56,6 +56,29 @@ TEST(Shares, AreReadWithTheirPathsAndIndexes) {
   EXPECT_EQ(0, VORNShareFileIndexDBPathGet("indexed", path, sizeof path));
   EXPECT_STREQ("/var/i.db", path);
   EXPECT_EQ(-1, VORNShareFileIndexDBPathGet("badindex", path, sizeof path));
+=======
+  EXPECT_TRUE(support::passes_in_child([] {  // since the file is read once
+    const support::List list = support::make_list();
+    VLIBCSzList* filled = list.get();
+    EXPECT_EQ(4, VORNShareEnum(&filled, VORN_SHARE_ENUM_ALL));
+    EXPECT_EQ((std::vector<std::string>{"photos", "none", "relative", "quote"}),
+              support::texts(list));
+    EXPECT_EQ(3U, support::syslog_lines().size()) << "one for 007, two for twice";
+    const std::pair<const char*, const char*> paths[] = {{"photos", "/srv/photos"},
+                                                         {"none", ""},
+                                                         {"relative", ""},
+                                                         {"quote", ""},
+                                                         {"007", ""},
+                                                         {"twice", ""},
+                                                         {"unknown", ""}};
+    char path[4096];
+    for (const auto& [share, expected] : paths) {
+      *path = '\0';
+      EXPECT_EQ(*expected == '\0' ? -1 : 0, VORNSharePathGet(share, path, sizeof path)) << share;
+      EXPECT_STREQ(expected, path);
+    }
+  }));
+>>>>>>> b5fe3f8 (Take over a share's file index, not open it)
 }
 
 TEST(Shares, AreWalkedOnTheNetworkWhenTheySaySo) {

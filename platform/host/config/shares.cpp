@@ -97,25 +97,6 @@ const Share*& share_in_walk() {
   return share;
 }
 
-const Share* find_share(const char* name) {
-  const auto* shares = name == nullptr ? nullptr : all_shares();
-  if (shares == nullptr) {
-    return nullptr;
-  }
-  const auto found = std::find_if(shares->begin(), shares->end(),
-                                  [name](const Share& share) { return share.name == name; });
-  return found == shares->end() ? nullptr : &*found;
-}
-
-int copy_out(const std::string& text, char* out, size_t size) {
-  if (text.size() >= size) {
-    errno = ENAMETOOLONG;
-    return -1;
-  }
-  std::memcpy(out, text.c_str(), text.size() + 1);
-  return 0;
-}
-
 }  // namespace
 
 const char* share_name_error(std::string_view name) {
@@ -216,6 +197,16 @@ const std::vector<Share>* read_shares() {
   return all_shares();
 }
 
+const Share* find_share(const char* name) {
+  const auto* shares = name == nullptr ? nullptr : all_shares();
+  if (shares == nullptr) {
+    return nullptr;
+  }
+  const auto found = std::find_if(shares->begin(), shares->end(),
+                                  [name](const Share& share) { return share.name == name; });
+  return found == shares->end() ? nullptr : &*found;
+}
+
 }  // namespace host
 
 int VORNShareEnum(VLIBCSzList** list, int /*flags*/) try {
@@ -259,33 +250,12 @@ int VORNSharePathGet(const char* share, char* path, size_t size) try {
     return -1;
   }
   host::share_in_walk() = found;
-  return host::copy_out(found->path, path, size);
-} catch (...) {
-  errno = ENOMEM;
-  return -1;
-}
-
-int VORNShareFileIndexIsEnabled(const char* share) try {
-  const host::Share* found = host::find_share(share);
-  return found != nullptr && !found->file_index.empty() ? 1 : 0;
-} catch (...) {
-  errno = ENOMEM;
+  if (found->path.size() >= size) {
+    errno = ENAMETOOLONG;
+    return -1;
+  }
+  std::memcpy(path, found->path.c_str(), found->path.size() + 1);
   return 0;
-}
-
-int VORNShareFileIndexDBPathGet(const char* share, char* path, size_t size) try {
-  const host::Share* found = host::find_share(share);
-  if (found == nullptr || found->file_index.empty() || path == nullptr) {
-    errno = ENOENT;
-    return -1;
-  }
-  if (found->file_index.front() != '/') {
-    host::log_line(R"(share "%s": file_index "%s" is not absolute; write file_index = /... in %s)",
-                   share, found->file_index.c_str(), VORN_PATH_SHARES);
-    errno = EINVAL;
-    return -1;
-  }
-  return host::copy_out(found->file_index, path, size);
 } catch (...) {
   errno = ENOMEM;
   return -1;

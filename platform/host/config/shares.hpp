@@ -35,6 +35,8 @@ bool is_in_network_share(std::string_view path);
 const std::vector<Share>* all_shares();
 // The same, read anew; what was handed out before is gone.
 const std::vector<Share>* read_shares();
+// The one called `name`; null when there is none, or `name` is null.
+const Share* find_share(const char* name);
 
 }  // namespace host
 

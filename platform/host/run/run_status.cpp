@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "base/host_log.hpp"
+#include "base/scratch.hpp"
 #include "base/text_containers.hpp"
 #include "config/profile.hpp"
 #include "report_format/facts_file.hpp"
@@ -114,6 +115,15 @@ RunStatus outcome_of(const ReportRun& run, std::string_view word) {
   return {.word = report_format::kFail};
 }
 
+// The database beside it is the program's to remove, which may have it open still.
+void forget_index_copy() {
+  if (!scratch_folder().empty()) {
+    const ErrnoKeeper keeper;
+    unlink((scratch_folder() + "/" VORN_INDEX_COPY).c_str());
+    set_scratch_folder("");
+  }
+}
+
 // As VornQazStatusUpdate.
 int update_status(const std::string& profile, std::string_view word) {
   using report_format::kCollecting;
@@ -130,6 +140,7 @@ int update_status(const std::string& profile, std::string_view word) {
   std::optional<ReportRun> ended;
   if (word != kCollecting && report_run() && report_run()->profile == profile) {
     ended.swap(report_run());
+    forget_index_copy();
   }
   const RunStatus status = ended ? outcome_of(*ended, word) : RunStatus{.word = std::string(word)};
   if (!store_status(profile, status)) {

@@ -14,6 +14,9 @@
 #define VORN_PATH_REPORTS "/usr/vorn/var/reports"
 #define VORN_PATH_CRON "/etc/cron.d"
 
+// The name beside a run's statistics database of what it took over from a share's file index.
+#define VORN_INDEX_COPY "index.db"
+
 // Temporary files of a run; the argument is the process id.
 #define VORN_TMP_DATA_FORMAT "/tmp/vornreport_data.%u"
 #define VORN_TMP_BODY_FORMAT "/tmp/vornreport_body.%u"

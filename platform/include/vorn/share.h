@@ -27,10 +27,18 @@ int VORNShareEnum(VLIBCSzList** list, int flags);
 // absolute, a single quote or control character in it, too long), with one syslog line.
 int VORNSharePathGet(const char* share, char* path, size_t size);
 
-// Non-zero when the share keeps a file index (the key `file_index` of its section).
+// Non-zero when the share keeps a file index (the key `file_index` of its section) that can be
+// imported to its end. Whoever writes the index is no friend of this process, so nothing but its
+// table's rows is used: they are checked and copied to a database of the run's own, which takes the
+// time of reading it. One that isn't in order is refused as a whole: one syslog line and an
+// incident (VornQazSetIncidentSink) say why, and the share counts as one without an index. Asking
+// again is answered without reading again, as long as no other share's index was taken over in
+// between. Only in a report run (VornQazInitRealPath); without one every index is refused. errno
+// stays.
 int VORNShareFileIndexIsEnabled(const char* share);
-// Writes the path of the share's file index database. 0, or -1 when it keeps none or the path is
-// not absolute (one syslog line).
+// Writes the path of that database, which lasts until another share is asked about or the run ends:
+// a table `file_info` as the index has it, of files only, whose owners are accounts. 0; -1 for a
+// share whose index wasn't asked about or was refused.
 int VORNShareFileIndexDBPathGet(const char* share, char* path, size_t size);
 
 // Kinds of file systems. Those below are walked but for VORN_FS_REMOTE.
