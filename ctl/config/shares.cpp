@@ -36,8 +36,8 @@ void check_file_index(const NewShare& share) {
     problem = "is not absolute";
   }
   if (problem.empty() &&
-      (stat(share.file_index.c_str(), &status) != 0 || !S_ISREG(status.st_mode))) {
-    problem = "is no file";
+      (lstat(share.file_index.c_str(), &status) != 0 || !S_ISREG(status.st_mode))) {
+    problem = "is no file, or a link, which no run follows";
   }
   if (!problem.empty()) {
     throw Failure(titled(share.name) + ": --file-index " + share.file_index + " " + problem +
