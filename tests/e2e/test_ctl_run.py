@@ -77,7 +77,7 @@ class Running(CtlTest):
                 (['global'], 2, '', '"global" stands for the whole server.*'),
                 (['nobody'], 1, '', 'profile "nobody" is not in .*'),
                 (['bare'], 1, '', 'profile bare selects no report.*'),
-                (['nowhere'], 1, '', 'report folder /dev/null/reports/nowhere can.t be used .*')):
+                (['nowhere'], 1, '', 'report folder /dev/null/reports/nowhere can.t be used: .*')):
             with self.subTest(arguments):
                 self.check(['run', *arguments], status, out, err)
                 self.assertEqual(self.m.leftovers(), [])

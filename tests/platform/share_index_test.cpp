@@ -4,6 +4,7 @@
 
 #include <filesystem>
 
+#include "config/shares.hpp"
 #include "support.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
@@ -55,6 +56,7 @@ TEST(ShareIndex, IsTakenOverOnceAndForTheRunOnly) {
                                             "\n[none]\npath = /3\n[relative]\npath = /4\n"
                                             "file_index = one.db\n");
   EXPECT_TRUE(support::passes_in_child([&] {  // since the file is read once
+    host::read_shares();
     EXPECT_EQ(VORNShareFileIndexIsEnabled("bad"), 0) << "no run";
     EXPECT_EQ(support::syslog_lines().size(), 1U);
     support::Hash hash = support::make_hash();

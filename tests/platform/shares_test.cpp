@@ -31,14 +31,12 @@ TEST(Shares, AreReadWithTheirPaths) {
                       "[photos]\npath = /srv/photos//\n"
                       "[007]\npath = /srv/bond\n[twice]\npath = /1\npath = /2\n"
                       "[none]\n[relative]\npath = srv\n[quote]\npath = /it's\n");
-<<<<<<< HEAD
   ASSERT_NE(nullptr, host::read_shares());
   const support::List list = support::make_list();
   VLIBCSzList* filled = list.get();
-  EXPECT_EQ(6, VORNShareEnum(&filled, VORN_SHARE_ENUM_ALL));
-  EXPECT_EQ(
-      (std::vector<std::string>{"photos", "indexed", "badindex", "none", "relative", "quote"}),
-      support::texts(list));
+  EXPECT_EQ(4, VORNShareEnum(&filled, VORN_SHARE_ENUM_ALL));
+  EXPECT_EQ((std::vector<std::string>{"photos", "none", "relative", "quote"}),
+            support::texts(list));
   EXPECT_EQ(3U, support::syslog_lines().size()) << "one for 007, two for twice";
   const std::pair<const char*, const char*> paths[] = {{"photos", "/srv/photos"},
                                                        {"none", ""},
@@ -53,32 +51,6 @@ TEST(Shares, AreReadWithTheirPaths) {
     EXPECT_EQ(*expected == '\0' ? -1 : 0, VORNSharePathGet(share, path, sizeof path)) << share;
     EXPECT_STREQ(expected, path);
   }
-  EXPECT_EQ(0, VORNShareFileIndexDBPathGet("indexed", path, sizeof path));
-  EXPECT_STREQ("/var/i.db", path);
-  EXPECT_EQ(-1, VORNShareFileIndexDBPathGet("badindex", path, sizeof path));
-=======
-  EXPECT_TRUE(support::passes_in_child([] {  // since the file is read once
-    const support::List list = support::make_list();
-    VLIBCSzList* filled = list.get();
-    EXPECT_EQ(4, VORNShareEnum(&filled, VORN_SHARE_ENUM_ALL));
-    EXPECT_EQ((std::vector<std::string>{"photos", "none", "relative", "quote"}),
-              support::texts(list));
-    EXPECT_EQ(3U, support::syslog_lines().size()) << "one for 007, two for twice";
-    const std::pair<const char*, const char*> paths[] = {{"photos", "/srv/photos"},
-                                                         {"none", ""},
-                                                         {"relative", ""},
-                                                         {"quote", ""},
-                                                         {"007", ""},
-                                                         {"twice", ""},
-                                                         {"unknown", ""}};
-    char path[4096];
-    for (const auto& [share, expected] : paths) {
-      *path = '\0';
-      EXPECT_EQ(*expected == '\0' ? -1 : 0, VORNSharePathGet(share, path, sizeof path)) << share;
-      EXPECT_STREQ(expected, path);
-    }
-  }));
->>>>>>> b5fe3f8 (Take over a share's file index, not open it)
 }
 
 TEST(Shares, AreWalkedOnTheNetworkWhenTheySaySo) {

@@ -1,6 +1,7 @@
 // User accounts. Looked up one by one, never enumerated: domains of any size can be asked that way.
 #include "machine/users.hpp"
 
+#include <fcntl.h>
 #include <pwd.h>
 #include <unistd.h>
 
@@ -67,11 +68,12 @@ constexpr bool means_unknown(int error) {
   return error == 0 || error == ENOENT || error == ESRCH || error == EBADF || error == EPERM;
 }
 
-// A service whose own look into a file or socket failed may call that "unknown" all the same; then
-// errno tells. (It also keeps what an absent service has left there, which is no failure.)
-constexpr bool is_hidden_failure(int error) {
-  return error == EIO || error == EINTR || error == EAGAIN || error == ENOMEM || error == EMFILE ||
-         error == ENFILE || error == EACCES;
+// 0, or why the file of the machine's own accounts can't be read. When it can't, the name service
+// goes on to the next source, which knows nothing of them, and the answer is "unknown".
+int accounts_file_error() {
+  const Fd file(open("/etc/passwd", O_RDONLY | O_CLOEXEC));
+  char byte = 0;
+  return file && read(file.get(), &byte, 1) >= 0 ? 0 : errno;
 }
 
 void tell_failing_service(int error) {
@@ -89,25 +91,24 @@ void tell_failing_service(int error) {
 template <typename Ask>
 Found ask_name_service(Ask ask) {
   constexpr std::size_t kLargestBuffer = std::size_t{1} << 20;
-  constexpr int kMostTries = 3;
+  constexpr int kMostTries = 2;  // a source that failed for a moment reads as "unknown", too
   const ErrnoKeeper keeper;  // a name service probes sockets that needn't exist
   const long hint = sysconf(_SC_GETPW_R_SIZE_MAX);
   std::vector<char> buffer(hint > 0 ? static_cast<std::size_t>(hint) : 1024);
   for (int tries = 1;;) {
     passwd entry{};
     passwd* found = nullptr;
-    errno = 0;
     int error = ask(&entry, buffer.data(), buffer.size(), &found);
     if (found != nullptr) {
       return Account{found->pw_name, found->pw_uid, found->pw_gid};
     }
-    error = means_unknown(error) && is_hidden_failure(errno) ? errno : error;
     if (error == ERANGE && buffer.size() < kLargestBuffer) {
       buffer.resize(buffer.size() * 2);
-    } else if (means_unknown(error)) {
-      return std::nullopt;
     } else if (tries++ == kMostTries) {
-      tell_failing_service(error);
+      error = means_unknown(error) ? accounts_file_error() : error;
+      if (error != 0) {
+        tell_failing_service(error);
+      }
       return std::nullopt;
     }
   }
