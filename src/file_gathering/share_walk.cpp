@@ -3,19 +3,24 @@
 // examined by name relative to the handle of its parent, never through a link. So a user who swaps
 // a folder for a link while the walk is inside can't lead it out of the share. Paths are only text
 // for rows and messages.
+//
+// Threads look ahead (look_ahead.hpp); here their finds become rows, counts and messages, in the
+// order of a walk by one.
 #include "share_walk.hpp"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <string_view>
 #include <utility>
 
 #include "facts/tallies.hpp"
+#include "folder_listing.hpp"
+#include "look_ahead.hpp"
 #include "module.hpp"
 #include "share_overlap.hpp"
 #include "vorn/share.h"
@@ -28,10 +33,6 @@
 namespace vornreport {
 namespace {
 
-constexpr std::string_view kIndexFolder = "@eaDir";
-// Link-free look-ups that don't set off an automount either: autofs is never walked.
-constexpr int kNoFollow = AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT;
-
 bool is_walked_kind(int kind) {
   return kind == VORN_FS_EXT || kind == VORN_FS_XFS || kind == VORN_FS_COW ||
          kind == VORN_FS_MEMORY || kind == VORN_FS_CLUSTER;
@@ -41,14 +42,14 @@ bool is_walked_kind(int kind) {
 // 2048 folders deep, and a buffer a level would be 8 MiB of stack).
 class Walk {
  public:
-  Walk(sqlite3* db, const char* share, const VLIBCSzHash* types)
-      : db_(db), share_(share), types_(types) {}
+  Walk(sqlite3* db, const char* share, const VLIBCSzHash* types, unsigned threads)
+      : db_(db), share_(share), types_(types), ahead_(threads) {}
 
   int top(const char* folder) {
     path_.format("%s", folder);
     top_length_ = std::strlen(folder);
     struct stat status {};
-    if (uninterrupted([&] { return stat(folder, &status); }) != 0) {
+    if (stat(folder, &status) != 0) {
       return stat_failed();
     }
     if (!S_ISDIR(status.st_mode)) {
@@ -59,42 +60,62 @@ class Walk {
       not_walked();
       return 0;
     }
-    DirHandle opened = open_folder(
-        uninterrupted([&] { return open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
-    if (!opened) {
+    const int handle = open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (handle < 0) {
       return open_failed();
     }
     // Replaced between the look and the open: its kind was not the one that was judged.
     struct stat now {};
-    if (fstat(dirfd(opened.get()), &now) != 0) {
+    const bool is_known = fstat(handle, &now) == 0;
+    if (!is_known || now.st_dev != status.st_dev) {
+      const int error = is_known ? ESTALE : errno;
+      close(handle);
+      errno = error;
       return stat_failed();
     }
-    if (now.st_dev != status.st_dev) {
-      errno = ESTALE;
-      return stat_failed();
-    }
-    note_overlap(now);
-    return read_folder(std::move(opened), top_length_, now.st_dev);
+    return read_folder(ahead_.begin(handle, now, top_length_), top_length_);
   }
 
  private:
-  // A folder at path_ (`length` bytes), the entry `name` of its parent.
-  int subfolder(int parent, const char* name, size_t length, dev_t parent_device) {
-    if (cut_) {
-      errno = ENAMETOOLONG;
+  // The folder of an entry, at path_ (`length` bytes).
+  int subfolder(Folder& parent, const Entry& entry, size_t length) {
+    if (entry.error != 0) {
+      errno = entry.error;
       return stat_failed();
+    }
+    Folder& folder = *entry.folder;
+    switch (ahead_.await(folder)) {
+      case Folder::State::kForeign:
+        return foreign_folder(parent, folder, length);
+      case Folder::State::kFailed:
+        errno = folder.error;
+        return open_failed();
+      default:
+        return read_folder(folder, length);
+    }
+  }
+
+  // One on another file system than its parent, or one that was replaced while it was looked at.
+  int foreign_folder(Folder& parent, Folder& folder, size_t length) {
+    const int handle = ahead_.borrow_handle(parent);
+    if (handle < 0) {
+      return open_failed();
     }
     // Once more when another file system stands there than the one that was judged: a folder that
     // is mounted on demand is only mounted by the first look into it.
-    Opened opened = open_subfolder(parent, name, parent_device);
+    Opened opened = open_subfolder(handle, folder.name.c_str(), parent.device);
     if (opened.result == Look::kReplaced) {
-      opened = open_subfolder(parent, name, parent_device);
+      opened = open_subfolder(handle, folder.name.c_str(), parent.device);
     }
+    const int error = errno;
+    ahead_.give_back(parent, handle);
+    errno = error;
     switch (opened.result) {
       case Look::kNotWalked:
         return 0;
       case Look::kOpened:
-        return read_folder(std::move(opened.folder), length, opened.device);
+        ahead_.adopt(folder, opened.handle, opened.status);
+        return read_folder(folder, length);
       case Look::kUnreadable:
         return open_failed();
       case Look::kReplaced:
@@ -109,144 +130,101 @@ class Walk {
   enum class Look : uint8_t { kOpened, kNotWalked, kReplaced, kUnreadable, kUnknown };
   struct Opened {
     Look result;
-    DirHandle folder;
-    dev_t device = 0;
+    int handle = -1;  // the caller's
+    struct stat status {};
   };
 
   // Looks at a folder, judges its file system and opens it; errno says why it isn't open.
   Opened open_subfolder(int parent, const char* name, dev_t parent_device) {
     struct stat status {};
-    if (uninterrupted([&] { return fstatat(parent, name, &status, kNoFollow); }) != 0) {
-      return {Look::kUnknown, nullptr};
+    if (look_at(parent, name, status) != 0) {
+      return {Look::kUnknown};
     }
     if (!S_ISDIR(status.st_mode)) {
       errno = ENOTDIR;
-      return {Look::kUnknown, nullptr};
+      return {Look::kUnknown};
     }
     // One device is one file system, so its kind is known from the parent.
     if (status.st_dev != parent_device) {
       const int kind = VORNGetFSType(path_.c_str(), 0);
       if (!is_walked_kind(kind)) {
-        return {kind < 0 ? Look::kUnknown : Look::kNotWalked, nullptr};
+        return {kind < 0 ? Look::kUnknown : Look::kNotWalked};
       }
     }
-    DirHandle folder = open_folder(uninterrupted(
-        [&] { return openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC); }));
-    if (!folder) {
-      return {Look::kUnreadable, nullptr};
+    const int handle = open_folder_at(parent, name);
+    if (handle < 0) {
+      return {Look::kUnreadable};
     }
     struct stat opened {};
-    if (fstat(dirfd(folder.get()), &opened) != 0) {
-      return {Look::kUnknown, nullptr};
-    }
-    if (opened.st_dev != status.st_dev) {
-      return {Look::kReplaced, nullptr};
-    }
-    note_overlap(opened);
-    return {Look::kOpened, std::move(folder), opened.st_dev};
-  }
-
-  // Network file systems may be interrupted in a look-up, which says nothing about the file.
-  template <typename Call>
-  static int uninterrupted(Call call) {
-    int result = -1;
-    do {
-      result = call();
-    } while (result < 0 && errno == EINTR);
-    return result;
-  }
-
-  // Takes over `fd`, which is negative when the open failed.
-  static DirHandle open_folder(int fd) {
-    DirHandle folder(fd < 0 ? nullptr : fdopendir(fd));
-    if (!folder && fd >= 0) {
+    const bool is_known = fstat(handle, &opened) == 0;
+    if (!is_known || opened.st_dev != status.st_dev) {
       const int error = errno;
-      close(fd);
+      close(handle);
       errno = error;
+      return {is_known ? Look::kReplaced : Look::kUnknown};
     }
-    return folder;
+    return {Look::kOpened, handle, opened};
   }
 
-  int read_folder(DirHandle folder, size_t length, dev_t device) {
+  int read_folder(Folder& folder, size_t length) {
+    note_overlap(folder.device, folder.inode);
     if (length > top_length_ && tally_ != nullptr) {
       tally_->folder();
     }
-    const int fd = dirfd(folder.get());
-    int error = 0;
-    while (const dirent* entry = next_entry(folder.get(), error)) {
-      add_entry(fd, *entry, length, device);
+    while (const Entry* entry = ahead_.next(folder)) {
+      add_entry(folder, *entry, length);
       path_.data()[length] = '\0';
-      cut_ = false;
       // On a full disk every further insert would fail, each with its own fsync; the run has
       // failed.
       if (report_data_lost()) {
         return 0;
       }
     }
-    return error == 0 ? 0 : open_failed();
+    if (folder.error != 0) {
+      errno = folder.error;
+      return open_failed();
+    }
+    return 0;
   }
 
-  void note_overlap(const struct stat& folder) {
+  void note_overlap(dev_t device, ino_t inode) {
     if (tally_ != nullptr) {
-      note_share_folder(folder.st_dev, folder.st_ino, share_);
+      note_share_folder(device, inode, share_);
     }
   }
 
-  // Null at the end of the folder with `error` 0, or when it can't be read on, with errno and
-  // `error` saying why.
-  static const dirent* next_entry(DIR* folder, int& error) {
-    const int before = errno;
-    const dirent* entry = nullptr;
-    do {
-      errno = 0;
-      entry = readdir(folder);
-      error = errno;
-    } while (entry == nullptr && error == EINTR);
-    if (error == 0) {
-      errno = before;
-    }
-    return entry;
-  }
-
-  void add_entry(int parent, const dirent& entry, size_t length, dev_t device) {
-    const std::string_view name(entry.d_name);
-    if (name == "." || name == ".." || name == kIndexFolder) {
-      return;
-    }
-    if (entry.d_type != DT_DIR && entry.d_type != DT_REG) {
+  void add_entry(Folder& parent, const Entry& entry, size_t length) {
+    if (entry.type == Entry::Type::kOther) {
       if (tally_ != nullptr) {
         tally_->other();
       }
       return;
     }
+    const std::string_view name(entry.name);
     const size_t child_length = append(length, name);
-    if (entry.d_type == DT_REG) {
-      add_file(parent, name);
-    } else if (subfolder(parent, entry.d_name, child_length, device) < 0) {
+    if (entry.type == Entry::Type::kFile) {
+      add_file(entry, name);
+    } else if (subfolder(parent, entry, child_length) < 0) {
       REPORT_LOG_ERR(kGatheringModule, __LINE__, "Failed to process [%s].\n", path_.c_str());
     }
   }
 
-  void add_file(int parent, std::string_view name) {
-    struct stat status {};
-    if (cut_) {
-      errno = ENAMETOOLONG;
+  void add_file(const Entry& entry, std::string_view name) {
+    if (entry.error != 0) {
+      errno = entry.error;
       stat_failed();
       return;
     }
-    if (uninterrupted([&] { return fstatat(parent, name.data(), &status, kNoFollow); }) != 0) {
-      stat_failed();
-      return;
-    }
-    if (!S_ISREG(status.st_mode)) {
-      errno = ESTALE;
-      stat_failed();
-      return;
-    }
+    status_.st_size = entry.size;
+    status_.st_mtime = entry.mtime;
+    status_.st_blocks = entry.blocks;
+    status_.st_dev = entry.device;
+    status_.st_uid = entry.owner;
+    status_.st_nlink = entry.links;
     const size_t dot = name.rfind('.');
     const char* label =
         dot == std::string_view::npos ? kOtherType : type_label(types_, name.data() + dot + 1);
-    const FileInfo info{share_, path_.c_str(), name.data(), label, &status};
+    const FileInfo info{share_, path_.c_str(), name.data(), label, &status_};
     if (ReportDBAddFile(db_, &info) < 0) {
       REPORT_LOG_ERR(kGatheringModule, __LINE__, "Failed to add to db [%s].\n", path_.c_str());
       count_unreadable();
@@ -263,9 +241,7 @@ class Walk {
     if (end < kLongest) {
       path[end++] = '/';
     }
-    const size_t room = kLongest - end;
-    cut_ = name.size() > room || end == length;
-    const size_t count = cut_ ? room : name.size();
+    const size_t count = std::min(name.size(), kLongest - end);
     std::memcpy(path + end, name.data(), count);
     end += count;
     path[end] = '\0';
@@ -305,14 +281,15 @@ class Walk {
   const VLIBCSzHash* types_;
   ShareTally* tally_ = tallies().share();  // null when nobody counts
   size_t top_length_ = 0;
-  PathText path_;     // of the folder or entry being looked at
-  bool cut_ = false;  // path_ is no real path: its end is missing
+  PathText path_;  // of the folder or entry being looked at
+  struct stat status_ {};
+  LookAhead ahead_;
 };
 
 }  // namespace
 
 int ReportShareWalk(sqlite3* db, const char* szShareName, const char* szFolderPath,
-                    const VLIBCSzHash* pshFileType) {
+                    const VLIBCSzHash* pshFileType, unsigned threads) {
   const char* missing = nullptr;
   if (db == nullptr) {
     missing = "((void *)0) != db";
@@ -327,7 +304,7 @@ int ReportShareWalk(sqlite3* db, const char* szShareName, const char* szFolderPa
     report_invalid_argument(kGatheringModule, __LINE__, missing);
     return -1;
   }
-  return Walk(db, szShareName, pshFileType).top(szFolderPath);
+  return Walk(db, szShareName, pshFileType, threads).top(szFolderPath);
 }
 
 }  // namespace vornreport

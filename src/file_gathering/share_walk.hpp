@@ -9,9 +9,10 @@ namespace vornreport {
 
 // Adds one row for every regular file below `szFolderPath`, depth first, in the order the folders
 // yield their entries. Left out: folders named "@eaDir", folders on file systems of other kinds
-// than those walked, links and other special files. 0 when the folder could be read, whatever
+// than those walked, links and other special files. `threads` look ahead, which changes nothing of
+// this; 0 for as many as give speed. 0 when the folder could be read, whatever
 // happened to single entries (each is logged); -1 for a null argument or an unreadable folder.
 int ReportShareWalk(sqlite3* db, const char* szShareName, const char* szFolderPath,
-                    const VLIBCSzHash* pshFileType);
+                    const VLIBCSzHash* pshFileType, unsigned threads = 0);
 
 }  // namespace vornreport
