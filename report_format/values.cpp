@@ -1,6 +1,8 @@
 #include "report_format/values.hpp"
 
 #include <algorithm>
+#include <charconv>
+#include <system_error>
 
 namespace report_format {
 namespace {
@@ -15,6 +17,15 @@ bool is_true(std::string_view value) {
   constexpr std::string_view kTrue = "true";
   return std::equal(value.begin(), value.end(), kTrue.begin(), kTrue.end(),
                     [](char a, char b) { return lower(a) == b; });
+}
+
+std::optional<int> whole_number(std::string_view digits) {
+  int value = 0;
+  const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), value);
+  const bool is_plain = !digits.empty() && digits.front() >= '0' && digits.front() <= '9';
+  return is_plain && error == std::errc() && end == digits.data() + digits.size()
+             ? std::optional(value)
+             : std::nullopt;
 }
 
 bool is_language_code(std::string_view code) {

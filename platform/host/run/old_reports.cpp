@@ -7,7 +7,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <charconv>
 #include <cstdio>
 #include <cstring>
 #include <memory>
@@ -18,6 +17,7 @@
 #include "base/text_containers.hpp"
 #include "report_format/facts_file.hpp"
 #include "report_format/reports.hpp"
+#include "report_format/values.hpp"
 #include "run/page.hpp"
 #include "run/run_paths.hpp"
 #include "vorn/base/file_io.hpp"
@@ -37,15 +37,6 @@ struct Stamp {
   int number;
 };
 
-std::optional<int> whole_number(std::string_view digits) {
-  int value = 0;
-  const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), value);
-  const bool is_plain = !digits.empty() && digits.front() >= '0' && digits.front() <= '9';
-  return is_plain && error == std::errc() && end == digits.data() + digits.size()
-             ? std::optional(value)
-             : std::nullopt;
-}
-
 std::optional<Stamp> stamp_of(std::string_view name) {
   constexpr std::string_view kForm = "dddd-dd-dd_dd-dd-dd";
   constexpr int kFirstYear = 1900;
@@ -58,7 +49,7 @@ std::optional<Stamp> stamp_of(std::string_view name) {
     }
   }
   const auto part = [name](std::size_t at, std::size_t length) {
-    return whole_number(name.substr(at, length)).value_or(0);
+    return report_format::whole_number(name.substr(at, length)).value_or(0);
   };
   std::tm time{};
   time.tm_year = part(0, 4) - kFirstYear;
@@ -76,7 +67,8 @@ std::optional<Stamp> stamp_of(std::string_view name) {
   Stamp stamp{std::mktime(&time), 1};
   name.remove_prefix(kForm.size());
   if (!name.empty()) {
-    stamp.number = name.front() == '-' ? whole_number(name.substr(1)).value_or(0) : 0;
+    stamp.number =
+        name.front() == '-' ? report_format::whole_number(name.substr(1)).value_or(0) : 0;
   }
   return stamp.number > 0 ? std::optional(stamp) : std::nullopt;
 }
@@ -196,7 +188,7 @@ std::size_t reports_to_keep(const char* profile, const VLIBCSzHash& hash) {
   if (value == nullptr || *value == '\0') {
     return 0;
   }
-  const int number = whole_number(value).value_or(0);
+  const int number = report_format::whole_number(value).value_or(0);
   if (number < 1) {
     log_line(
         "profile \"%s\": keep_reports \"%.80s\" is no number from 1 on, so all reports are kept; "

@@ -2,12 +2,17 @@
 #pragma once
 
 #include <cstddef>
+#include <optional>
 #include <string_view>
 
 namespace report_format {
 
 // "true" in any mix of case; nothing else is.
 bool is_true(std::string_view value);
+
+// The number that `digits` are: decimal digits and nothing else. Nothing for another text, and for
+// a number that is too large.
+std::optional<int> whole_number(std::string_view digits);
 
 // Longest language code; the program hands it on in a buffer of 8 bytes.
 inline constexpr std::size_t kLongestLanguage = 7;
