@@ -131,12 +131,25 @@ int VornQazTimeConvert(const char* seconds, char* out, size_t size);
 // The current time as decimal seconds since the epoch.
 int VornQazGetTimeSecond(char* out, size_t size);
 
-// Writes the MD5 digest of the first `size` bytes of the file `path` into `digest`, as 32
-// hexadecimal digits without terminator (`digest_size` must be 32). Follows no link in the last
-// component. 0; 2 when the file vanished, may not be read, is no regular file any more, has another
-// size or changes while it is read, an expected outcome on a server in use; -1 for any other
-// failure.
+// Writes a digest of the first `size` bytes of the file `path` into `digest`, as 32 hexadecimal
+// digits without terminator (`digest_size` must be 32). Files of one size have equal digests when
+// their contents are equal, whatever holes they have. It is the content's MD5, but not where an
+// aligned MiB (2^20 bytes) holds nothing but zeros: such are left out and counted, so that holes
+// cost nothing. It tells copies apart and isn't made to be shown.
+// Follows no link in the last component, with one exception: "/proc/self/fd/" and a number names
+// what that descriptor of the caller's holds, which may be an O_PATH handle. The access time stays
+// where the system lets it.
+// 0; 2 when the file vanished, may not be read, is no regular file any more, has another size or
+// changes while it is read, an expected outcome on a server in use, with errno EWOULDBLOCK when a
+// client has it leased for the moment; also 2 when the deadline passes before the end; -1 for any
+// other failure.
 int VornQazGetFileMd5(const char* path, unsigned long long size, char* digest, size_t digest_size);
+
+// Digests end `seconds` from now, whatever happens to the clock: a computation that goes on then is
+// broken off, and no other begins. 0: there is no such deadline any more, as at the start.
+void VornQazSetDigestDeadline(unsigned long long seconds);
+// Non-zero once the deadline has passed.
+int VornQazDigestDeadlinePassed(void);
 
 // Finishes a CSV file: puts a UTF-8 byte order mark before it unless it has one. Atomic; harmless
 // when repeated. 0 or -1.
