@@ -3,83 +3,112 @@
 #include <fcntl.h>
 #include <linux/openat2.h>
 #include <sys/syscall.h>
-#include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
-#include <cstdint>
 #include <string>
 #include <string_view>
 
 namespace vornreport {
 namespace {
 
+constexpr int kHandle = O_PATH | O_NOFOLLOW | O_CLOEXEC;
+
 // The folder of the share that was asked for last: files come share by share.
 class TopFolder {
  public:
   // A descriptor that stays this object's, or -1.
   int get(const char* folder) {
-    if (fd_ < 0 || path_ != folder) {
-      if (fd_ >= 0) {
-        close(fd_);
-      }
+    if (!opened_ || path_ != folder) {
       path_ = folder;
-      fd_ = open(folder, O_PATH | O_DIRECTORY | O_CLOEXEC);
+      opened_ = Descriptor(open(folder, O_PATH | O_DIRECTORY | O_CLOEXEC));
     }
-    return fd_;
+    return opened_.get();
   }
 
  private:
   std::string path_;
-  int fd_ = -1;
+  Descriptor opened_;
 };
 
-// The part of `path` below `folder`, or null.
+// Takes the first name off `path`, and the slashes around it; empty at the end.
+std::string_view take_name(std::string_view& path) {
+  path.remove_prefix(std::min(path.find_first_not_of('/'), path.size()));
+  const std::string_view name = path.substr(0, path.find('/'));
+  path.remove_prefix(name.size());
+  path.remove_prefix(std::min(path.find_first_not_of('/'), path.size()));
+  return name;
+}
+
+// The part of `path` below `folder`, or null. One that climbs is none, even if it came back down:
+// nobody gathers such a path.
 const char* part_below(const char* folder, const char* path) {
   const std::string_view whole(path);
-  std::string_view top(folder != nullptr ? folder : "");
+  std::string_view top(folder);
   while (top.ends_with('/')) {
     top.remove_suffix(1);
   }
-  if (folder == nullptr || !whole.starts_with(top) || !whole.substr(top.size()).starts_with('/')) {
+  if (!whole.starts_with(top) || !whole.substr(top.size()).starts_with('/')) {
     return nullptr;
   }
-  const char* below = path + top.size();
-  while (*below == '/') {
-    ++below;
+  const size_t start = std::min(whole.find_first_not_of('/', top.size()), whole.size());
+  std::string_view rest = whole.substr(start);
+  if (rest.empty()) {
+    return nullptr;
   }
-  return *below == '\0' ? nullptr : below;
+  while (!rest.empty()) {
+    if (take_name(rest) == "..") {
+      return nullptr;
+    }
+  }
+  return path + start;
 }
 
-int open_below(int top, const char* below, uint64_t flags) {
+// What openat2 does, folder by folder, where a container or an old kernel doesn't know it.
+Descriptor walk_below(int top, std::string_view below) {
+  Descriptor folder;
+  while (!below.empty()) {
+    const std::string name(take_name(below));
+    const int flags = below.empty() ? kHandle : kHandle | O_DIRECTORY;
+    Descriptor next(openat(folder ? folder.get() : top, name.c_str(), flags));
+    if (!next) {
+      return next;
+    }
+    folder = std::move(next);
+  }
+  return folder;
+}
+
+Descriptor open_below(int top, const char* below) {
   open_how how{};
-  how.flags = flags;
+  how.flags = kHandle;
   how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
-  const auto opened = static_cast<int>(syscall(SYS_openat2, top, below, &how, sizeof how));
-  if (opened < 0 && (errno == ENOSYS || errno == EPERM)) {
-    // A container that knows no openat2: only a link in the last place is refused then.
-    return openat(top, below, static_cast<int>(flags));
+  const int before = errno;
+  Descriptor opened(static_cast<int>(syscall(SYS_openat2, top, below, &how, sizeof how)));
+  if (!opened && (errno == ENOSYS || errno == EPERM)) {
+    errno = before;
+    return walk_below(top, below);
   }
   return opened;
 }
 
 }  // namespace
 
-int open_below_share(const char* share_folder, const char* path, int flags) {
+Descriptor open_below_share(const char* share_folder, const char* path) {
   static TopFolder top;
-  const int all_flags = flags | O_CLOEXEC | O_NOFOLLOW;
-  const char* below = part_below(share_folder, path);
-  const int folder = below != nullptr ? top.get(share_folder) : -1;
-  return folder < 0 ? open(path, all_flags)
-                    : open_below(folder, below, static_cast<uint64_t>(all_flags));
+  const char* below = share_folder != nullptr ? part_below(share_folder, path) : nullptr;
+  if (below == nullptr) {
+    errno = share_folder == nullptr ? ENOENT : EXDEV;
+    return {};
+  }
+  const int folder = top.get(share_folder);
+  return folder < 0 ? Descriptor() : open_below(folder, below);
 }
 
 bool stat_below_share(const char* share_folder, const char* path, struct stat& status) {
   const int before = errno;
-  const int file = open_below_share(share_folder, path, O_PATH);
-  const bool found = file >= 0 && fstat(file, &status) == 0;
-  if (file >= 0) {
-    close(file);
-  }
+  const Descriptor file = open_below_share(share_folder, path);
+  const bool found = file && fstat(file.get(), &status) == 0;
   errno = before;
   return found;
 }

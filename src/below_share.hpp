@@ -4,14 +4,17 @@
 
 #include <sys/stat.h>
 
+#include "vornreport/handles.hpp"
+
 namespace vornreport {
 
-// Opens the gathered file `path` with the flags `flags` (O_CLOEXEC and O_NOFOLLOW are added).
-// `share_folder` is the folder of its share; null or a folder that `path` doesn't lie in: only a
-// link in the last place is refused. A descriptor for the caller, or -1 as open().
-int open_below_share(const char* share_folder, const char* path, int flags);
+// A handle (O_PATH) of what `path` names: nothing is opened by it, so no pipe finds its reader and
+// no device starts. A link in the last place is named itself. `share_folder` is the folder of its
+// share. None, with errno: ENOENT when it is null, EXDEV when `path` doesn't lie in it or climbs
+// by "..", else as open().
+Descriptor open_below_share(const char* share_folder, const char* path);
 
-// What the file is now. False when it isn't there, or can't be reached so.
+// What the file is now. False when it isn't there, or can't be reached so; errno is left alone.
 bool stat_below_share(const char* share_folder, const char* path, struct stat& status);
 
 }  // namespace vornreport

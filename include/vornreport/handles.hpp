@@ -4,9 +4,11 @@
 
 #include <dirent.h>
 #include <sqlite3.h>
+#include <unistd.h>
 
 #include <cstdio>
 #include <memory>
+#include <utility>
 
 #include "vorn/text.h"
 #include "vorn/user.h"
@@ -30,6 +32,29 @@ using HashHandle = std::unique_ptr<VLIBCSzHash, ReleaseWith<&VLIBCSzHashFree>>;
 using UserHandle = std::unique_ptr<VORNUser, ReleaseWith<&VORNUserFree>>;
 using VolumesHandle = std::unique_ptr<VORNMountVolInfo, ReleaseWith<&VORNMountVolInfoFree>>;
 using ListHandle = std::unique_ptr<VLIBCSzList, ReleaseWith<&VLIBCSzListFree>>;
+
+// Owns a file descriptor; -1 is none.
+class Descriptor {
+ public:
+  Descriptor() = default;
+  explicit Descriptor(int fd) : fd_(fd) {}
+  Descriptor(Descriptor&& other) noexcept : fd_(std::exchange(other.fd_, -1)) {}
+  Descriptor& operator=(Descriptor&& other) noexcept {
+    std::swap(fd_, other.fd_);
+    return *this;
+  }
+  ~Descriptor() {
+    if (fd_ >= 0) {
+      close(fd_);
+    }
+  }
+
+  int get() const { return fd_; }
+  explicit operator bool() const { return fd_ >= 0; }
+
+ private:
+  int fd_ = -1;
+};
 
 // Runs a platform call that fills or replaces a hash or list through its address:
 // `with_address(hash, [&](VLIBCSzHash** h) { return VORNFill(h); })`. The owner follows the handle.

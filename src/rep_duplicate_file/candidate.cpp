@@ -19,6 +19,7 @@
 #include "module.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
+#include "vornreport/handles.hpp"
 
 namespace vornreport {
 namespace {
@@ -26,21 +27,7 @@ namespace {
 enum Column { kShare, kPath, kSize, kModifyTime };
 constexpr size_t kLongestText = 4095;
 
-class Descriptor {
- public:
-  explicit Descriptor(int fd) : fd_(fd) {}
-  ~Descriptor() {
-    if (fd_ >= 0) {
-      close(fd_);
-    }
-  }
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-  int get() const { return fd_; }
-
- private:
-  int fd_;
-};
+constexpr int kDigestChanged = 2;  // as VornQazGetFileMd5 says it
 
 std::string_view cut(const char* text) {
   return std::string_view(text).substr(0, kLongestText);
@@ -62,65 +49,125 @@ void log_open_failure(const dup_file_node& file) {
   }
 }
 
-bool is_regular(int file) {
-  struct stat status {};
-  if (fstat(file, &status) != 0) {
+// A path that leads to what `handle` names, wherever that stands by now.
+std::string path_of(const Descriptor& handle) {
+  return "/proc/self/fd/" + std::to_string(handle.get());
+}
+
+// False, with errno, for anything else: it was one when it was gathered.
+bool is_regular_file(const Descriptor& handle, struct stat& status) {
+  if (fstat(handle.get(), &status) != 0) {
     return false;
   }
-  if (!S_ISREG(status.st_mode)) {
-    errno = ESTALE;  // it was when it was gathered
-    return false;
+  errno = S_ISREG(status.st_mode) ? errno : S_ISLNK(status.st_mode) ? ELOOP : ESTALE;
+  return S_ISREG(status.st_mode);
+}
+
+// Opens what `handle` names for reading, its access time left alone where the system lets us.
+// Doesn't wait for who holds a lease.
+Descriptor open_content(const Descriptor& handle) {
+  constexpr int kFlags = O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
+  const std::string path = path_of(handle);
+  const int before = errno;
+  Descriptor opened(open(path.c_str(), kFlags | O_NOATIME));
+  if (!opened && errno == EPERM) {
+    errno = before;
+    opened = Descriptor(open(path.c_str(), kFlags));
   }
-  return true;
+  return opened;
 }
 
 enum class Try { kFirst, kLast };
+enum class Sample { kRead, kNone, kLeased };
 
-// The sample's bytes, zeros where there are none. Read, not mapped: a file that shrinks meanwhile
-// must not end the process. False, silent, at a first try when somebody holds a lease on the file,
-// who gives it up within a moment.
-bool read_sample(const dup_file_node& file, std::array<char, kSampleSize>& sample, Try which) {
+// Fills `sample` with the file's bytes and notes in `file` which file that was. Read, not mapped: a
+// file that shrinks meanwhile must not end the process. kNone, reported, leaves zeros; kLeased,
+// silent and at a first try only: somebody holds a lease, who gives it up within a moment.
+Sample read_sample(dup_file_node& file, std::array<char, kSampleSize>& sample, Try which) {
   const uint64_t length = std::min(file.size, kSampleSize);
   const uint64_t offset = file.size <= kSampleSize ? 0 : file.size / 2 / kSampleSize * kSampleSize;
   sample.fill(0);
-  // Doesn't wait for the writer of a fifo.
   const int before = errno;
-  const Descriptor opened(
-      open_below_share(file.share_folder, file.path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY));
-  if (opened.get() < 0 && errno == EWOULDBLOCK && which == Try::kFirst) {
+  const Descriptor handle = open_below_share(file.share_folder, file.path.c_str());
+  struct stat status {};
+  const bool is_regular = handle && is_regular_file(handle, status);
+  const Descriptor opened = is_regular ? open_content(handle) : Descriptor();
+  if (is_regular && !opened && errno == EWOULDBLOCK && which == Try::kFirst) {
     errno = before;
-    return false;
+    return Sample::kLeased;
   }
-  if (opened.get() < 0) {
+  if (!handle || S_ISLNK(status.st_mode) || (is_regular && !opened)) {
     log_open_failure(file);
-  } else if (!is_regular(opened.get()) ||
-             pread(opened.get(), sample.data(), length, static_cast<off_t>(offset)) < 0) {
+    return Sample::kNone;
+  }
+  if (!opened || pread(opened.get(), sample.data(), length, static_cast<off_t>(offset)) < 0) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__,
                           "map file failed, file=%s, nSeg=%llu, offset=%llu", file.path.c_str(),
                           static_cast<unsigned long long>(length),
                           static_cast<unsigned long long>(offset));
+    return Sample::kNone;
   }
+  file.device = status.st_dev;
+  file.inode = status.st_ino;
+  return Sample::kRead;
+}
+
+// False when the file is leased: it wants another try.
+bool take_sample(dup_file_node& file, Try which) {
+  static std::array<char, kSampleSize> bytes;
+  const Sample sample = read_sample(file, bytes, which);
+  if (sample == Sample::kLeased) {
+    return false;
+  }
+  if (sample == Sample::kNone) {
+    file.failure = {kDigestChanged, errno};  // what it may be now isn't for us to read
+  }
+  const XXH128_hash_t digest = XXH3_128bits(bytes.data(), bytes.size());
+  file.sample = {digest.high64, digest.low64};
   return true;
 }
 
-void digest_sample(dup_file_node& file, const std::array<char, kSampleSize>& sample) {
-  const XXH128_hash_t digest = XXH3_128bits(sample.data(), sample.size());
-  file.sample = {digest.high64, digest.low64};
+// Whether an error says that users moved, replaced or closed something since.
+constexpr bool means_changed(int error) {
+  return error == ENOENT || error == ENOTDIR || error == ELOOP || error == EXDEV ||
+         error == EACCES || error == ESTALE;
 }
 
-// False, reported, when the file's digest can't be had.
+// As VornQazGetFileMd5, of the very file that the sample was read from.
+int ask_digest(dup_file_node& file) {
+  const Descriptor handle = open_below_share(file.share_folder, file.path.c_str());
+  struct stat status {};
+  if (!handle || !is_regular_file(handle, status)) {
+    return means_changed(errno) ? kDigestChanged : -1;
+  }
+  if (status.st_dev != file.device || status.st_ino != file.inode) {
+    errno = ESTALE;
+    return kDigestChanged;
+  }
+  return VornQazGetFileMd5(path_of(handle).c_str(), file.size, file.md5.data(), file.md5.size());
+}
+
+// False, reported each time, when the file's digest can't be had.
 bool ensure_digest(dup_file_node& file) {
   if (file.digest_done) {
     return true;
   }
-  const int result =
-      VornQazGetFileMd5(file.path.c_str(), file.size, file.md5.data(), file.md5.size());
-  if (result == 0) {
-    file.digest_done = true;
-    return true;
+  DigestFailure failure = file.failure;
+  if (failure.result == 0) {
+    failure.result = ask_digest(file);
+    if (failure.result == 0) {
+      file.digest_done = true;
+      return true;
+    }
+    failure.error = errno;
+    // Who holds a lease gives it up: the next pair may have more luck.
+    if (failure.error != EWOULDBLOCK) {
+      file.failure = failure;
+    }
   }
+  errno = failure.error;
   const auto size = static_cast<unsigned long long>(file.size);
-  if (result == 2) {
+  if (failure.result == kDigestChanged) {
     report_trace(kDuplicateModule, __LINE__, "count md5 failed, file=%s, size=%llu\n",
                  file.path.c_str(), size);
   } else {
@@ -173,19 +220,14 @@ int read_fast_digests(const QAZLLNode* candidates) {
   if (file_of(candidates)->size == 0) {
     return 0;
   }
-  static std::array<char, kSampleSize> sample;
   std::vector<dup_file_node*> leased;
   for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
-    dup_file_node& file = *file_of(node);
-    if (read_sample(file, sample, Try::kFirst)) {
-      digest_sample(file, sample);
-    } else {
-      leased.push_back(&file);
+    if (!take_sample(*file_of(node), Try::kFirst)) {
+      leased.push_back(file_of(node));
     }
   }
   for (dup_file_node* file : leased) {
-    read_sample(*file, sample, Try::kLast);
-    digest_sample(*file, sample);
+    take_sample(*file, Try::kLast);
   }
   return 0;
 }

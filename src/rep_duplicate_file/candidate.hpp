@@ -1,6 +1,8 @@
 // Files of one size whose contents are to be compared.
 #pragma once
 
+#include <sys/types.h>
+
 #include <array>
 #include <cstdint>
 #include <string>
@@ -14,6 +16,12 @@ namespace vornreport {
 // as impossible, and would cost one comparison of whole files.
 using SampleDigest = std::pair<uint64_t, uint64_t>;
 
+// Why a file has no digest: VornQazGetFileMd5's result and errno. Result 0: it hasn't failed.
+struct DigestFailure {
+  int32_t result;
+  int32_t error;
+};
+
 // One file. A bucket can hold a million of them, so a node holds real texts, not their widest
 // fields, and the members of a group are the candidates themselves, linked by `next`.
 struct dup_file_node {
@@ -25,7 +33,10 @@ struct dup_file_node {
   const char* share_folder;  // belongs to the share path hash; null when unknown
   dup_file_node* next;       // the member of the group that was found before this one
   SampleDigest sample;       // of 4096 bytes, filled up with zeros
+  dev_t device;              // of the file that the sample was read from, which the digest
+  ino_t inode;               // must be of as well
   std::array<char, 32> md5;  // hexadecimal digits, once `digest_done`
+  DigestFailure failure;     // of the sample or the digest; it isn't asked for again
   bool digest_done;
   bool grouped;
 };
@@ -44,11 +55,14 @@ int add_candidate(QAZLLNode** candidates, char* const* columns, int32_t ordinal,
                   const char* share_folder);
 
 // Reads the sample of every candidate: the whole file up to 4096 bytes, else 4096 bytes from its
-// middle. A file that can't be read (logged) keeps a sample of zeros. 0; -1 for an empty list.
+// middle. A file that can't be read (logged) keeps a sample of zeros and gets no digest. Only
+// regular files below their share's folder are opened, and none through a link. Ends when the
+// comparison's time does. 0; -1 for an empty list.
 int read_fast_digests(const QAZLLNode* candidates);
 
-// Compares two files of one size by their MD5 digests, each of which is computed once. 0 when they
-// match, 1 when they differ, -1 (logged) when a digest can't be had.
+// Compares two files of one size by their digests, each of which is computed once, of the file that
+// the sample was read from. 0 when they match, 1 when they differ, -1 (logged) when a digest can't
+// be had.
 int compare_files(dup_file_node& a, dup_file_node& b);
 
 // Frees a bucket's lists; both are empty then.

@@ -1,6 +1,15 @@
 // The reports that differ from the frame's usual one, over a real statistics database.
+#include <linux/filter.h>
+#include <linux/seccomp.h>
+#include <sys/inotify.h>
+#include <sys/prctl.h>
+#include <sys/syscall.h>
+
 #include <algorithm>
+#include <cstddef>
+#include <filesystem>
 #include <random>
+#include <set>
 #include <sstream>
 
 #include "rep_duplicate_file/content_groups.hpp"
@@ -26,10 +35,21 @@ class ReportsTest : public ReportTest {
 
   using ReportTest::add;
   static void add(QAZLLNode** candidates, std::string path, std::string size,
-                  const char* share_folder = nullptr) {
+                  const char* share_folder) {
     char* columns[] = {const_cast<char*>("s"), path.data(), size.data(), const_cast<char*>("5"),
                        const_cast<char*>("n")};
     ASSERT_EQ(add_candidate(candidates, columns, 1, share_folder), 0);
+  }
+
+  // What comparing files of one byte prints; their groups go to the CSV file.
+  std::string compare(const std::vector<std::string>& paths) {
+    const std::string share = folder_.path();
+    QAZLLNode* candidates = nullptr;
+    QAZLLNode* groups = nullptr;
+    for (const std::string& path : paths) {
+      add(&candidates, path, "1", share.c_str());
+    }
+    return printed([&] { handle_size_bucket(profile_.get(), &groups, &candidates); });
   }
 };
 
@@ -104,19 +124,21 @@ std::string groups_of(const std::string& csv) {
   return groups.empty() ? "" : groups + "\n";
 }
 
-// The pairs of the "not match" lines, one a line.
-std::string mismatches_of(const std::string& output) {
-  constexpr std::string_view kStart = "not match file=";
-  std::string pairs;
-  for (size_t at = output.find(kStart); at != std::string::npos; at = output.find(kStart, at + 1)) {
-    const size_t begin = at + kStart.size();
-    pairs += output.substr(begin, output.find('\n', begin) + 1 - begin);
+// What stands behind `start` in the lines that have it, one a line.
+std::string rests_of(const std::string& output, std::string_view start) {
+  std::string rests;
+  for (size_t at = output.find(start); at != std::string::npos; at = output.find(start, at + 1)) {
+    const size_t begin = at + start.size();
+    rests += output.substr(begin, output.find('\n', begin) + 1 - begin);
   }
-  return pairs;
+  return rests;
 }
 
+constexpr char kNoMatch[] = "not match file=";
+
 // A bucket is looked up by sample; its groups and the order of its lines must be the pairwise
-// walk's. Samples and digests are drawn from few values, some digests can't be had.
+// walk's. Samples and digests are drawn from few values, some digests can't be had. None is asked
+// for twice.
 TEST_F(ReportsTest, ContentGroupsAreThoseOfThePairwiseWalk) {
   std::mt19937 random(7);
   for (int round = 0; round < 40; ++round) {
@@ -132,14 +154,10 @@ TEST_F(ReportsTest, ContentGroupsAreThoseOfThePairwiseWalk) {
       platform.digests[paths.back()] = digests.back();
     }
     const std::string found = in_child([&] {
-      QAZLLNode* candidates = nullptr;
-      QAZLLNode* groups = nullptr;
-      for (std::string& path : paths) {
-        add(&candidates, path, "1");
-      }
-      const std::string output =
-          printed([&] { handle_size_bucket(profile_.get(), &groups, &candidates); });
-      return mismatches_of(output) + "|" + groups_of(csv("duplicate_file"));
+      const std::string output = compare(paths);
+      const std::set<std::string> calls(platform.calls.begin(), platform.calls.end());
+      return rests_of(output, kNoMatch) + "|" + groups_of(csv("duplicate_file")) +
+             (calls.size() == platform.calls.size() ? "" : "asked twice");
     });
     const Expected expected = pairwise(paths, samples, digests);
     EXPECT_EQ(found, expected.lines + "|" + expected.groups);
@@ -147,23 +165,69 @@ TEST_F(ReportsTest, ContentGroupsAreThoseOfThePairwiseWalk) {
   }
 }
 
-// A link that was put in a folder's place since the gathering is not followed to the file behind
-// it.
-TEST_F(ReportsTest, SamplesAreNotReadThroughLinks) {
+// As in a container that knows no openat2.
+void deny_openat2() {
+  sock_filter filter[] = {BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr)),
+                          BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, SYS_openat2, 0, 1),
+                          BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | ENOSYS),
+                          BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW)};
+  const sock_fprog program{std::size(filter), filter};
+  prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0);
+  prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &program);
+}
+
+// Since the gathering somebody may have put links, pipes or other folders in the way, and an index
+// can name anything.
+TEST_F(ReportsTest, OnlyTheSharesOwnFilesAreRead) {
   const std::string share = folder_.path("share");
+  const std::string places[] = {"/f", "/in/f", "/../outside/f", "/pipe", "/moved/f"};
   support::write_file(folder_.path("outside/f"), "secret");
   support::write_file(share + "/f", "secret");
   ASSERT_EQ(symlink("../outside", (share + "/in").c_str()), 0);
-  QAZLLNode* candidates = nullptr;
-  QAZLLNode* groups = nullptr;
-  for (std::string path : {share + "/f", share + "/in/f"}) {
-    add(&candidates, path, "6", share.c_str());
+  ASSERT_EQ(mkfifo((share + "/pipe").c_str(), 0600), 0);
+  platform.digests[share + "/f"] = "digest";
+  std::string failed;
+  for (const std::string& place : places) {
+    failed += place == "/f" ? "" : share + place + ", size=6\n";
   }
-  printed([&] { EXPECT_EQ(read_fast_digests(candidates), 0); });
-  EXPECT_NE(file_of(candidates)->sample, file_of(candidates->next)->sample);
-  EXPECT_NE(support::syslog_text().find("open file failed, file=" + share + "/in/f,(40)"),
-            std::string::npos);
-  release_bucket(&groups, &candidates);
+  for (const bool is_denied : {false, true}) {
+    support::write_file(share + "/moved/f", "secret");
+    const std::string found = in_child([&] {
+      if (is_denied) {
+        deny_openat2();
+      }
+      const int opens = inotify_init1(IN_NONBLOCK);
+      inotify_add_watch(opens, folder_.path("outside/f").c_str(), IN_OPEN);
+      inotify_add_watch(opens, (share + "/pipe").c_str(), IN_OPEN);
+      QAZLLNode* candidates = nullptr;
+      for (const std::string& place : places) {
+        add(&candidates, share + place, "6", share.c_str());
+      }
+      const std::string output = printed([&] {
+        read_fast_digests(candidates);
+        std::filesystem::rename(share + "/moved", share + "/away");
+        std::filesystem::create_directory(share + "/moved");
+        support::write_file(share + "/moved/f", "guess!");
+        for (const QAZLLNode* node = candidates->next; node != nullptr; node = node->next) {
+          compare_files(*file_of(candidates), *file_of(node));
+        }
+      });
+      char event[4096];
+      return rests_of(output, "count md5 failed, file=") + platform.calls.back() +
+             (platform.calls.size() == 1 && read(opens, event, sizeof event) < 0 ? "" : " more");
+    });
+    EXPECT_EQ(found, failed + "GetFileMd5 " + share + "/f");
+    const std::string log = support::syslog_text();
+    EXPECT_NE(
+        log.find("open file failed, file=" + share + (is_denied ? "/in/f,(20)" : "/in/f,(40)")),
+        std::string::npos);
+    EXPECT_NE(log.find("open file failed, file=" + share + "/../outside/f,(18)"),
+              std::string::npos);
+    EXPECT_NE(log.find("map file failed, file=" + share + "/pipe,"), std::string::npos);
+    EXPECT_EQ(log.find("md5"), std::string::npos);
+    std::filesystem::remove_all(share + "/away");
+    std::filesystem::remove_all(share + "/moved");
+  }
 }
 
 }  // namespace

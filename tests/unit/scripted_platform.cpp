@@ -2,6 +2,7 @@
 
 #include <cstdio>
 #include <cstring>
+#include <filesystem>
 
 #include "base/text_containers.hpp"
 #include "vorn/config.h"
@@ -279,8 +280,9 @@ int VornQazTimeConvert(const char* seconds, char* out, size_t size) {
 
 int VornQazGetFileMd5(const char* path, unsigned long long /*size*/, char* digest,
                       size_t digest_size) {
-  record("GetFileMd5", path);
-  const std::string text = platform.digests[path];
+  const std::string file = std::filesystem::read_symlink(path);  // the caller's handle
+  record("GetFileMd5", file.c_str());
+  const std::string text = platform.digests[file];
   if (text.size() <= 2) {
     return text == "2" ? 2 : -1;
   }
