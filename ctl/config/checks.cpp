@@ -146,6 +146,10 @@ std::string sender_problem(const std::string& value) {
              : in_quotes(value) + " is no mail address; write name@domain";
 }
 
+std::string minutes_problem(const std::string& value) {
+  return report_format::whole_number(value) ? "" : "is no whole number of minutes; 0 is no limit";
+}
+
 std::string no_problem(const std::string& /*value*/) {
   return "";
 }
@@ -175,6 +179,8 @@ constexpr ProfileKey kKeys[] = {
      users_problem},
     {"duplicate_compare", nullptr, "true|false", "true compares contents of duplicates", false,
      truth_problem},
+    {"duplicate_compare_minutes", nullptr, "N",
+     "Longest comparison of contents (default: no limit)", false, minutes_problem},
     {"volume_history", nullptr, "true|false", "true shows history and forecast of volumes", false,
      truth_problem},
     {"keep_reports", "--keep-reports", "N", "Number of reports to keep (default: all)", false,

@@ -16,6 +16,7 @@
 #include <vector>
 
 #include "below_share.hpp"
+#include "compare_limit.hpp"
 #include "module.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
@@ -222,6 +223,9 @@ int read_fast_digests(const QAZLLNode* candidates) {
   }
   std::vector<dup_file_node*> leased;
   for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
+    if (past_compare_limit(file_of(node)->size)) {
+      return 0;
+    }
     if (!take_sample(*file_of(node), Try::kFirst)) {
       leased.push_back(file_of(node));
     }

@@ -2,9 +2,11 @@
 
 #include <algorithm>
 #include <numeric>
+#include <tuple>
 #include <utility>
 #include <vector>
 
+#include "compare_limit.hpp"
 #include "facts/duplicate_tally.hpp"
 #include "facts/run_facts.hpp"
 #include "module.hpp"
@@ -47,16 +49,10 @@ class Bucket {
     for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
       files_.push_back(file_of(node));
     }
-    by_sample_.resize(files_.size());
-    std::iota(by_sample_.begin(), by_sample_.end(), uint32_t{0});
-    // Stable: within one sample the list's order is kept.
-    std::stable_sort(by_sample_.begin(), by_sample_.end(), [this](uint32_t a, uint32_t b) {
-      return files_[a]->sample < files_[b]->sample;
-    });
+    sorted_.resize(files_.size());
+    std::iota(sorted_.begin(), sorted_.end(), uint32_t{0});
     place_.resize(files_.size());
-    for (uint32_t place = 0; place < by_sample_.size(); ++place) {
-      place_[by_sample_[place]] = place;
-    }
+    sort([](const dup_file_node& a, const dup_file_node& b) { return a.sample < b.sample; });
   }
 
   // Appends every group to `groups`, in the order of their first members.
@@ -65,7 +61,13 @@ class Bucket {
       if (files_[first]->grouped) {
         continue;
       }
-      dup_file_node* chain = gather_matches(first);
+      dup_file_node* chain = nullptr;
+      if (!is_cut_short_) {
+        gather_matches(first, chain);
+      }
+      if (is_cut_short_) {
+        gather_digested(first, chain);
+      }
       if (chain != nullptr && QAZLLadd(groups, chain, nullptr) < 0) {
         REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "add node failed");
       }
@@ -73,31 +75,75 @@ class Bucket {
   }
 
  private:
-  // The file and all later ones that match it, last match first; null when none does.
-  dup_file_node* gather_matches(uint32_t first) {
+  // Sorts the places of all files; those of equal ones keep the list's order.
+  template <typename Less>
+  void sort(Less less) {
+    std::stable_sort(sorted_.begin(), sorted_.end(),
+                     [&](uint32_t a, uint32_t b) { return less(*files_[a], *files_[b]); });
+    for (uint32_t place = 0; place < sorted_.size(); ++place) {
+      place_[sorted_[place]] = place;
+    }
+  }
+
+  // Puts the file and all later ones that match it before `chain`, the last match first.
+  void gather_matches(uint32_t first, dup_file_node*& chain) {
     dup_file_node& a = *files_[first];
-    dup_file_node* chain = nullptr;
-    for (size_t place = place_[first] + size_t{1}; place < by_sample_.size(); ++place) {
-      dup_file_node& b = *files_[by_sample_[place]];
+    for (size_t place = place_[first] + size_t{1}; place < sorted_.size(); ++place) {
+      dup_file_node& b = *files_[sorted_[place]];
       if (b.sample != a.sample) {
         break;
       }
       if (b.grouped) {
         continue;
       }
+      if (past_compare_limit(a.size)) {
+        cut_short();
+        break;
+      }
       g_digested += (a.digest_done ? 0U : 1U) + (b.digest_done ? 0U : 1U);
-      if (compare_files(a, b) != 0) {
+      const int result = compare_files(a, b);
+      if (result < 0 && past_compare_limit(a.size)) {
+        cut_short();  // in the middle of a digest
+        break;
+      }
+      if (result != 0) {
         report_trace(kDuplicateModule, __LINE__, "##### match(%llu/%llu), not match file=(%s,%s)\n",
                      static_cast<unsigned long long>(g_grouped),
                      static_cast<unsigned long long>(g_digested), a.path.c_str(), b.path.c_str());
         continue;
       }
-      if (!a.grouped) {
-        prepend(a, chain);
-      }
-      prepend(b, chain);
+      join(a, b, chain);
     }
-    return chain;
+  }
+
+  // No pair is walked from now on: of those that have their digests, equal ones stand together.
+  void cut_short() {
+    is_cut_short_ = true;
+    sort([](const dup_file_node& a, const dup_file_node& b) {
+      return std::tie(a.sample, a.digest_done, a.md5) < std::tie(b.sample, b.digest_done, b.md5);
+    });
+  }
+
+  // As gather_matches(), of what is known already.
+  void gather_digested(uint32_t first, dup_file_node*& chain) {
+    dup_file_node& a = *files_[first];
+    for (size_t place = place_[first] + size_t{1}; a.digest_done && place < sorted_.size();
+         ++place) {
+      dup_file_node& b = *files_[sorted_[place]];
+      if (b.sample != a.sample || !b.digest_done || b.md5 != a.md5) {
+        break;
+      }
+      if (!b.grouped) {
+        join(a, b, chain);
+      }
+    }
+  }
+
+  static void join(dup_file_node& a, dup_file_node& b, dup_file_node*& chain) {
+    if (!a.grouped) {
+      prepend(a, chain);
+    }
+    prepend(b, chain);
   }
 
   static void prepend(dup_file_node& file, dup_file_node*& chain) {
@@ -108,8 +154,9 @@ class Bucket {
   }
 
   std::vector<dup_file_node*> files_;  // in list order
-  std::vector<uint32_t> by_sample_;    // indices of files_, by sample
-  std::vector<uint32_t> place_;        // of each file in by_sample_
+  std::vector<uint32_t> sorted_;       // indices of files_, by sample; cut short, by digest, too
+  std::vector<uint32_t> place_;        // of each file in sorted_
+  bool is_cut_short_ = false;
 };
 
 void write_data_member(FILE* data, const dup_file_node& file, bool is_first) {
@@ -142,12 +189,14 @@ void write_csv_member(FILE* csv, const dup_file_node& file) {
 
 }  // namespace
 
-void begin_content_groups() {
+void begin_content_groups(const VLIBCSzHash* profile_hash) {
+  begin_compare_limit(profile_hash);
   g_tally = DuplicateTally(/*by_content=*/true);
   g_rows = {};
 }
 
 void end_content_groups() {
+  end_compare_limit();
   run_facts().duplicates = g_tally.facts();
   run_facts().rows[report_format::kDuplicateFile.name] = g_rows;
 }
@@ -159,7 +208,7 @@ int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups,
     return -1;
   }
   int result = 0;
-  if (*candidates != nullptr) {
+  if (*candidates != nullptr && !past_compare_limit(file_of(*candidates)->size)) {
     if (read_fast_digests(*candidates) < 0) {
       REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "fast digest list failed");
       result = -1;

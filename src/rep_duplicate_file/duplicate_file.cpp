@@ -207,7 +207,7 @@ int32_t report_by_name_and_size(ReportArgs& args) {
 }
 
 int32_t report_by_content(ReportArgs& args) {
-  begin_content_groups();
+  begin_content_groups(args.profile_hash);
   args.embedded = 1;  // header, closing tag and CSV finishing belong to the group writers
   if (duplicate_file2_db(&args) < 0) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "duplicate_file_db failed");

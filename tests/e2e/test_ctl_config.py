@@ -217,6 +217,7 @@ class Profiles(ControlTest):
                 ('link_base', 'x', 'http'), ('limit_user', 'nobody,rot', '"rot" is no user'),
                 ('language', "de-'", 'not installed'),
                 ('duplicate_compare', '1', 'true nor false'), ('keep_reports', '0', 'from 1 on'),
+                ('duplicate_compare_minutes', '-1', 'no whole number'),
                 ('schedule_collect_id', 'a.b', 'identifier'), ('mail_t', 'x', 'mean "mail_to"'),
                 ('mail_from', 'a@b\nc = d', 'line break'), (b'limit_user', b'\xff', 'not UTF-8'))),
             ((*put, 'language', 'fr', 'mail_to', 'x'), None, 'no mail address'),

@@ -11,7 +11,9 @@
 #include <random>
 #include <set>
 #include <sstream>
+#include <tuple>
 
+#include "facts/run_facts.hpp"
 #include "rep_duplicate_file/content_groups.hpp"
 #include "rep_duplicate_file/duplicate_file.hpp"
 #include "rep_file_group.hpp"
@@ -227,6 +229,49 @@ TEST_F(ReportsTest, OnlyTheSharesOwnFilesAreRead) {
     EXPECT_EQ(log.find("md5"), std::string::npos);
     std::filesystem::remove_all(share + "/away");
     std::filesystem::remove_all(share + "/moved");
+  }
+}
+
+// It ends before a digest or in the middle of one; what is known by then is grouped.
+TEST_F(ReportsTest, TheComparisonEndsWithItsTime) {
+  std::vector<std::string> paths;
+  for (const auto& [name, digest] : TextMap{{"a", "one"}, {"b", "two"}, {"c", "two"}, {"d", "2"}}) {
+    paths.push_back(folder_.path(name));
+    support::write_file(paths.back(), "x");
+    platform.digests[paths.back()] = digest;
+  }
+  const std::string pairs =
+      "(" + paths[0] + "," + paths[1] + ")\n(" + paths[0] + "," + paths[2] + ")\n";
+  for (const size_t digests : {0U, 3U, 4U}) {
+    set_profile("duplicate_compare_minutes", "2");
+    const std::string found = in_child([&] {
+      run_facts().incidents.clear();
+      begin_content_groups(profile_.get());
+      platform.calls.clear();
+      platform.is_past_deadline = [&] { return platform.calls.size() >= digests; };
+      std::string output = compare(paths);
+      output += compare({folder_.path("gone"), folder_.path("gone")});
+      const auto& incidents = run_facts().incidents;
+      return rests_of(output, kNoMatch) + rests_of(output, "open file failed") +
+             groups_of(csv("duplicate_file")) +
+             (incidents.empty() ? "" : incidents[0].kind + ": " + incidents[0].text);
+    });
+    EXPECT_EQ(found, (digests == 0 ? "" : pairs + paths[2] + " " + paths[1] + "\n") +
+                         "compare_stopped: the comparison of contents reached its limit of 2 "
+                         "minutes at files of "
+                         "1\u00a0B; smaller ones were not compared; raise "
+                         "duplicate_compare_minutes");
+    EXPECT_EQ(support::syslog_lines().size(), 1U);
+    unlink(folder_.path("duplicate_file.csv").c_str());
+  }
+  const std::tuple<const char*, const char*, size_t> values[] = {
+      {"3", "180", 0}, {"0", "0", 0},  {"", "0", 0},
+      {"-1", "0", 1},  {"1m", "0", 1}, {"99999999999", "0", 1}};
+  for (const auto& [value, seconds, lines] : values) {
+    set_profile("duplicate_compare_minutes", value);
+    printed([&] { begin_content_groups(profile_.get()); });
+    EXPECT_EQ(platform.calls.back(), std::string("SetDigestDeadline ") + seconds) << value;
+    EXPECT_EQ(support::syslog_lines().size(), lines) << value;
   }
 }
 

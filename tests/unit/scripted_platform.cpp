@@ -292,6 +292,14 @@ int VornQazGetFileMd5(const char* path, unsigned long long /*size*/, char* diges
   return 0;
 }
 
+void VornQazSetDigestDeadline(unsigned long long seconds) {
+  record("SetDigestDeadline", std::to_string(seconds).c_str());
+}
+
+int VornQazDigestDeadlinePassed(void) {
+  return platform.is_past_deadline && platform.is_past_deadline() ? 1 : 0;
+}
+
 // Marks what it did, so that a test sees which texts went through it.
 int VornQazEscChar(const char* text, char* out, size_t size, char quote) {
   const bool fails = platform.fails("EscChar");

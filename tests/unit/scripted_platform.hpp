@@ -2,6 +2,7 @@
 // any call can be made to fail. The text containers are the real ones.
 #pragma once
 
+#include <functional>
 #include <map>
 #include <set>
 #include <string>
@@ -34,6 +35,7 @@ struct ScriptedPlatform {
   std::set<std::string> quotas;  // mount paths of volumes that keep them
   std::vector<std::string> progress;
   std::map<std::string, std::string> digests;  // path to MD5 text; "2" or "-1": that result
+  std::function<bool()> is_past_deadline;      // of the digests; never when it is empty
   std::set<std::string> unselected;            // shares that the profile leaves out
   int fs_kind = 1;
   std::map<std::string, int> fs_kinds;  // for single folders
