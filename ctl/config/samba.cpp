@@ -20,7 +20,8 @@ using Parameters = std::map<std::string, std::string, std::less<>>;
 
 struct Service {
   std::string name;
-  Parameters parameters;
+  Parameters parameters{};
+  bool of_user = false;
 };
 
 std::string lower(std::string_view text) {
@@ -51,7 +52,7 @@ std::vector<Service> parse_services(std::string_view text) {
     text.remove_prefix(std::min(end + 1, text.size()));
     const std::size_t equals = line.find('=');
     if (line.size() >= 2 && line.front() == '[' && line.back() == ']') {
-      services.push_back({std::string(line.substr(1, line.size() - 2)), {}});
+      services.push_back({.name = std::string(line.substr(1, line.size() - 2))});
     } else if (!services.empty() && equals != std::string_view::npos && line.front() != '#') {
       std::string_view value = host::trimmed(line.substr(equals + 1));
       if (value.size() >= 2 && value.front() == '"' && value.back() == '"') {
@@ -74,7 +75,7 @@ SambaShare judged(const Service& service, const Parameters& defaults) {
     }
     return "";
   };
-  SambaShare share{service.name, value("path"), ""};
+  SambaShare share{service.name, value("path"), "", service.of_user};
   const std::string name = lower(share.name);
   if (name == "homes") {
     share.skipped = "it stands for the home folders of all users";
@@ -158,7 +159,7 @@ std::vector<Service> user_services(const Parameters& global) {
 
 }  // namespace
 
-std::vector<SambaShare> samba_shares(UserShares user_shares) {
+std::vector<SambaShare> samba_shares() {
   std::vector<Service> services = configured_services();
   Parameters global;
   const auto is_global = [](const Service& service) { return lower(service.name) == "global"; };
@@ -168,9 +169,11 @@ std::vector<SambaShare> samba_shares(UserShares user_shares) {
     }
   }
   std::erase_if(services, is_global);
-  if (user_shares == UserShares::included) {
-    const std::vector<Service> more = user_services(global);
-    services.insert(services.end(), more.begin(), more.end());
+  // A user's share is known by where it comes from: testparm doesn't read them, and nothing in
+  // their text counts.
+  for (Service& service : user_services(global)) {
+    service.of_user = true;
+    services.push_back(std::move(service));
   }
   std::vector<SambaShare> shares(services.size());
   std::transform(services.begin(), services.end(), shares.begin(),

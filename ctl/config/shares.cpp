@@ -185,36 +185,47 @@ std::string import_problem(const SambaShare& share, const std::vector<std::strin
   return problem.empty() ? share_path_problem(share.path) : problem;
 }
 
-void import_samba(bool dry_run, UserShares user_shares) {
+void import_share(const SambaShare& share, bool dry_run) {
+  if (!dry_run) {
+    add_section(VORN_PATH_SHARES, share.name, {{"path", share.path}});
+  }
+  print_line((dry_run ? "would import " : "imported ") + share.name + ": " + share.path +
+             (is_remote(share.path) ? " (on another server: left out of reports until its section "
+                                      "has network = yes)"
+                                    : ""));
+}
+
+void import_samba(bool dry_run, bool with_user_shares) {
   std::vector<std::string> known;
+  std::size_t left_out = 0;
   for (const Share& share : read_shares()) {
     known.push_back(folded(share.name));
   }
-  for (const SambaShare& share : samba_shares(user_shares)) {
+  for (const SambaShare& share : samba_shares()) {
     const std::string problem = import_problem(share, known);
-    if (!problem.empty()) {
+    if (share.of_user && !with_user_shares) {
+      left_out += problem.empty() ? 1 : 0;
+    } else if (!problem.empty()) {
       print_line("skipped " + share.name + ": " + problem);
-      continue;
+    } else {
+      import_share(share, dry_run);
+      known.push_back(folded(share.name));
     }
-    if (!dry_run) {
-      add_section(VORN_PATH_SHARES, share.name, {{"path", share.path}});
-    }
-    known.push_back(folded(share.name));
-    print_line((dry_run ? "would import " : "imported ") + share.name + ": " + share.path +
-               (is_remote(share.path) ? " (on another server: left out of reports until its "
-                                        "section has network = yes)"
-                                      : ""));
+  }
+  if (left_out > 0) {
+    print_line(
+        "left out " + std::to_string(left_out) +
+        " that users have made, who can lead them anywhere; --usershares takes these as well");
   }
 }
 
 void describe_import(CLI::App& group) {
   CLI::App& import = *group.add_subcommand("import-samba", "Add the shares that Samba offers");
   const auto dry_run = std::make_shared<bool>();
-  const auto no_users = std::make_shared<bool>();
+  const auto with_users = std::make_shared<bool>();
   import.add_flag("--dry-run", *dry_run, "Only print what would be done");
-  import.add_flag("--no-usershares", *no_users, "Leave out the shares that users have made");
-  import.callback([dry_run, no_users] {
-    import_samba(*dry_run, *no_users ? UserShares::left_out : UserShares::included);
+  import.add_flag("--usershares", *with_users, "Also the shares that users have made");
+  import.callback([dry_run, with_users] { import_samba(*dry_run, *with_users);
 });
 }  // namespace
 

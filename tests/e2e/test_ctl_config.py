@@ -90,13 +90,11 @@ class Samba(ControlTest):
     def setUp(self):
         super().setUp()
         samba = self.m.base / 'samba'
-        users = samba / 'usershares'
-        users.mkdir(parents=True)
-        users.chmod(0o1770)
+        self.users = samba / 'usershares'
+        self.users.mkdir(parents=True)
+        self.users.chmod(0o1770)
         self.folder = self.m.base / 'a b'
         self.folder.mkdir()
-        (users / 'mine').write_text(f'#VERSION 2\npath={self.folder}\ncomment=\n'
-                                    'usershare_acl=S-1-1-0:F\nguest_ok=n\nsharename=Mine\n')
         (self.m.base / 'smb.conf').write_text(f'''
 [global]
     usershare max shares = 9
@@ -141,7 +139,7 @@ class Samba(ControlTest):
 
     def test_smb_conf_as_testparm_reads_it(self):
         before = self.m.shares.read_text()
-        arguments = 'share', 'import-samba', '--no-usershares'
+        arguments = 'share', 'import-samba'
         self.assertEqual(self.ctl(*arguments, '--dry-run').out.splitlines(),
                          self.lines(self.decisions, 'would import'))
         self.assertEqual(self.m.shares.read_text(), before)
@@ -158,17 +156,26 @@ class Samba(ControlTest):
     @needs_root  # Samba trusts no other's folder of user shares
     def test_shares_of_users(self):
         # With "net" and, where that is missing, from its files.
+        for name, folder in (('7', '/etc'), ('mine', self.folder)):
+            (self.users / name).write_text(
+                f'#VERSION 2\npath={folder}\ncomment=\nusershare_acl=S-1-1-0:F\nguest_ok=n\n'
+                f'sharename={name.title()}\n')
+        number = 'skipped', '7', self.decisions[-1][2]
         programs = self.m.base / 'programs'
         programs.mkdir()
         (programs / 'testparm').symlink_to(shutil.which('testparm'))
         odd = ('skipped', r'b\x0ac', 'it holds a control character')
         for path, more in ((os.environ['PATH'], ()), (programs, (odd,))):
             if more:
-                (self.m.base / 'samba/usershares/b\nc').write_text('path=/etc\n')
-            self.m.shares.write_text('[there]\npath = /etc\n')
-            run = self.m.shell(f"PATH='{path}' {CTL} share import-samba")
-            self.assertEqual(run.out.splitlines(),
-                             self.lines((*self.decisions, ('imported', 'Mine', None), *more)), run.err)
+                (self.users / 'b\nc').write_text('path=/etc\n')
+            for option, users, end in (
+                    ('', (), 'left out 1 that users have made, who can lead them anywhere; '
+                     '--usershares takes these as well\n'),
+                    (' --usershares', (number, ('imported', 'Mine', None), *more), '')):
+                self.m.shares.write_text('[there]\npath = /etc\n')
+                run = self.m.shell(f"PATH='{path}' {CTL} share import-samba{option}")
+                self.assertEqual(run.out, ''.join(
+                    line + '\n' for line in self.lines((*self.decisions, *users))) + end, run.err)
 
 
 class Profiles(ControlTest):
