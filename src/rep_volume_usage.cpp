@@ -2,8 +2,10 @@
 
 #include <algorithm>
 #include <array>
+#include <cstdlib>
 #include <memory>
 #include <new>
+#include <string_view>
 #include <utility>
 
 #include "facts/run_facts.hpp"
@@ -109,6 +111,30 @@ int32_t write_block(const QAZLLNode* list, const char* opening, WriteVolume writ
     std::fputs(closing, data.get());
   }
   return close_report_file(std::move(data), path.c_str(), kModule, __LINE__) ? count : -1;
+}
+
+// Whether the line of a CSV file ends, or falls into other fields, at a character of `text`.
+bool breaks_csv(std::string_view text) {
+  return std::any_of(text.begin(), text.end(), [](char c) {
+    return static_cast<unsigned char>(c) < ' ' || c == '\x7f' || c == '"';
+  });
+}
+
+void write_csv_row(FILE* csv, const VolumeUsageNode& node) {
+  VolumeId id{};
+  const char* name = node.name.c_str();
+  if (breaks_csv(name)) {
+    if (!volume_id(node, id)) {
+      return;
+    }
+    name = id.data();  // as the page calls it
+  }
+  const VolumeUsageSample& now = *node.samples;
+  const unsigned long long size = std::strtoull(now.sizeUse.c_str(), nullptr, 10) +
+                                  std::strtoull(now.sizeFree.c_str(), nullptr, 10);
+  const std::string days = node.days == -1 ? "-" : std::to_string(node.days);
+  std::fprintf(csv, "\"%s\", \"%llu\" ,\"%s%%\", \"%s\"\n", name, size, now.percent.c_str(),
+               days.c_str());
 }
 
 bool wants_history(const VLIBCSzHash* profile_hash) {
@@ -237,13 +263,7 @@ int32_t VolumeUsageWriteCsv(const char* profile, const VLIBCSzHash* profileHash,
   }
   std::fputs("Volume, Size, Used, Daty to Full\n", csv.get());
   for (; list != nullptr; list = list->next) {
-    const VolumeUsageNode& node = *volume_of(list);
-    const VolumeUsageSample& now = *node.samples;
-    const unsigned long long size = std::strtoull(now.sizeUse.c_str(), nullptr, 10) +
-                                    std::strtoull(now.sizeFree.c_str(), nullptr, 10);
-    const std::string days = node.days == -1 ? "-" : std::to_string(node.days);
-    std::fprintf(csv.get(), "\"%s\", \"%llu\" ,\"%s%%\", \"%s\"\n", node.name.c_str(), size,
-                 now.percent.c_str(), days.c_str());
+    write_csv_row(csv.get(), *volume_of(list));
   }
   const bool kept =
       close_report_file(std::move(csv), path.c_str(), kModule, __LINE__, Costs::kReport);

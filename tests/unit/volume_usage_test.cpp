@@ -1,6 +1,7 @@
 // The estimate of the days until a volume is full.
 #include "db_volume_usage.hpp"
 #include "fixture.hpp"
+#include "rep_volume_usage.hpp"
 
 namespace vornreport {
 namespace {
@@ -71,6 +72,20 @@ TEST_F(VolumeUsageTest, EstimatesTheDaysUntilFull) {
     EXPECT_EQ(volume_of(list_)->days, c.days);
     QAZLLfree(&list_, VolumeUsageFreeNode);
   }
+}
+
+// One whose identifier can't be had is left out, as of the page.
+TEST_F(VolumeUsageTest, ACsvLineNamesNoPathThatWouldBreakIt) {
+  platform.volume_ids = {{"/a\"b", "_a_b"}, {"/a\nb", "_a__b"}};
+  for (const char* path : {"/a b, c", "/a\"b", "/a\nb", "/a\tb"}) {
+    add_volume(path, sample("1", "40", "60"));
+  }
+  const auto profile = support::make_hash({{"real_path_csv", folder_.path()}});
+  printed([&] { EXPECT_EQ(VolumeUsageWriteCsv("p", profile.get(), list_), 0); });
+  const std::string rest = "\", \"100\" ,\"50.0000%\", \"0\"\n";
+  EXPECT_EQ(
+      support::read_file(folder_.path("volume_usage.csv")),
+      "Volume, Size, Used, Daty to Full\n\"/a b, c" + rest + "\"_a_b" + rest + "\"_a__b" + rest);
 }
 
 }  // namespace
