@@ -26,7 +26,7 @@ ODD_NAMES = {"it's.jpg": 'image', 'say "hi".png': 'image', 'line\nbreak\tand tab
              'gnp.\u202egpj.exe': 'executable', 'back\\slash\\n': 'other',
              '=1+1.flac': 'audio', '\u65e5\u672c a\u0308.mkv': 'video', '.hidden/.profile': 'other',
              'ends in a dot.': 'other', ' blank ': 'other', 'd/' * 300 + 'deep': 'other',
-             'n' * 255: 'other'}
+             'n' * 255: 'other', ('\x01' * 250 + '/') * 6 + 'too long once escaped': 'other'}
 
 
 def fill(tree):

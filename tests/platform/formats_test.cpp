@@ -50,8 +50,35 @@ TEST(EscChar, MakesEveryTextHarmless) {
     EXPECT_EQ(expected, written(escape<'\''>, text));
   }
   EXPECT_EQ("\\u006eo\\n", written(escape<'n'>, "no\n")) << "or it would mean something else";
-  EXPECT_EQ("\\u0001x", written(escape<'\''>, "\x01x", 8));
-  EXPECT_EQ("refused", written(escape<'\''>, "\x01xy", 8));
+}
+
+std::string times(int count, std::string_view text) {
+  std::string all;
+  for (int i = 0; i < count; ++i) {
+    all += text;
+  }
+  return all;
+}
+
+// Cut neither inside a character nor inside an escape. By the digits, the beginning of a SHA-256,
+// long texts that begin alike stay two.
+TEST(LongTexts, EndInAMarkAndADigest) {
+  const struct {
+    int (*format)(const char* text, char* out, size_t size);
+    std::string text;
+    std::string expected;  // in 64 bytes
+  } cases[] = {
+      {escape<'\''>, times(40, "\x01"), times(7, "\\u0001") + "…2432dbb70926df29"},
+      {escape<'\''>, times(39, "\x01") + "\x02", times(7, "\\u0001") + "…2b64da86d48a7c50"},
+      {escape<'\''>, "x" + times(40, "ä"), "x" + times(21, "ä") + "…95425ebe9e7a5591"},
+      {escape<'\''>, times(40, "\xff"), times(7, "\\udcff") + "…6ecd0f0bd7cf53c5"},
+      {VornQazFormatCsvString, times(40, "\""), times(22, "\"\"") + "…78e7eb4ddae6058e"},
+      {VornQazFormatCsvString, "=" + times(40, "ä"), "'=" + times(21, "ä") + "…7ea977665d669527"}};
+  for (const auto& [format, text, expected] : cases) {
+    EXPECT_EQ(expected, written(format, text.c_str(), 64));
+  }
+  EXPECT_EQ("…2432dbb70926df29", written(escape<'\''>, times(40, "\x01").c_str(), 20));
+  EXPECT_EQ("refused", written(escape<'\''>, times(40, "\x01").c_str(), 19));
 }
 
 TEST(FormatCsvString, KeepsTheFieldAndRunsNoFormula) {

@@ -13,6 +13,7 @@
 
 #include "base/host_log.hpp"
 #include "base/text_containers.hpp"
+#include "base/text_digest.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/utf8.hpp"
 #include "vorn/report.h"
@@ -77,6 +78,28 @@ bool is_formula(std::string_view text) {
   return text.empty() || text.find_first_not_of("0123456789.") != std::string_view::npos;
 }
 
+using WriteText = std::string (*)(std::string_view text, char quote);
+
+// The beginning of `text`, a mark that there is more, and a digest of it all, so that two long
+// texts that begin alike stay two. Cut between characters, so that `write` makes at most `most`
+// bytes of it unless mark and digest alone are longer.
+std::string shortened(std::string_view text, std::size_t most, WriteText write, char quote) {
+  const std::string tail = "…" + text_digest(text);
+  const std::size_t taken = write(tail, quote).size();
+  std::size_t room = most - std::min(taken, most);
+  std::size_t kept = 0;
+  while (kept < text.size()) {
+    const std::size_t length = std::max<std::size_t>(utf8_at(text.substr(kept)).length, 1);
+    const std::size_t written = write(text.substr(kept, length), quote).size();
+    if (written > room) {
+      break;
+    }
+    room -= written;
+    kept += length;
+  }
+  return std::string(text.substr(0, kept)) + tail;
+}
+
 // Copies `text` out as the C API promises: all of it, or an empty text and -1.
 int copy_out(std::string_view text, char* out, size_t size) {
   if (text.size() >= size) {
@@ -87,6 +110,15 @@ int copy_out(std::string_view text, char* out, size_t size) {
   std::memcpy(out, text.data(), text.size());
   out[text.size()] = '\0';
   return static_cast<int>(text.size());
+}
+
+// What `write` makes of `text`, or of its beginning where all of it is too long.
+int write_out(std::string_view text, char* out, size_t size, WriteText write, char quote) {
+  std::string written = write(text, quote);
+  if (written.size() >= size) {
+    written = write(shortened(text, size - 1, write, quote), quote);
+  }
+  return copy_out(written, out, size);
 }
 
 int bad_argument(char* out, size_t size) {
@@ -159,7 +191,7 @@ int VornQazEscChar(const char* text, char* out, size_t size, char quote) try {
   if (text == nullptr || out == nullptr || size == 0) {
     return host::bad_argument(out, size);
   }
-  return host::copy_out(host::escape_js(text, quote), out, size);
+  return host::write_out(text, out, size, host::escape_js, quote);
 } catch (...) {
   errno = ENOMEM;
   return -1;
@@ -169,7 +201,10 @@ int VornQazFormatCsvString(const char* text, char* out, size_t size) try {
   if (text == nullptr || out == nullptr || size == 0) {
     return host::bad_argument(out, size);
   }
-  return host::copy_out(host::csv_field(text), out, size);
+  constexpr auto kWrite = [](std::string_view part, char /*quote*/) {
+    return host::csv_field(part);
+  };
+  return host::write_out(text, out, size, kWrite, '"');
 } catch (...) {
   errno = ENOMEM;
   return -1;

@@ -116,6 +116,12 @@ int VornQazInitFileTypeHash(VLIBCSzHash** hash);
 // --- Formats ------------------------------------------------------------------------------------
 // Each writes a NUL-terminated text into `out` (`size` bytes) and returns its length, or -1 when
 // it doesn't fit or an argument is null (`out` is then the empty text).
+//
+// Of a text that is too long for `out`, VornQazEscChar and VornQazFormatCsvString write what there
+// is room for, between whole characters and escapes, then "…" and 16 hexadecimal digits that stand
+// for the whole text: nobody hides a file by its name, and two such names stay two. They fail only
+// where `out` hasn't room for mark and digits: 20 bytes, or 100 for a `quote` that is a digit
+// itself.
 
 // `text` for the inside of a JavaScript string quoted with `quote`. Besides `quote`, everything
 // that could leave the string or a script element is escaped: backslash, line ends, '<', U+2028/9,
