@@ -188,8 +188,10 @@ bool has_section(const Lines& lines, std::string_view name) {
   });
 }
 
-std::optional<std::string> edited(const char* file, std::string_view text,
-                                  const SectionEdit& edit) {
+}  // namespace
+
+std::optional<std::string> edited_text(const char* file, std::string_view text,
+                                       const SectionEdit& edit) {
   const Lines lines = parse_lines(text);
   std::string out;
   if (edit.kind == SectionEdit::Kind::add) {
@@ -218,10 +220,8 @@ std::optional<std::string> edited(const char* file, std::string_view text,
   return out;
 }
 
-}  // namespace
-
 int edit_section(const char* file, const SectionEdit& edit) {
-  return rewrite_config(file, [&](std::string_view text) { return edited(file, text, edit); });
+  return rewrite_config(file, [&](std::string_view text) { return edited_text(file, text, edit); });
 }
 
 }  // namespace host

@@ -4,6 +4,7 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -29,6 +30,11 @@ struct SectionEdit {
 // 0; -1 with nothing changed and one log line: the section is there already (add) or isn't (change,
 // remove), it is malformed, a name or value doesn't fit a line, or the file can't be replaced.
 int edit_section(const char* file, const SectionEdit& edit);
+
+// What `edit` makes of `text`, the content of `file`. Nothing, after one log line, where
+// edit_section fails.
+std::optional<std::string> edited_text(const char* file, std::string_view text,
+                                       const SectionEdit& edit);
 
 }  // namespace host
 
