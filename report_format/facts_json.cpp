@@ -5,6 +5,7 @@
 #include <nlohmann/json.hpp>
 #include <type_traits>
 
+#include "facts_scan.hpp"
 #include "report_format/attention.hpp"
 #include "report_format/facts.hpp"
 
@@ -373,51 +374,6 @@ struct Codec {
   }
 };
 
-// Stops at the first value of the object's own key "started".
-class StartedFinder : public nlohmann::json_sax<nlohmann::json> {
- public:
-  std::optional<std::int64_t> found;
-
-  bool null() override { return next(); }
-  bool boolean(bool /*value*/) override { return next(); }
-  bool number_float(double /*value*/, const std::string& /*text*/) override { return next(); }
-  bool string(std::string& /*value*/) override { return next(); }
-  bool binary(nlohmann::json::binary_t& /*value*/) override { return next(); }
-  bool number_integer(std::int64_t /*value*/) override { return next(); }
-  bool number_unsigned(std::uint64_t value) override {
-    if (is_wanted_ && value <= INT64_MAX) {
-      found = static_cast<std::int64_t>(value);
-    }
-    return next();
-  }
-  bool key(std::string& name) override {
-    is_wanted_ = depth_ == 1 && name == "started";
-    return true;
-  }
-  bool start_object(std::size_t /*size*/) override { return open(); }
-  bool start_array(std::size_t /*size*/) override { return open(); }
-  bool end_object() override { return close(); }
-  bool end_array() override { return close(); }
-  bool parse_error(std::size_t /*at*/, const std::string& /*token*/,
-                   const nlohmann::detail::exception& /*error*/) override {
-    return false;
-  }
-
- private:
-  bool next() { return !std::exchange(is_wanted_, false); }
-  bool open() {
-    ++depth_;
-    return next();
-  }
-  bool close() {
-    --depth_;
-    return true;
-  }
-
-  int depth_ = 0;
-  bool is_wanted_ = false;
-};
-
 }  // namespace
 
 Json to_json(const Facts& facts) {
@@ -437,6 +393,9 @@ std::string to_line(const Facts& facts) {
 }
 
 std::optional<Facts> facts_of(std::string_view text) {
+  if (has_object_of_many_keys(text)) {
+    return std::nullopt;
+  }
   const Json json = Json::parse(text, nullptr, /*allow_exceptions=*/false);
   if (!json.is_object()) {
     return std::nullopt;
@@ -448,12 +407,6 @@ std::optional<Facts> facts_of(std::string_view text) {
   Facts facts;
   Codec::take(json, facts);
   return facts;
-}
-
-std::optional<std::int64_t> started_of(std::string_view text) {
-  StartedFinder finder;
-  nlohmann::json::sax_parse(text, &finder);
-  return finder.found;
 }
 
 }  // namespace report_format

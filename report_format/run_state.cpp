@@ -4,6 +4,7 @@
 #include <array>
 #include <charconv>
 #include <nlohmann/json.hpp>
+#include <utility>
 
 namespace report_format {
 namespace {
@@ -70,9 +71,11 @@ std::optional<Progress> progress_of(std::string_view text) {
     const auto found = json.find(key);
     return found != json.end() && found->is_string() ? found->get<std::string>() : std::string();
   };
-  const auto number_in = [&](const char* key) {
+  const auto number_in = [&]<typename Number>(const char* key, Number& number) {
     const auto found = json.find(key);
-    return found != json.end() && found->is_number_unsigned() ? found->get<std::uint64_t>() : 0;
+    const std::uint64_t value =
+        found != json.end() && found->is_number_unsigned() ? found->get<std::uint64_t>() : 0;
+    number = std::in_range<Number>(value) ? static_cast<Number>(value) : 0;
   };
   const auto phase = std::find(kPhases.begin(), kPhases.end(), text_in("phase"));
   if (phase == kPhases.end()) {
@@ -81,10 +84,10 @@ std::optional<Progress> progress_of(std::string_view text) {
   Progress progress;
   progress.phase = static_cast<Phase>(phase - kPhases.begin());
   progress.share = text_in("share");
-  progress.files = number_in("files");
+  number_in("files", progress.files);
   progress.report = text_in("report");
-  progress.number = static_cast<int>(number_in("number"));
-  progress.reports = static_cast<int>(number_in("reports"));
+  number_in("number", progress.number);
+  number_in("reports", progress.reports);
   return progress;
 }
 

@@ -372,6 +372,11 @@ TEST(FactsFile, SurvivesForeignTexts) {
   }
   const std::string deep(100'000, '[');
   EXPECT_FALSE(report_format::facts_of("{\"format\":1,\"volumes\":" + deep));
+  std::string wide = "{\"format\":1";  // each key of an object is looked up among the others
+  for (int i = 0; i < 256; ++i) {
+    wide += ",\"" + std::to_string(i) + "\":0";
+  }
+  EXPECT_FALSE(report_format::facts_of(wide + "}"));
   const auto facts = report_format::facts_of(
       "{\"format\":1,\"started\":-1.5,\"host\":7,\"volumes\":[3,{\"size\":-1,\"samples\":[[1],"
       "[2,3],4],\"forecast\":\"x\",\"level\":\"awful\"}],\"shares\":{},\"attention\":[{\"values\":"

@@ -216,7 +216,7 @@ std::string to_line(const Facts& facts);
 
 // The facts of a text that to_line() has written; it may come from elsewhere. Keys that aren't
 // known are left aside and those that are missing or of another kind keep their default. Nothing
-// for what is no JSON object or has another format.
+// for what is no JSON object, has another format, or an object of more than 256 keys.
 std::optional<Facts> facts_of(std::string_view text);
 
 // When the run began that wrote `text`, read no further than needed; nothing when it doesn't tell.
