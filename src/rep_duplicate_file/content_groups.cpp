@@ -1,7 +1,11 @@
 #include "content_groups.hpp"
 
 #include <algorithm>
+#include <array>
+#include <cerrno>
+#include <map>
 #include <numeric>
+#include <string>
 #include <tuple>
 #include <utility>
 #include <vector>
@@ -29,6 +33,7 @@ uint64_t g_grouped = 0;    // files placed into groups
 // What the report that is being made has found.
 DuplicateTally g_tally(/*by_content=*/true);
 RowCounts g_rows;
+std::map<std::string, uint64_t> g_unread;  // files whose content can't be read, by share
 
 void count_groups(const QAZLLNode* groups) {
   for (; groups != nullptr; groups = groups->next) {
@@ -38,6 +43,19 @@ void count_groups(const QAZLLNode* groups) {
       ++g_rows.rows;
     }
     g_tally.end_group(first.size);
+  }
+}
+
+// Users may move, replace or hold a file meanwhile, which is nothing to tell. What can't be read
+// for another reason may have had a copy that the report lacks.
+void count_unread(const QAZLLNode* candidates) {
+  constexpr std::array kOfUsers{0, ENOENT, ENOTDIR, ELOOP, EXDEV, ESTALE, ENXIO, EWOULDBLOCK};
+  for (; candidates != nullptr; candidates = candidates->next) {
+    const dup_file_node& file = *file_of(candidates);
+    if (file.failure.result != 0 &&
+        std::find(kOfUsers.begin(), kOfUsers.end(), file.failure.error) == kOfUsers.end()) {
+      ++g_unread[file.share];
+    }
   }
 }
 
@@ -193,12 +211,21 @@ void begin_content_groups(const VLIBCSzHash* profile_hash) {
   begin_compare_limit(profile_hash);
   g_tally = DuplicateTally(/*by_content=*/true);
   g_rows = {};
+  g_unread.clear();
 }
 
 void end_content_groups() {
   end_compare_limit();
   run_facts().duplicates = g_tally.facts();
   run_facts().rows[report_format::kDuplicateFile.name] = g_rows;
+  for (const auto& [share, count] : g_unread) {
+    const std::string files = std::to_string(count);
+    record_incident("share_part", share + ": " + files + " (contents)",
+                    files + " files of share " + share +
+                        " can't be read, so copies of them are missing from the report; the run's "
+                        "output names them",
+                    AlreadyLogged::kYes);
+  }
 }
 
 int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups,
@@ -221,6 +248,7 @@ int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups,
       }
     }
   }
+  count_unread(*candidates);
   release_bucket(groups, candidates);
   return result;
 }
