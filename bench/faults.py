@@ -9,6 +9,9 @@ made again with that one call failing (strace's fault injection), and its page a
 compared with those of the undisturbed run. What may differ from run to run (times, what is used on
 the volume) is left out of the comparison.
 
+Threads count their own calls, so that the Nth of each fails; commands that the program starts are
+left alone.
+
     same    the report is what it would have been
     told    it is not, and the run says so: status "fail", no report, or an incident in the report
     untold  it is not, and nobody is told; the last column is to be 0
@@ -52,11 +55,11 @@ def make_server(base):
     shares = ''
     for share in ('photos', 'music'):
         for number, (name, uid) in enumerate(OWNERS.items()):
-            folder = base / share / f'of {name}'
-            folder.mkdir(parents=True)
-            for i in range(3):
-                path = folder / f'{share} {i}.{("jpg", "mp3", "x")[i]}'
-                path.write_bytes(b'x' * (1000 * (number + 1) * (i + 1)))
+            for i in range(12):
+                folder = base / share / f'of {name}' / str(i // 3)
+                folder.mkdir(parents=True, exist_ok=True)
+                path = folder / f'{share} {i}.{("jpg", "mp3", "x")[i % 3]}'
+                path.write_bytes(b'x' * (1000 * (number + 1) * (i % 3 + 1)))
                 os.chown(path, uid, uid)
                 os.utime(path, (1.6e9 + i, 1.6e9 + i))
         shares += f'[{share}]\npath = {base / share}\n'
@@ -108,19 +111,26 @@ def run(options=()):
     return shown, bool(facts['incidents']), done.stdout
 
 
+STRACE = ['strace', '-f', '-b', 'execve', '-qq']
+
+
 def counted_calls():
-    """How often the undisturbed program makes each call, and how often before its own code runs."""
+    """How often a thread of the undisturbed program makes each call at most, and how often it is made
+    before the program's own code runs."""
     with tempfile.NamedTemporaryFile() as file:
-        run(['strace', '-qq', '-o', file.name])
-        calls, loader = collections.Counter(), collections.Counter()
+        run([*STRACE, '-o', file.name])
+        threads, loader = collections.defaultdict(collections.Counter), collections.Counter()
         in_loader = True
         for line in Path(file.name).read_text(errors='replace').splitlines():
-            if match := re.match(r'(\w+)\(', line):
-                calls[match[1]] += 1
+            if match := re.match(r'(\d+) +(\w+)\(', line):
+                threads[match[1]][match[2]] += 1
                 if in_loader:
-                    loader[match[1]] += 1
+                    loader[match[2]] += 1
                 # The first thing that the program itself does.
                 in_loader = in_loader and 'F_GETFD' not in line
+    calls = collections.Counter()
+    for thread in threads.values():
+        calls |= thread
     return calls, loader
 
 
@@ -156,7 +166,7 @@ def measure(args):
         for number in range(loader[call] + 1, calls[call] + 1, args.every):
             # Each call meets one of the errors, its neighbours the others.
             error = args.errors[number % len(args.errors)]
-            got, told, output = run(['strace', '-qq', '-o', '/dev/null', '-e', f'trace={call}', '-e',
+            got, told, output = run([*STRACE, '-o', '/dev/null', '-e', f'trace={call}', '-e',
                                      f'inject={call}:error={error}:when={number}'])
             outcome = 'same' if got == shown else 'told' if told else 'untold'
             counts[outcome] += 1

@@ -1,7 +1,7 @@
 #!/usr/bin/python3
 """Compares gathering with what find needs for the same facts.
 
-    bench/gather.py FOLDER [--files N] [--rounds N] [--build DIR]
+    bench/gather.py FOLDER [--files N] [--rounds N] [--build DIR] [--cold]
 
 Makes a tree of N files in FOLDER once (and uses it again later), then alternates
 
@@ -9,7 +9,8 @@ Makes a tree of N files in FOLDER once (and uses it again later), then alternate
     find, its list thrown away
     vornreport --report, with gathering timed between its "stat start" and "stat complete" lines
 
-and prints the median of each. The first round warms the cache and is not counted.
+and prints the median of each. The first round warms the cache and is not counted. With --cold (as
+root) the system's caches are dropped before each run instead.
 """
 import argparse
 import os
@@ -48,6 +49,11 @@ def make_tree(folder, count):
             with open(place / f'{name()}_{i}.{choice.choice(EXTENSIONS)}', 'wb') as file:
                 file.truncate(int(choice.lognormvariate(11, 2.5)))
     done.write_text(str(count))
+
+
+def drop_caches():
+    subprocess.run(['sync'], check=True)
+    Path('/proc/sys/vm/drop_caches').write_text('3')
 
 
 def run_find(folder, output):
@@ -90,6 +96,7 @@ def main():
     parser.add_argument('--files', type=int, default=1_000_000)
     parser.add_argument('--rounds', type=int, default=5)
     parser.add_argument('--build', type=Path, default=ROOT / 'build')
+    parser.add_argument('--cold', action='store_true', help='drop the caches before each run')
     arguments = parser.parse_args()
     folder = arguments.folder.resolve() / 'vornreport-bench-tree'
     make_tree(folder, arguments.files)
@@ -103,8 +110,12 @@ def main():
         with (stage / 'usr/vorn/etc/vornreport.conf').open('a') as file:
             file.write('\n[bench]\nreport_list = share_list\n')
         for number in range(arguments.rounds + 1):
-            results = [run_find(folder, Path(work) / 'list'), run_find(folder, os.devnull),
-                       *run_report(stage)]
+            results = []
+            for run in (lambda: [run_find(folder, Path(work) / 'list')],
+                        lambda: [run_find(folder, os.devnull)], lambda: run_report(stage)):
+                if arguments.cold:
+                    drop_caches()
+                results += run()
             print(f'round {number}: ' + ' '.join(f'{result:.2f}' for result in results),
                   flush=True)
             if number > 0:
@@ -112,7 +123,8 @@ def main():
                     series.append(result)
 
     base = statistics.median(kept)
-    print(f'{arguments.files} files, median of {arguments.rounds} rounds, warm cache')
+    print(f'{arguments.files} files, median of {arguments.rounds} rounds, '
+          f'{"caches dropped before each run" if arguments.cold else "warm cache"}')
     for label, series in (('find > list', kept), ('find > /dev/null', thrown),
                           ('gathering', gathered), ('whole report run', whole)):
         median = statistics.median(series)

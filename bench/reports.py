@@ -1,19 +1,22 @@
 #!/usr/bin/python3
 """Measures all nine reports, and duplicates by content, against what does the same work.
 
-    bench/reports.py FOLDER [--files N] [--rounds N] [--build DIR] [--only PART,...]
+    bench/reports.py FOLDER [--files N] [--rounds N] [--build DIR] [--only PART,...] [--cold]
 
 Makes trees in FOLDER once (and uses them again later) and prints a table. The parts:
 
     all      nine reports in one run on a tree of N files, against find (its list kept in a file)
              and against pipelines.sh, which makes the same file reports
+    peers    the same run against tools that look at every file of a tree: those installed of gdu,
+             ncdu, bfs, agedu and duc
     scale    the same run on file indexes of N and 10 N rows: no tree, only rows
-    content  duplicates by content against fdupes, and the digest against openssl md5
+    content  duplicates by content against fdupes and jdupes, and the digest against openssl md5
     buckets  duplicates by content among N files of one size: empty ones, and different ones
 
 Each number is the median of the rounds (peak memory: the greatest); a first round warms the cache
 and is not counted. Peers alternate within a round, so that whatever else the machine does meets
-them all; the CPU time, in brackets, tells how busy a machine was when it is far from the other.
+them all; the CPU time, in brackets, tells how busy a machine was when it is far from the other. With
+--cold (as root) the system's caches are dropped before each run.
 """
 import argparse
 import json
@@ -29,7 +32,7 @@ import tempfile
 import time
 from pathlib import Path
 
-from gather import EXTENSIONS, FIND, ROOT, WORDS
+from gather import EXTENSIONS, FIND, ROOT, WORDS, drop_caches
 
 SHARES = 8
 OWNERS = 5
@@ -146,6 +149,7 @@ class Bench:
     def __init__(self, arguments, work):
         self.base = arguments.folder.resolve() / 'vornreport-bench-reports'
         self.files, self.rounds = arguments.files, arguments.rounds
+        self.is_cold = arguments.cold
         self.work = Path(work).resolve()
         self.stage = self.work / 'stage'
         formats = json.loads((arguments.build / 'report_format.json').read_text())
@@ -186,16 +190,22 @@ class Bench:
         results = [[] for _ in runs]
         for number in range(self.rounds + 1):
             for series, run in zip(results, runs):
+                if self.is_cold:
+                    drop_caches()
                 series.append(run())
             print('   ', ' '.join(f'{series[-1][0]:.2f}' for series in results), flush=True)
         return [Result(series) for series in results]
 
-    def all(self):
+    def tree(self):
+        """The tree of `files` files, and its shares."""
         tree = self.base / 'tree'
         make_tree(tree, self.files)
+        return tree, [(f'share{i}', tree / f'share{i}', None) for i in range(SHARES)]
+
+    def all(self):
+        tree, shares = self.tree()
         pipes = self.work / 'pipes'
         pipes.mkdir()
-        shares = [(f'share{i}', tree / f'share{i}', None) for i in range(SHARES)]
         command = [str(tree) if part is None else part for part in FIND]
         script = ROOT / 'bench/pipelines.sh'
         find, shell, once, report = self.compare(
@@ -207,6 +217,24 @@ class Bench:
         yield ('all nine reports', report,
                f'{report / find:.2f} x find, {report / shell:.2f} and {report / once:.2f} x '
                'pipelines.sh')
+
+    def peers(self):
+        tree, shares = self.tree()
+        tools = {'gdu': ['--non-interactive', '--no-progress', tree],
+                 'ncdu': ['-0', '-o', '/dev/null', tree],
+                 'bfs': [tree, '-type', 'f', '-printf', FIND[-1]],
+                 'agedu': ['-f', self.work / 'agedu.dat', '-s', tree],
+                 'duc': ['index', '-q', '-d', self.work / 'duc.db', tree]}
+        tools = {name: words for name, words in tools.items() if shutil.which(name)}
+        command = [str(tree) if part is None else part for part in FIND]
+        find, report, *others = self.compare(
+            lambda: self.timed(*command), lambda: self.report(shares, self.every_report),
+            *(lambda tool=tool: self.timed(*tool) for tool in
+              ([name, *words] for name, words in tools.items())))
+        yield f'find, {self.files} files', find, ''
+        yield 'all nine reports', report, f'{report / find:.2f} x find'
+        for name, other in zip(tools, others):
+            yield name, other, f'{other / find:.2f} x find'
 
     def scale(self):
         runs = []
@@ -235,13 +263,16 @@ class Bench:
 
         def by_content(folder):
             return lambda: self.report([('share', folder, None)], duplicate_compare='true')
-        fdupes, report, openssl, digest, idle = self.compare(
-            lambda: self.timed('fdupes', '-r', '-q', tree), by_content(tree),
+        fdupes, jdupes, report, openssl, digest, idle = self.compare(
+            lambda: self.timed('fdupes', '-r', '-q', tree),
+            lambda: self.timed('jdupes', '-r', '-q', tree), by_content(tree),
             lambda: self.timed('openssl', 'md5', large / 'a', large / 'b'), by_content(large),
             by_content(empty))
         digest.seconds -= idle.seconds
         yield 'fdupes, 20000 files, three in four equal', fdupes, ''
-        yield 'duplicates by content', report, f'{fdupes / report:.2f} x the speed of fdupes'
+        yield 'jdupes', jdupes, ''
+        yield ('duplicates by content', report, f'{fdupes / report:.2f} x the speed of fdupes, '
+               f'{jdupes / report:.2f} x of jdupes')
         yield 'openssl md5, 1 GiB', openssl, f'{1024 / openssl.seconds:.0f} MiB/s'
         yield ('the digest', digest, f'{1024 / digest.seconds:.0f} MiB/s, '
                f'{openssl / digest:.2f} x the speed of openssl')
@@ -270,7 +301,8 @@ def main():
     parser.add_argument('--files', type=int, default=1_000_000)
     parser.add_argument('--rounds', type=int, default=5)
     parser.add_argument('--build', type=Path, default=ROOT / 'build')
-    parser.add_argument('--only', default='all,scale,content,buckets')
+    parser.add_argument('--only', default='all,peers,scale,content,buckets')
+    parser.add_argument('--cold', action='store_true', help='drop the caches before each run')
     arguments = parser.parse_args()
     rows = []
     with tempfile.TemporaryDirectory(dir=arguments.folder) as work:
