@@ -115,12 +115,26 @@ std::vector<report_format::ShareFacts> shares_of(const Tallies& tallies) {
   return shares;
 }
 
+// In an order that doesn't change from run to run.
+std::vector<std::tuple<std::string, uid_t, Amount>> owners_in(const ShareTally& share) {
+  std::vector<std::tuple<std::string, uid_t, Amount>> owners;
+  for (const VolumeTally& volume : share.volumes()) {
+    for (const auto& [uid, amount] : volume.owners) {
+      owners.emplace_back(volume.volume, uid, amount);
+    }
+  }
+  std::sort(owners.begin(), owners.end(), [](const auto& one, const auto& two) {
+    return std::tie(std::get<1>(one), std::get<0>(one)) <
+           std::tie(std::get<1>(two), std::get<0>(two));
+  });
+  return owners;
+}
+
 std::vector<report_format::OwnerFacts> owners_of(const Tallies& tallies,
                                                  const std::map<unsigned, std::string>& names) {
   std::map<std::string, report_format::OwnerFacts> owners;
   for (const ShareTally& tally : tallies.shares()) {
-    for (const auto& [place, amount] : tally.owners()) {
-      const auto& [uid, volume] = place;
+    for (const auto& [volume, uid, amount] : owners_in(tally)) {
       const auto name = names.find(uid);
       if (name == names.end()) {
         continue;
@@ -143,7 +157,13 @@ std::vector<report_format::OwnerFacts> owners_of(const Tallies& tallies,
 std::vector<report_format::TypeFacts> types_of(const Tallies& tallies) {
   std::map<std::string, report_format::TypeFacts> types;
   for (const ShareTally& tally : tallies.shares()) {
-    for (const auto& [label, amount] : tally.types()) {
+    std::map<std::string, Amount> in_share;
+    for (const VolumeTally& volume : tally.volumes()) {
+      for (const auto& [label, amount] : volume.types) {
+        in_share[label].add(amount);
+      }
+    }
+    for (const auto& [label, amount] : in_share) {
       report_format::TypeFacts& type = types[label];
       type.type = label;
       add(type, amount);

@@ -62,7 +62,7 @@ bool prepare(Gathering& gathering, const VLIBCSzHash* profile_hash) {
 class CountedShare {
  public:
   CountedShare(const char* share, const char* path) {
-    tallies().begin_share(share, path);
+    tallies().begin_share(share, path, run_facts().started);
     progress_share(share);
   }
   ~CountedShare() { tallies().end_share(); }
@@ -79,7 +79,7 @@ void tell_missing(const std::string& share) {
 }
 
 void tell_refused_index(const std::string& share) {
-  tallies().share()->begin_again();
+  tallies().begin_share_again();
   record_incident("index_refused", share,
                   "the file index of share " + share +
                       " can't be used, so its folders were walked; the log says why",
@@ -126,8 +126,9 @@ bool gather_share(const Gathering& gathering, const char* share, const VLIBCSzHa
   const VLIBCSzHash* types = gathering.file_types.get();
   if (VORNShareFileIndexIsEnabled(share) != 0) {
     report_trace(kGatheringModule, __LINE__, "use file index db, share=%s\n", share);
+    tallies().share()->others_count(note_index_share(share));
     if (ReportFileIndexImport(share, path.c_str(), db, types) >= 0) {
-      note_index_share(share);
+      count_index_folders(share, path.c_str(), db);
       return false;
     }
     tell_refused_index(share);

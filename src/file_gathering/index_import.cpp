@@ -2,8 +2,12 @@
 
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdlib>
+#include <string>
+#include <string_view>
+#include <vector>
 
 #include "facts/tallies.hpp"
 #include "module.hpp"
@@ -14,6 +18,7 @@
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
 #include "vornreport/handles.hpp"
+#include "vornreport/report_data.hpp"
 #include "vornreport/statistics_db.hpp"
 
 namespace vornreport {
@@ -44,7 +49,78 @@ int copy_rows(sqlite3* index, const char* share_path, FileIndexImport& import) {
   return 0;
 }
 
+// Folders from files that pass in the order of their paths, where all that lie below one folder
+// stand together.
+class FoldersOfPaths {
+ public:
+  explicit FoldersOfPaths(size_t top_length) : top_length_(top_length) {
+    tallies().folders().enter(".", 0);
+  }
+  ~FoldersOfPaths() {
+    for (size_t left = inside_.size() + 1; left > 0; --left) {
+      tallies().folders().leave();
+    }
+  }
+  FoldersOfPaths(const FoldersOfPaths&) = delete;
+  FoldersOfPaths& operator=(const FoldersOfPaths&) = delete;
+
+  void file(std::string_view path, uint64_t size, uint32_t changed) {
+    path.remove_prefix(std::min(top_length_, path.size()));
+    size_t depth = 0;
+    for (size_t end = 0; (end = path.find('/')) != std::string_view::npos; ++depth) {
+      go_into(path.substr(0, end), depth);
+      path.remove_prefix(end + 1);
+    }
+    go_up(depth);
+    tallies().folders().file(size, changed);
+  }
+
+ private:
+  void go_into(std::string_view name, size_t depth) {
+    if (depth < inside_.size() && inside_[depth] == name) {
+      return;
+    }
+    go_up(depth);
+    inside_.emplace_back(name);
+    tallies().folders().enter(name, 0);
+  }
+  void go_up(size_t depth) {
+    while (inside_.size() > depth) {
+      inside_.pop_back();
+      tallies().folders().leave();
+    }
+  }
+
+  size_t top_length_;
+  std::vector<std::string> inside_;
+};
+
 }  // namespace
+
+void count_index_folders(const char* share, const char* share_path, sqlite3* db) {
+  const std::string sql = std::string("select path,size,mtime from file_stat where share='") +
+                          share + "' order by path;";
+  const std::string top(share_path);
+  FoldersOfPaths folders(top.size() + (top.ends_with('/') ? 0 : 1));
+  const auto add = [](void* context, int /*columns*/, char** values, char** /*names*/) noexcept {
+    if (values[0] != nullptr) {
+      static_cast<FoldersOfPaths*>(context)->file(values[0], parse_number(values[1]),
+                                                  static_cast<uint32_t>(parse_number(values[2])));
+    }
+    return 0;
+  };
+  VornQazSetEnv();
+  char* message = nullptr;
+  const int result = sqlite3_exec(db, sql.c_str(), add, &folders, &message);
+  const SqliteText owned(message);
+  if (result != SQLITE_OK) {
+    REPORT_LOG_ERR(kGatheringModule, __LINE__, "Exec sql:[%s] error: %s\n\n", sql.c_str(),
+                   message != nullptr ? message : "");
+    if (is_storage_failure(result)) {
+      mark_report_data_lost();
+    }
+  }
+}
 
 int ReportFileIndexRow(void* context, int /*columns*/, char** values, char** names) noexcept {
   const auto* import = static_cast<const FileIndexImport*>(context);

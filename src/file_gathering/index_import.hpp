@@ -13,6 +13,10 @@ namespace vornreport {
 int ReportFileIndexImport(const char* szShareName, const char* szSharePath, sqlite3* db,
                           const VLIBCSzHash* pshFileType);
 
+// Counts the folders of an imported share (facts/folder_totals.hpp): its rows are read back in the
+// order of their paths. A failure is logged and an incident.
+void count_index_folders(const char* share, const char* share_path, sqlite3* db);
+
 // What the row callback works with.
 struct FileIndexImport {
   const char* szShare;

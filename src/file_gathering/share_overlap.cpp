@@ -49,26 +49,41 @@ void add_share_folder(const char* share, const char* path) {
   }
 }
 
-void note_share_folder(dev_t device, ino_t inode, const char* share) {
+bool note_share_folder(dev_t device, ino_t inode, const char* share) {
+  const std::string* first = nullptr;  // of those that have this folder
+  bool is_top = false;
   for (const ShareFolder& folder : g_folders) {
-    if (folder.inode == inode && folder.device == device && folder.share != share) {
+    if (folder.inode != inode || folder.device != device) {
+      continue;
+    }
+    first = first == nullptr ? &folder.share : first;
+    is_top = is_top || folder.share == share;
+    if (folder.share != share) {
       tell(share, folder.share);
     }
   }
+  return first != nullptr && (!is_top || *first != share);
 }
 
-void note_index_share(const char* share) {
+std::vector<std::string> note_index_share(const char* share) {
+  std::vector<std::string> counted;
   const auto own = std::find_if(g_folders.begin(), g_folders.end(),
                                 [&](const ShareFolder& folder) { return folder.share == share; });
   if (own == g_folders.end()) {
-    return;
+    return counted;
   }
   for (const ShareFolder& other : g_folders) {
-    if (&other != &*own &&
-        (lies_in(other.real_path, own->real_path) || lies_in(own->real_path, other.real_path))) {
-      tell(share, other.share);
+    const bool is_inside = lies_in(other.real_path, own->real_path);
+    if (&other == &*own || (!is_inside && !lies_in(own->real_path, other.real_path))) {
+      continue;
+    }
+    tell(share, other.share);
+    if (other.real_path == own->real_path ? &other < &*own : is_inside) {
+      counted.push_back(
+          other.real_path.substr(std::min(own->real_path.size() + 1, other.real_path.size())));
     }
   }
+  return counted;
 }
 
 }  // namespace vornreport

@@ -4,15 +4,20 @@
 
 #include <sys/types.h>
 
+#include <string>
+#include <vector>
+
 namespace vornreport {
 
 // Forgets all folders.
 void forget_share_folders();
 // Notes the top folder of a share that is about to be gathered.
 void add_share_folder(const char* share, const char* path);
-// The walk of `share` is in the folder (device, inode): tells when it is another share's top.
-void note_share_folder(dev_t device, ino_t inode, const char* share);
-// Tells of those whose files come from an index, which no walk passes, by their real paths.
-void note_index_share(const char* share);
+// The walk of `share` is in the folder (device, inode): tells when it is another share's top. True
+// when that one counts its files: it lies inside, or it is the same folder and comes first.
+bool note_share_folder(dev_t device, ino_t inode, const char* share);
+// Tells of those whose files come from an index, which no walk passes, by their real paths. The
+// folders below this share's (by their paths below it, "" for all of it) whose files others count.
+std::vector<std::string> note_index_share(const char* share);
 
 }  // namespace vornreport

@@ -166,8 +166,22 @@ class Walk {
     return {Look::kOpened, handle, opened};
   }
 
+  // Counts what is found while it lives as the folder's.
+  class Inside {
+   public:
+    Inside(const Folder& folder, const char* path, CountedElsewhere elsewhere) {
+      tallies().enter(folder.name, folder.device, path, elsewhere);
+    }
+    ~Inside() { tallies().leave(); }
+    Inside(const Inside&) = delete;
+    Inside& operator=(const Inside&) = delete;
+  };
+
   int read_folder(Folder& folder, size_t length) {
-    note_overlap(folder.device, folder.inode);
+    const Inside inside(folder, path_.c_str(),
+                        note_share_folder(folder.device, folder.inode, share_)
+                            ? CountedElsewhere::kYes
+                            : CountedElsewhere::kNo);
     if (length > top_length_ && tally_ != nullptr) {
       tally_->folder();
     }
@@ -185,12 +199,6 @@ class Walk {
       return open_failed();
     }
     return 0;
-  }
-
-  void note_overlap(dev_t device, ino_t inode) {
-    if (tally_ != nullptr) {
-      note_share_folder(device, inode, share_);
-    }
   }
 
   void add_entry(Folder& parent, const Entry& entry, size_t length) {

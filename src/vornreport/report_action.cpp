@@ -97,18 +97,24 @@ bool found_no_quotas(std::string_view name) {
          run_facts().quotas->users().empty() && !report_data_lost();
 }
 
+void note_owner(const VLIBCSzHash* users, uid_t uid) {
+  RunFacts& facts = run_facts();
+  VORNUser* user = nullptr;
+  const bool is_known = VORNUserGetByUID(uid, &user) >= 0;
+  const UserHandle owned(user);
+  if (is_known && user != nullptr && !is_unset(user->name) && facts.may_tell(user->name) &&
+      VLIBCSzHashGetValue(users, user->name) != nullptr) {
+    (*facts.owners)[uid] = user->name;
+  }
+}
+
 // The names of those who own files, as far as they may be told.
 void note_owners(const VLIBCSzHash* users) {
-  RunFacts& facts = run_facts();
-  facts.owners.emplace();
+  run_facts().owners.emplace();
   for (const ShareTally& share : tallies().shares()) {
-    for (const auto& [place, amount] : share.owners()) {
-      VORNUser* user = nullptr;
-      const bool is_known = VORNUserGetByUID(place.first, &user) >= 0;
-      const UserHandle owned(user);
-      if (is_known && user != nullptr && !is_unset(user->name) && facts.may_tell(user->name) &&
-          VLIBCSzHashGetValue(users, user->name) != nullptr) {
-        (*facts.owners)[place.first] = user->name;
+    for (const VolumeTally& volume : share.volumes()) {
+      for (const auto& [uid, amount] : volume.owners) {
+        note_owner(users, uid);
       }
     }
   }

@@ -60,7 +60,7 @@ class FactsTest : public UnitTest {
     tallies().file({"s", file.path, "", file.type, &status}, source);
   }
   static void share(const char* name, const char* path, const std::vector<File>& files) {
-    tallies().begin_share(name, path);
+    tallies().begin_share(name, path, kNow);
     for (const File& file : files) {
       count(file);
     }
@@ -94,7 +94,7 @@ TEST_F(FactsTest, SumsByShareVolumeOwnerAndType) {
          {"/srv/a/2", 500, 2, "text", 1},
          {"/srv/a/nested/3", 7, 1, "image", 2},
          {"/srv/a/link", 4096, 1, "text", 1, 3}});
-  tallies().begin_share("b", "/srv/b");
+  tallies().begin_share("b", "/srv/b", kNow);
   count({"/srv/b/1", 100'000, 2, "text", 9}, RowSource::kIndex);
   tallies().share()->folder();
   tallies().share()->other();
