@@ -232,8 +232,10 @@ void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSz
   if (reached < 0) {
     REPORT_LOG_ERR(kModule, __LINE__, "parsing command failed\n");
   }
-  // Half a table, of a tool that was ended at its limits, is not shown as a whole one.
-  const bool is_whole = std::fclose(output.release()) == 0;
+  // Half a table, of a tool that was ended at its limits or can't be read, is not shown as a whole
+  // one.
+  const bool was_read = std::ferror(output.get()) == 0;
+  const bool is_whole = std::fclose(output.release()) == 0 && was_read;
   if (is_whole && volume != nullptr && QAZLLadd(list, volume->data, nullptr) == 0) {
     note_volume(*quota_volume_of(volume));
     QAZLLfree(&volume, [](void* /*data*/) {});

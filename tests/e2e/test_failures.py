@@ -54,7 +54,8 @@ class Settings(ProductTest):
             for name, path in (('007', '/'), ("it's", '/'), ('relative', 'a/b'), ('gone', '/gone'),
                                ('file', '/etc/hostname'), ('remote', '/proc')):
                 file.write(f'[{name}]\npath = {path}\n')
-        missing = {('share_missing', name) for name in ('relative', 'gone', 'file', 'remote')}
+        missing = {('share_missing', name)
+                   for name in ('relative', 'gone', 'file', 'remote', '007', "it's")}
         for name, keys, lacking, lines in (
                 ('shares', {}, missing, [
                     '"007" is left out: it is a number', '"it\'s" is left out',

@@ -90,6 +90,11 @@ std::optional<std::vector<Share>>& known_shares() {
   return shares;
 }
 
+std::vector<std::string>& known_left_out() {
+  static std::vector<std::string> names;
+  return names;
+}
+
 // The share whose folder was asked for last: a run walks one share after another, and asks for each
 // folder when it comes to it.
 const Share*& share_in_walk() {
@@ -145,7 +150,8 @@ const char* share_path_error(std::string_view path) {
   return nullptr;
 }
 
-std::optional<std::vector<Share>> load_shares(const char* file) {
+std::optional<std::vector<Share>> load_shares(const char* file,
+                                              std::vector<std::string>* left_out) {
   const std::unique_ptr<VLIBCSzList, decltype(&VLIBCSzListFree)> names(VLIBCSzListAlloc(0),
                                                                        &VLIBCSzListFree);
   VLIBCSzList* list = names.get();
@@ -160,6 +166,9 @@ std::optional<std::vector<Share>> load_shares(const char* file) {
     }
     if (const char* error = share_name_error(name); error != nullptr) {
       log_line("share \"%s\" is left out: %s; rename its section in %s", name.c_str(), error, file);
+      if (left_out != nullptr) {
+        left_out->push_back(name);
+      }
       continue;
     }
     VLIBCSzHash section(0);
@@ -169,6 +178,9 @@ std::optional<std::vector<Share>> load_shares(const char* file) {
     } else {
       log_line("share \"%s\" is left out of every report until its section in %s is corrected",
                name.c_str(), file);
+      if (left_out != nullptr) {
+        left_out->push_back(name);
+      }
     }
   }
   return shares;
@@ -186,7 +198,8 @@ bool is_in_network_share(std::string_view path) {
 const std::vector<Share>* all_shares() {
   std::optional<std::vector<Share>>& shares = known_shares();
   if (!shares) {
-    shares = load_shares(VORN_PATH_SHARES);
+    known_left_out().clear();
+    shares = load_shares(VORN_PATH_SHARES, &known_left_out());
   }
   return shares ? &*shares : nullptr;
 }
@@ -195,6 +208,10 @@ const std::vector<Share>* read_shares() {
   share_in_walk() = nullptr;
   known_shares().reset();
   return all_shares();
+}
+
+const std::vector<std::string>& shares_left_out() {
+  return known_left_out();
 }
 
 const Share* find_share(const char* name) {

@@ -24,8 +24,9 @@ const char* share_name_error(std::string_view name);
 const char* share_path_error(std::string_view path);
 
 // The shares of `file` in its order. One log line for each that is left out (a bad name, a
-// malformed section). Nothing when the file can't be read (logged).
-std::optional<std::vector<Share>> load_shares(const char* file);
+// malformed section), whose names go to `left_out`. Nothing when the file can't be read (logged).
+std::optional<std::vector<Share>> load_shares(const char* file,
+                                              std::vector<std::string>* left_out = nullptr);
 
 // Whether `path` lies in the share that is being walked (the one whose folder was asked for last),
 // and that share is walked on network file systems too.
@@ -35,6 +36,8 @@ bool is_in_network_share(std::string_view path);
 const std::vector<Share>* all_shares();
 // The same, read anew; what was handed out before is gone.
 const std::vector<Share>* read_shares();
+// The names of those that were left out.
+const std::vector<std::string>& shares_left_out();
 // The one called `name`; null when there is none, or `name` is null.
 const Share* find_share(const char* name);
 

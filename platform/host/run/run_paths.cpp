@@ -90,11 +90,18 @@ ReportRun unused_run(const std::string& profile, const std::string& folder) {
 
 // --- Preparing a report run ---------------------------------------------------------------------
 
-// One line and an incident for each name that the profile selects and share.conf lacks: most likely
-// a typing error.
+// An incident for each share that the profile selects and that can't be used: one whose section is
+// wrong, and, with a line, each name that share.conf lacks, most likely a typing error.
 void warn_of_unknown_shares(const char* profile, const VLIBCSzHash& hash) {
   const char* list = hash.find("share_list");
-  for (const std::string_view word : comma_words(list == nullptr ? "" : list)) {
+  const auto words = comma_words(list == nullptr ? "" : list);
+  for (const std::string& name : words.empty() ? shares_left_out() : std::vector<std::string>{}) {
+    tell_incident("share_missing", name,
+                  "share " + name +
+                      " is left out, since its section in " VORN_PATH_SHARES
+                      " can't be used; the log says why");
+  }
+  for (const std::string_view word : words) {
     const std::string name(word);
     const std::vector<Share>* shares = all_shares();
     if (shares != nullptr && std::none_of(shares->begin(), shares->end(),
