@@ -266,6 +266,7 @@ struct Codec {
     field("unreadable", r.unreadable);
     field("other", r.other);
     field("whole", r.whole);
+    field("index", r.index);
     field("grown", r.grown);
     field("samples", r.samples);
   }

@@ -71,10 +71,27 @@ auto pressure(const report_format::VolumeFacts& volume) {
   return std::tuple(volume.level, is_full, -volume.forecast.days.value_or(kNever), volume.percent);
 }
 
-std::vector<report_format::VolumeFacts> volumes_of(const RunFacts& run, const FactsSource& source) {
+// What the shares account for, and what they don't; less than nothing where files share blocks.
+void explain(report_format::VolumeFacts& facts, const std::string& path, const Tallies& tallies) {
+  uint64_t explained = 0;
+  for (const ShareTally& share : tallies.shares()) {
+    for (const VolumeTally& volume : share.volumes()) {
+      add_bounded(explained, volume.volume == path ? volume.explained : 0);
+    }
+  }
+  constexpr uint64_t kMost = INT64_MAX;
+  facts.explained = static_cast<int64_t>(std::min(explained, kMost));
+  facts.outside = static_cast<int64_t>(std::min(facts.used, kMost)) - *facts.explained;
+}
+
+std::vector<report_format::VolumeFacts> volumes_of(const RunFacts& run, const Tallies& tallies,
+                                                   const FactsSource& source) {
   std::vector<report_format::VolumeFacts> volumes;
   for (const MeasuredVolume& volume : run.volumes) {
     volumes.push_back(volume_facts(volume, run, source));
+    if (is_asked_for(report_format::kCoverage, source)) {
+      explain(volumes.back(), volume.path, tallies);
+    }
   }
   std::stable_sort(volumes.begin(), volumes.end(),
                    [](const auto& one, const auto& two) { return pressure(one) > pressure(two); });
@@ -110,6 +127,7 @@ std::vector<report_format::ShareFacts> shares_of(const Tallies& tallies) {
     share.unreadable = tally.unreadables();
     share.other = tally.others();
     share.whole = tally.is_whole();
+    share.index = tally.is_of_index();
   }
   sort_by_size(shares);
   return shares;
@@ -179,6 +197,18 @@ std::vector<report_format::TypeFacts> types_of(const Tallies& tallies) {
   return list;
 }
 
+std::vector<report_format::AgeFacts> ages_of(const Tallies& tallies) {
+  std::vector<report_format::AgeFacts> ages;
+  for (size_t age = 0; age < report_format::kAges.size(); ++age) {
+    Amount sum;
+    for (const ShareTally& share : tallies.shares()) {
+      sum.add(share.ages()[age]);
+    }
+    ages.push_back({report_format::kAges[age].name, sum.files, sum.bytes});
+  }
+  return ages;
+}
+
 // --- Reports ------------------------------------------------------------------------------------
 
 std::vector<report_format::ReportFacts> reports_of(const RunFacts& run, const FactsSource& source) {
@@ -218,7 +248,7 @@ Facts assemble_facts(const RunFacts& run, const Tallies& tallies, const FactsSou
   facts.complete = std::none_of(
       run.incidents.begin(), run.incidents.end(),
       [](const auto& incident) { return incident.level == report_format::IncidentLevel::kError; });
-  facts.volumes = volumes_of(run, source);
+  facts.volumes = volumes_of(run, tallies, source);
   if (source.has_walked) {
     facts.shares = shares_of(tallies);
   }
@@ -227,6 +257,9 @@ Facts assemble_facts(const RunFacts& run, const Tallies& tallies, const FactsSou
   }
   if (is_asked_for(report_format::kFileGroup, source)) {
     facts.types = types_of(tallies);
+  }
+  if (is_asked_for(report_format::kFileAge, source)) {
+    facts.ages = ages_of(tallies);
   }
   if (run.quotas) {
     facts.quotas = run.quotas->users();

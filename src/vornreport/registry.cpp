@@ -1,8 +1,8 @@
 // How to add a report:
 //   1. Add its format to kReports of report_format/reports.hpp, at the place it shall have on the
 //      page: name, variable and limits, which page and vornctl take from there.
-//   2. Write src/rep_<name>.cpp: a StatisticsReport record and its report function (or, for one
-//      that doesn't read the statistics database, a report function of its own).
+//   2. Write src/rep_<name>.cpp: a StatisticsReport record and its report function; a ListedReport
+//      for one whose rows gathering has counted; for others a report function of their own.
 //   3. Add its line to kRegistry below, at the same place.
 //   4. Add its section to the page: one entry in reportUI/page/src/sections.js, and its texts in
 //      the dictionaries of reportUI/template/lang.
@@ -12,9 +12,12 @@
 #include <array>
 #include <string_view>
 
+#include "rep_coverage.hpp"
 #include "rep_duplicate_file/duplicate_file.hpp"
+#include "rep_file_age.hpp"
 #include "rep_file_group.hpp"
 #include "rep_file_owner.hpp"
+#include "rep_folder_usage.hpp"
 #include "rep_large_file.hpp"
 #include "rep_modify_time.hpp"
 #include "rep_quota_usage.hpp"
@@ -43,6 +46,9 @@ constexpr std::array kRegistry{
     entry(report_format::kLargeFile, large_file_db),
     entry(report_format::kLeastModify, least_modify_db),
     entry(report_format::kMostModify, most_modify_db),
+    entry(report_format::kFolderUsage, folder_usage),
+    entry(report_format::kFileAge, file_age),
+    entry(report_format::kCoverage, coverage),
 };
 
 // Everyone else goes by the table of formats.

@@ -7,11 +7,20 @@ import sqlite3
 import subprocess
 import time
 
-from expected import facts
+from expected import facts, local_time
 from harness import ALL, FORMAT, ROOT, MailServer, ProductTest, make_files, needs_loop_devices
 from server import DAY, SHARES, USERS, Server
 
 MIB = 1 << 20
+AGES = '0-7 7-30 30-90 90-365 365-1095 1095-1825 1825- future'.split()
+
+
+def age_of(seconds):
+    days = seconds / DAY
+    if days < -1:
+        return 'future'
+    return max((age for age in AGES[:-1] if int(age.split('-')[0]) <= max(days, 0)),
+               key=lambda age: int(age.split('-')[0]))
 
 
 def plain(mail):
@@ -30,6 +39,38 @@ def amounts(rows):
 @needs_loop_devices
 class PreparedServer(ProductTest):
     """Four volumes, quotas and half a year of history."""
+
+    def check_insight(self, report, found, shares, ages, below):
+        def rows(name):
+            lines = (report / f'csv/{name}.csv').read_bytes().split(b'\n')[1:-1]
+            return [[field.strip(b'"').replace(b'""', b'"') for field in line.split(b'\t')]
+                    for line in lines]
+
+        def amount(sizes):
+            return [b'%d' % len(sizes), b'%d' % sum(sizes)]
+        self.assertEqual(sorted(rows('file_age')), sorted(
+            [share.encode(), age.encode(), *amount(sizes)] for (share, age), sizes in ages.items()))
+        total = {age: [sum(len(s) for (_, a), s in ages.items() if a == age),
+                       sum(sum(s) for (_, a), s in ages.items() if a == age)] for age in AGES}
+        self.assertEqual({age['age']: [age['files'], age['bytes']] for age in found['ages']}, total)
+        self.assertEqual(sorted(rows('coverage')), sorted(
+            [each['volume'].encode(), name.encode(),
+             *(b'%d' % each[key] for key in ('files', 'bytes', 'allocated', 'unreadable', 'other'))]
+            for name, each in shares.items()))
+        for volume in found['volumes']:
+            explained = sum(each['allocated'] for each in shares.values()
+                            if each['volume'] == volume['path'])
+            self.assertEqual((volume['explained'], volume['outside']),
+                             (explained, volume['used'] - explained))
+        folders = rows('folder_usage')
+        self.assertEqual(sorted(folder[:4] for folder in folders), sorted(
+            [share.encode(), way, *amount([size for size, _ in files])[::-1]]
+            for (share, way), files in below.items()))
+        sizes = [int(folder[2]) for folder in folders]
+        self.assertEqual(sizes, sorted(sizes, reverse=True))
+        for share, way, _, _, newest in folders:
+            last = max([changed for _, changed in below[share.decode(), way]], default=0)
+            self.assertEqual(newest.decode(), local_time(last))
 
     def test_facts_against_independent_counts(self):
         server = Server(self.m, self)
@@ -54,15 +95,21 @@ class PreparedServer(ProductTest):
         # What is in each share, by a walk of our own.
         shares, owners, types = {}, collections.defaultdict(list), collections.defaultdict(list)
         duplicates = collections.defaultdict(set)
+        ages, below = collections.defaultdict(list), collections.defaultdict(list)
         for volume, names in SHARES.items():
             for share in names:
                 top = server.root / volume / share
                 count = {'name': share, 'path': f'/srv/{volume}/{share}', 'volume': f'/srv/{volume}',
                          'files': 0, 'folders': 0, 'bytes': 0, 'allocated': 0, 'unreadable': 0,
-                         'other': 0, 'whole': True, 'grown': None, 'samples': None}
+                         'other': 0, 'whole': True, 'index': False, 'grown': None, 'samples': None}
                 for path, folders, files in os.walk(os.fsencode(top)):
                     folders[:] = [name for name in folders if name != b'@eaDir']
                     count['folders'] += len(folders)
+                    inside = os.path.relpath(path, os.fsencode(top)).split(b'/')
+                    ways = [b'.'] + [b'/'.join(inside[:n + 1]) for n in range(len(inside))
+                                     if inside != [b'.']]
+                    for way in ways:
+                        below[share, way] += []
                     for name in files:
                         status = os.lstat(os.path.join(path, name))
                         if not os.path.isfile(os.path.join(path, name)) or os.path.islink(
@@ -75,11 +122,17 @@ class PreparedServer(ProductTest):
                         owners[users.get(status.st_uid)].append(((share, f'/srv/{volume}'),
                                                                  status.st_size))
                         types[share].append(status.st_size)
+                        changed = int(status.st_mtime) % (1 << 32)
+                        ages[share, age_of(found['started'] - changed)].append(status.st_size)
+                        for way in ways:
+                            below[share, way].append((status.st_size, changed))
                         duplicates[name, status.st_size].add((status.st_dev, status.st_ino))
                 shares[share] = count
         self.assertEqual({share['name']: share for share in found['shares']}, shares)
         self.assertEqual([share['bytes'] for share in found['shares']],
                          sorted((share['bytes'] for share in shares.values()), reverse=True))
+
+        self.check_insight(report, found, shares, ages, below)
 
         # Owners: of the three that may be told of, wherever they have files.
         told = {'anna', 'bjoern', 'john-doe'}
@@ -142,8 +195,8 @@ class PreparedServer(ProductTest):
             self.assertEqual(volume['samples'][-1][1], used)
             self.assertEqual(len(volume['samples']), 30)  # of every third day, and today's
         self.assertEqual(found['volumes'][0]['path'], '/srv/projects')
-        self.assertEqual([found[key] for key in ('format', 'profile', 'complete', 'incidents', 'ages')],
-                         [1, 'p', True, [], None])
+        self.assertEqual([found[key] for key in ('format', 'profile', 'complete', 'incidents')],
+                         [1, 'p', True, []])
         self.assertTrue(before <= found['started'] <= found['finished'] <= time.time())
         self.assertEqual([entry['name'] for entry in found['reports']], ALL.split(','))
         large = next(entry for entry in found['reports'] if entry['name'] == 'large_file')

@@ -58,7 +58,7 @@ ROOMS = {
                'global gathering history ' + PROGRAM),
     'global': (r'src/global\.cpp|include/vornreport/global\.hpp', 'report ' + PROGRAM),
     'report': (r'src/rep_([a-z_]+)[./].*', 'frame history ' + PROGRAM),
-    'frame': (r'src/report_frame\..*', PROGRAM),
+    'frame': (r'src/(?:report_frame|listed_report)\..*', PROGRAM),
     'gathering': (r'src/file_gathering/.*', PROGRAM),
     'history': (r'src/db_volume_usage\..*', PROGRAM),
     'facts': (r'src/facts/.*', 'ground format api'),

@@ -81,7 +81,8 @@ test('reports that failed say so, and empty ones that nothing was found', async 
   const [quotas] = CASES['no quotas'][3];
   for (const [name, expected] of [
     ['broken', {quota_usage: [quotas], duplicate_file: nothing, least_modify: nothing}],
-    ['empty', {...Object.fromEntries(ALL.map(report => [report, nothing])), quota_usage: [quotas], volume_usage: []}]]) {
+    ['empty', {...Object.fromEntries(ALL.map(report => [report, nothing])), quota_usage: [quotas],
+               volume_usage: [], folder_usage: undefined, coverage: undefined}]]) {
     const bare = withBlock(pageOf(name), FORMAT.facts_variable, '');
     for (const [page, usage] of [[pageOf(name), short], [bare, []]]) {
       await t.test(name, () => withPage(page, async view => {

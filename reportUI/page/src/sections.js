@@ -84,6 +84,34 @@ function usageTable(data, facts) {
                {caption: format.nameOf('reports', 'volume_usage'), csv: data.csv, sorted: 1});
 }
 
+// What is used on each volume, and how much of it the shares hold.
+function explainedTable(facts) {
+  const ofIndex = new Set(facts.shares?.filter(({index}) => index).map(({volume}) => volume));
+  const volumes = facts.volumes.filter(({explained}) => explained !== undefined);
+  const rows = volumes.map(({path, used, explained, outside}) => [
+    path, String(used), String(explained),
+    {text: outside < 0 ? format.say('outsideLess') : format.size(outside), order: outside}]);
+  return rows.length ? [
+    table([['volume', 'name'], ['used', 'size'], ['explained', 'size'], ['outside', 'outlook']], rows,
+          {caption: format.say('volumes')}),
+    ...volumes.filter(({path}) => ofIndex.has(path)).map(
+      ({path}) => h('p', {class: 'note'}, format.say('partlyByIndex', {name: shownPlain(path)})))] : [];
+}
+
+// Files and bytes of each age over all shares, of rows of share, age, files and size.
+function ageTotals(rows) {
+  const totals = new Map();
+  for (const [, age, files, bytes] of rows) {
+    const total = totals.get(age) ?? [0, 0];
+    totals.set(age, [total[0] + (Number(files) || 0), total[1] + (Number(bytes) || 0)]);
+  }
+  // From the youngest on; what is in the future has no number.
+  const order = age => Number.isNaN(parseInt(age, 10)) ? Infinity : parseInt(age, 10);
+  return [...totals].sort(([one], [two]) => order(one) - order(two)).map(
+    ([age, [files, bytes]]) => [ageName(age), String(bytes), String(files)]);
+}
+const ageName = age => age === 'future' ? format.say('future') : age.replace('-', '–');
+
 export const REPORTS = {
   volume_usage: {
     always: true,
@@ -139,6 +167,30 @@ export const REPORTS = {
   most_modify: {
     show: data => [table(FILES, pick(rowsOf(data), 1, 2, 3, 0),
                          {caption: data.heading, csv: data.csv})]
+  },
+  folder_usage: {
+    show: data => [table(
+      [['folder', 'name'], ['size', 'size'], ['files', 'count'], ['newest', 'time'],
+       ['share', 'text']],
+      pick(rowsOf(data), 1, 2, 3, 4, 0), {caption: data.heading, csv: data.csv, sorted: 1})]
+  },
+  file_age: {
+    show: data => [
+      table([['age', 'text'], ['size', 'size'], ['files', 'count']], ageTotals(rowsOf(data)),
+            {caption: data.heading, csv: data.csv}),
+      folded(format.nameOf('columns', 'share'), table(
+        [['share', 'name'], ['age', 'text'], ['size', 'size'], ['files', 'count']],
+        rowsOf(data).map(([share, age, files, bytes]) => [share, ageName(age), bytes, files]),
+        {caption: format.nameOf('columns', 'share')}))]
+  },
+  coverage: {
+    show: (data, facts) => [
+      ...facts ? explainedTable(facts) : [],
+      table([['volume', 'name'], ['share', 'text'], ['size', 'size'], ['allocated', 'size'],
+             ['files', 'count'], ['unreadable', 'count'], ['other', 'count']],
+            rowsOf(data).map(([volume, share, files, bytes, allocated, unreadable, other]) => [
+              format.volumeName(volume), share, bytes, allocated, files, unreadable, other]),
+            {caption: data.heading, csv: data.csv})]
   }
 };
 for (const {name, variable, columns, has_csv_rows: hasCsv} of FORMATS) {

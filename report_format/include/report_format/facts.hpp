@@ -122,6 +122,7 @@ struct ShareFacts {
   std::uint64_t unreadable = 0;  // files and folders
   std::uint64_t other = 0;       // entries that are neither files nor folders
   bool whole = false;            // everything in it was read
+  bool index = false;            // its files come from its index, which tells no space on disk
   std::optional<Grown> grown;
   std::optional<std::vector<Sample>> samples;
 };

@@ -41,10 +41,14 @@ inline constexpr ReportFormat kLargeFile{"large_file", "vornLargeFileData", 3, 2
 inline constexpr ReportFormat kLeastModify{"least_modify", "vornLeastModifyData", 4, 200, 10000};
 inline constexpr ReportFormat kMostModify{"most_modify", "vornMostModifyData", 4, 200, 10000};
 
+inline constexpr ReportFormat kFolderUsage{"folder_usage", "vornFolderUsageData", 5, 2000, 10000};
+inline constexpr ReportFormat kFileAge{"file_age", "vornFileAgeData", 4, 0, 0};
+inline constexpr ReportFormat kCoverage{"coverage", "vornCoverageData", 7, 0, 0};
+
 // In the order in which reports run and stand in the page.
-inline constexpr std::array kReports{&kQuotaUsage, &kFileOwner,   &kVolumeUsage,
-                                     &kShareList,  &kFileGroup,   &kDuplicateFile,
-                                     &kLargeFile,  &kLeastModify, &kMostModify};
+inline constexpr std::array kReports{&kQuotaUsage, &kFileOwner,     &kVolumeUsage, &kShareList,
+                                     &kFileGroup,  &kDuplicateFile, &kLargeFile,   &kLeastModify,
+                                     &kMostModify, &kFolderUsage,   &kFileAge,     &kCoverage};
 
 // A report is selected when its name occurs anywhere in the list.
 constexpr bool is_selected(std::string_view name, std::string_view report_list) {

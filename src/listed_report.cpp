@@ -1,0 +1,90 @@
+#include "listed_report.hpp"
+
+#include <algorithm>
+#include <cstdio>
+#include <utility>
+
+#include "facts/run_facts.hpp"
+#include "vornreport/error_log.hpp"
+#include "vornreport/handles.hpp"
+#include "vornreport/report_data.hpp"
+
+namespace vornreport {
+namespace {
+
+size_t within(uint64_t limit, size_t rows) {
+  return limit == 0 ? rows : static_cast<size_t>(std::min<uint64_t>(limit, rows));
+}
+
+// As report_row_writer() writes them.
+void write_block(FILE* data, const ListedReport& report, std::span<const ListedRow> rows) {
+  if (!rows.empty()) {
+    std::fprintf(data, "<script type='text/javascript'>\nvar %s = [\n", report.format.variable);
+  }
+  const char* row_before = "";
+  for (const ListedRow& row : rows) {
+    std::fputs(row_before, data);
+    row_before = ",\n";
+    const char* before = "[ '";
+    for (size_t i = 0; i < report.columns.size(); ++i) {
+      std::fputs(before, data);
+      write_data_text(data, report.columns[i].data_text, row[i].c_str(), report.module);
+      std::fputc('\'', data);
+      before = ", '";
+    }
+    std::fputs(" ]", data);
+  }
+  std::fputs(rows.empty() ? "</script>\n" : "\n];\n</script>\n", data);
+}
+
+void write_csv(FILE* csv, const ListedReport& report, std::span<const ListedRow> rows) {
+  std::fprintf(csv, "%s\n", report.csv_header);
+  for (const ListedRow& row : rows) {
+    const char* before = "\"";
+    for (size_t i = 0; i < report.columns.size(); ++i) {
+      std::fputs(before, csv);
+      write_csv_text(csv, report.columns[i].csv_text, row[i].c_str(), report.module);
+      std::fputc('"', csv);
+      before = "\t\"";
+    }
+    std::fputc('\n', csv);
+  }
+}
+
+}  // namespace
+
+int32_t run_listed_report(const ListedReport& report, const ReportArgs* args,
+                          const std::vector<ListedRow>& rows) {
+  const char* csv_dir = args != nullptr && args->profile_hash != nullptr
+                            ? set_value(args->profile_hash, "real_path_csv")
+                            : nullptr;
+  if (csv_dir == nullptr) {
+    REPORT_LOG_ERR_NESTED(report.module, __LINE__, "get csv dir failed");
+    return -1;
+  }
+  const size_t shown = within(report.format.page_limit, rows.size());
+  const std::span<const ListedRow> all(rows);
+  const PathText data_path = report_data_path();
+  FileHandle data = open_report_file(data_path.c_str(), "a", report.module, __LINE__);
+  PathText csv_path;
+  csv_path.format("%s/%s.csv", csv_dir, report.format.name);
+  FileHandle csv = open_report_file(csv_path.c_str(), "a", report.module, __LINE__,
+                                    LogForm::kNested, Costs::kReport);
+  if (!data || !csv) {
+    return -1;
+  }
+  write_block(data.get(), report, all.first(shown));
+  write_csv(csv.get(), report, all.first(within(report.format.csv_limit, rows.size())));
+  run_facts().rows[report.format.name] = {rows.size(), shown};
+  const bool data_kept =
+      close_report_file(std::move(data), data_path.c_str(), report.module, __LINE__);
+  const bool csv_kept =
+      close_report_file(std::move(csv), csv_path.c_str(), report.module, __LINE__, Costs::kReport);
+  if (!data_kept || !csv_kept) {
+    return -1;
+  }
+  finish_csv(report.format, csv_path.c_str());
+  return 0;
+}
+
+}  // namespace vornreport
