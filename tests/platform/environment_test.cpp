@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cctype>
 #include <csignal>
 #include <cstdint>
@@ -13,6 +14,8 @@
 #include <ctime>
 #include <filesystem>
 #include <random>
+#include <set>
+#include <thread>
 
 #include "machine/server.hpp"
 #include "machine/sqlite_memory.hpp"
@@ -120,6 +123,46 @@ TEST(SqliteMemory, KeepsEveryByteOfEveryBlock) {
     ASSERT_GE(given, size);
     std::memset(changed, fill, static_cast<std::size_t>(given));
     block = {static_cast<unsigned char*>(changed), given, fill};
+  }
+  for (const Block& block : blocks) {
+    EXPECT_TRUE(block.intact());
+    memory.xFree(block.bytes);
+  }
+}
+
+// Blocks are freed by other threads than took them, and outlive the thread they are from; whatever
+// a thread leaves free, the next one takes.
+TEST(SqliteMemory, OutlivesItsThreads) {
+  std::set<void*> seen;
+  std::array<Block, 100> blocks{};
+  for (int round = 0; round < 50; ++round) {
+    std::thread([&] {
+      for (Block& block : blocks) {
+        memory.xFree(block.bytes);
+        block = {static_cast<unsigned char*>(memory.xMalloc(5000)), 5000,
+                 static_cast<unsigned char>(round)};
+        std::memset(block.bytes, block.fill, 5000);
+        seen.insert(block.bytes);
+      }
+    }).join();
+    EXPECT_TRUE(
+        std::all_of(blocks.begin(), blocks.end(), [](auto& block) { return block.intact(); }));
+  }
+  EXPECT_EQ(std::size(blocks), seen.size());
+  std::array<std::thread, 4> threads;  // which all take and free at once
+  for (std::size_t i = 0; i < threads.size(); ++i) {
+    threads[i] = std::thread([&, i] {
+      for (int step = 0; step < 20'000; ++step) {
+        Block& block = blocks[i + 4 * (static_cast<std::size_t>(step) % 25)];
+        EXPECT_TRUE(block.intact());
+        memory.xFree(block.bytes);
+        block.bytes = static_cast<unsigned char*>(memory.xMalloc(5000));
+        std::memset(block.bytes, block.fill = static_cast<unsigned char>(i), 5000);
+      }
+    });
+  }
+  for (std::thread& thread : threads) {
+    thread.join();
   }
   for (const Block& block : blocks) {
     EXPECT_TRUE(block.intact());

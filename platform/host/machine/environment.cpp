@@ -60,9 +60,11 @@ void raise_file_limit() {
   static_cast<void>(setrlimit(RLIMIT_NOFILE, &limit));
 }
 
-// Only a saving of time: where SQLite is already running these are refused, and all works as well.
+// Only a saving of time: where SQLite is already running these are refused, and all works as well,
+// since it locks each connection by itself then.
 void configure_sqlite() {
-  sqlite3_config(SQLITE_CONFIG_SINGLETHREAD);
+  // Every connection belongs to one thread.
+  sqlite3_config(SQLITE_CONFIG_MULTITHREAD);
   sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);
   // Pages (8 MiB) that a sort gathers before it writes them out: with the default of a quarter of
   // that, ten million rows are merged in one level more.

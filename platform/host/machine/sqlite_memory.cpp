@@ -4,8 +4,10 @@
 #include <array>
 #include <bit>
 #include <cstddef>
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <mutex>
 
 namespace host {
 namespace {
@@ -24,16 +26,61 @@ struct FreeBlock {
   FreeBlock* next;
 };
 
-// Stands before every block. `home` is the list that the block returns to, null for one of malloc.
+// Stands before every block. `list` is the index of the list that a block of a slab goes to when it
+// is freed, whichever thread frees it; kOfSystem for one of malloc.
+constexpr std::int32_t kOfSystem = -1;
 struct alignas(16) Header {
-  FreeBlock** home;
-  int size;
+  std::int32_t list;
+  std::int32_t size;
 };
 static_assert(sizeof(Header) == 16);
 
-std::array<FreeBlock*, kClassCount> free_lists{};
-std::byte* slab_next = nullptr;
-std::byte* slab_end = nullptr;
+// What a thread takes blocks from and gives them to. Never freed, as blocks of its slabs may be in
+// use by other threads: a thread that ends leaves it to the next one that begins.
+struct Pool {
+  std::array<FreeBlock*, kClassCount> free_lists;
+  std::byte* slab_next;
+  std::byte* slab_end;
+  Pool* next;  // of those that no thread has
+};
+
+std::mutex idle_pools_mutex;
+Pool* idle_pools = nullptr;
+
+// Without a destructor and found without a call, since every block asks for it.
+[[gnu::tls_model("initial-exec")]] constinit thread_local Pool* own_pool = nullptr;
+
+struct LeavePool {
+  ~LeavePool() {
+    const std::lock_guard lock(idle_pools_mutex);
+    own_pool->next = idle_pools;
+    idle_pools = own_pool;
+    own_pool = nullptr;
+  }
+};
+
+// Null when there is no memory.
+[[gnu::noinline]] Pool* take_pool() {
+  {
+    const std::lock_guard lock(idle_pools_mutex);
+    if (idle_pools != nullptr) {
+      own_pool = idle_pools;
+      idle_pools = own_pool->next;
+    }
+  }
+  if (own_pool == nullptr) {
+    own_pool = static_cast<Pool*>(std::calloc(1, sizeof(Pool)));
+  }
+  if (own_pool != nullptr) {
+    static thread_local const LeavePool leave_at_end;
+  }
+  return own_pool;
+}
+
+Pool* pool() {
+  Pool* const own = own_pool;
+  return own != nullptr ? own : take_pool();
+}
 
 constexpr unsigned class_of(unsigned size) {
   if (size <= kSmallLimit) [[likely]] {
@@ -65,25 +112,25 @@ void* from_system(unsigned size) {
   if (header == nullptr) {
     return nullptr;
   }
-  *header = {nullptr, static_cast<int>(size)};
+  *header = {kOfSystem, static_cast<std::int32_t>(size)};
   return header + 1;
 }
 
 // What is left of the old slab, less than one block of this class, is given up.
-[[gnu::noinline]] void* carve(unsigned index) {
+[[gnu::noinline]] void* carve(Pool& own, unsigned index) {
   const unsigned size = class_size(index);
   const std::size_t needed = sizeof(Header) + size;
-  if (static_cast<std::size_t>(slab_end - slab_next) < needed) {
+  if (static_cast<std::size_t>(own.slab_end - own.slab_next) < needed) {
     auto* slab = static_cast<std::byte*>(std::malloc(kSlabSize));
     if (slab == nullptr) {
       return nullptr;
     }
-    slab_next = slab;
-    slab_end = slab + kSlabSize;
+    own.slab_next = slab;
+    own.slab_end = slab + kSlabSize;
   }
-  auto* header = reinterpret_cast<Header*>(slab_next);
-  slab_next += needed;
-  *header = {&free_lists[index], static_cast<int>(size)};
+  auto* header = reinterpret_cast<Header*>(own.slab_next);
+  own.slab_next += needed;
+  *header = {static_cast<std::int32_t>(index), static_cast<std::int32_t>(size)};
   return header + 1;
 }
 
@@ -93,12 +140,16 @@ void* allocate(int bytes) {
   if (size > kPooledLimit) [[unlikely]] {
     return from_system(size);
   }
-  const unsigned index = class_of(size);
-  FreeBlock* block = free_lists[index];
-  if (block == nullptr) [[unlikely]] {
-    return carve(index);
+  Pool* const own = pool();
+  if (own == nullptr) [[unlikely]] {
+    return nullptr;
   }
-  free_lists[index] = block->next;
+  const unsigned index = class_of(size);
+  FreeBlock* block = own->free_lists[index];
+  if (block == nullptr) [[unlikely]] {
+    return carve(*own, index);
+  }
+  own->free_lists[index] = block->next;
   return block;
 }
 
@@ -107,14 +158,18 @@ void release(void* block) {
     return;
   }
   Header* header = header_of(block);
-  FreeBlock** home = header->home;
-  if (home == nullptr) [[unlikely]] {
+  if (header->list == kOfSystem) [[unlikely]] {
     std::free(header);
     return;
   }
+  Pool* const own = pool();
+  if (own == nullptr) [[unlikely]] {
+    return;  // lost; there is no memory for more than this block either
+  }
+  FreeBlock*& list = own->free_lists[static_cast<unsigned>(header->list)];
   auto* freed = static_cast<FreeBlock*>(block);
-  freed->next = *home;
-  *home = freed;
+  freed->next = list;
+  list = freed;
 }
 
 int size_of(void* block) {
@@ -124,7 +179,7 @@ int size_of(void* block) {
 void* reallocate(void* block, int bytes) {
   Header* header = header_of(block);
   const auto size = static_cast<unsigned>(bytes);
-  if (header->home == nullptr && size > kPooledLimit) {
+  if (header->list == kOfSystem && size > kPooledLimit) {
     header = static_cast<Header*>(std::realloc(header, sizeof(Header) + size));
     if (header == nullptr) {
       return nullptr;
@@ -132,7 +187,7 @@ void* reallocate(void* block, int bytes) {
     header->size = bytes;
     return header + 1;
   }
-  if (header->home != nullptr && bytes <= header->size) {
+  if (header->list != kOfSystem && bytes <= header->size) {
     return block;
   }
   void* moved = allocate(bytes);
