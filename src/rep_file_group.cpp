@@ -30,12 +30,14 @@
 #include "vornreport/fixed_text.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
+#include "vornreport/statements_ahead.hpp"
 #include "vornreport/statistics_db.hpp"
 
 namespace vornreport {
 namespace {
 
 constexpr char kModule[] = "src/rep_file_group";
+constexpr char kOfAllFiles[] = "select ext,share,sum(size) from file_stat group by ext, share;";
 
 // The section of the last row written, for the life of the process; none for all files.
 std::optional<std::string> g_previous_user;
@@ -93,7 +95,7 @@ bool run_query(GroupReport& report, const char* sql) {
   report_trace(kModule, __LINE__, "exec sql=%s\n", sql);
   VornQazSetEnv();
   char* message = nullptr;
-  const int result = sqlite3_exec(report.db.get(), sql, FileGroupRowWriter, &report.ctx, &message);
+  const int result = run_statement(report.db.get(), sql, FileGroupRowWriter, &report.ctx, &message);
   const SqliteText owned(message);
   if (result == SQLITE_OK) {
     return true;
@@ -153,7 +155,7 @@ bool write_users(GroupReport& report, const char* limit_user) {
 }
 
 bool write_sections(GroupReport& report, const VLIBCSzHash* profile_hash) {
-  if (!run_query(report, "select ext,share,sum(size) from file_stat group by ext, share;")) {
+  if (!run_query(report, kOfAllFiles)) {
     return false;
   }
   if (report.ctx.row_count != 0) {
@@ -199,6 +201,10 @@ int FileGroupRowWriter(void* context, int /*columns*/, char** values, char** /*n
   ++ctx->shown_count;
   ++ctx->row_count;
   return 0;
+}
+
+const char* file_group_statement(const VLIBCSzHash* /*profile_hash*/) {
+  return kOfAllFiles;
 }
 
 int32_t file_group_db(ReportArgs* args) {

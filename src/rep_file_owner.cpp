@@ -21,6 +21,10 @@ constexpr StatisticsReport kFileOwnerReport{
 
 }  // namespace
 
+const char* file_owner_statement(const VLIBCSzHash* /*profile_hash*/) {
+  return kFileOwnerReport.sql;
+}
+
 int32_t file_owner_db(ReportArgs* args) {
   return run_statistics_report(kFileOwnerReport, args);
 }

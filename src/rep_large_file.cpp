@@ -18,6 +18,10 @@ constexpr StatisticsReport kLargeFileReport{
 
 }  // namespace
 
+const char* large_file_statement(const VLIBCSzHash* /*profile_hash*/) {
+  return kLargeFileReport.sql;
+}
+
 int32_t large_file_db(ReportArgs* args) {
   return run_statistics_report(kLargeFileReport, args);
 }

@@ -32,8 +32,16 @@ constexpr StatisticsReport kMostModifyReport{
 
 }  // namespace
 
+const char* least_modify_statement(const VLIBCSzHash* /*profile_hash*/) {
+  return kLeastModifyReport.sql;
+}
+
 int32_t least_modify_db(ReportArgs* args) {
   return run_statistics_report(kLeastModifyReport, args);
+}
+
+const char* most_modify_statement(const VLIBCSzHash* /*profile_hash*/) {
+  return kMostModifyReport.sql;
 }
 
 int32_t most_modify_db(ReportArgs* args) {

@@ -19,6 +19,10 @@ constexpr StatisticsReport kShareListReport{
 
 }  // namespace
 
+const char* share_list_statement(const VLIBCSzHash* /*profile_hash*/) {
+  return kShareListReport.sql;
+}
+
 int32_t share_list_db(ReportArgs* args) {
   return run_statistics_report(kShareListReport, args);
 }

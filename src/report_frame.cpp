@@ -15,6 +15,7 @@
 #include "vornreport/fixed_text.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
+#include "vornreport/statements_ahead.hpp"
 #include "vornreport/statistics_db.hpp"
 
 namespace vornreport {
@@ -181,7 +182,7 @@ int32_t write_rows(const StatisticsReport& report, sqlite3* db, report_row_ctx& 
                    bool is_embedded) {
   VornQazSetEnv();
   char* message = nullptr;
-  const int result = sqlite3_exec(db, report.sql, report.row_writer, &ctx, &message);
+  const int result = run_statement(db, report.sql, report.row_writer, &ctx, &message);
   if (result != SQLITE_OK) {
     const SqliteText owned(message);
     REPORT_LOG_ERR(report.module, __LINE__, "Exec sql:[%s] error: %s\n\n", report.sql,

@@ -14,7 +14,8 @@ struct ReportEntry {
   char name[128];  // as it stands in `report_list`; NUL-padded
   ReportSource source;
   ReportFunction report;
-  CollectFunction collect;  // null for a report without data of its own between runs
+  StatementFunction statement;  // null for a report that asks for none; see statements_ahead.hpp
+  CollectFunction collect;      // null for a report without data of its own between runs
 };
 
 // In the order in which reports run and stand on the page.

@@ -25,6 +25,9 @@ struct ReportArgs {
 
 // Appends the report's block to the report data file and writes its CSV file. 0 or -1.
 using ReportFunction = int32_t (*)(ReportArgs* args);
+// The statement that a report of the statistics database begins with, for a profile's section; what
+// it gives lasts as long as the process.
+using StatementFunction = const char* (*)(const VLIBCSzHash* profile_hash);
 // Stores what a report accumulates between runs. 0 or -1.
 using CollectFunction = int32_t (*)(const char* profile, const VLIBCSzHash* profile_hash);
 

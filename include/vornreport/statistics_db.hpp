@@ -20,6 +20,11 @@ struct FileInfo {
 // failure, which is logged.
 SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash);
 
+// A further connection to the database at `path`, for another thread: set up as that of
+// VORNReportDBInit, by calls of SQLite alone. Null, and nothing is logged, when that isn't
+// possible.
+SqliteHandle open_further(const char* path);
+
 // Remembers the database as the one that holds the run's rows. When another file stands in its
 // place later, VORNReportDBInit logs that and marks the run's data as lost.
 void remember_gathered(const VLIBCSzHash* profile_hash);

@@ -229,6 +229,19 @@ SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash) {
   return db;
 }
 
+SqliteHandle open_further(const char* path) {
+  sqlite3* raw = nullptr;
+  // Writable, to roll back what a failed transaction has left; but it makes no file.
+  const int opened = sqlite3_open_v2(path, &raw, SQLITE_OPEN_READWRITE, nullptr);
+  SqliteHandle db(raw);
+  if (opened != SQLITE_OK || sqlite3_busy_timeout(raw, kLockWaitMs) != SQLITE_OK ||
+      define_sum(raw) != SQLITE_OK ||
+      sqlite3_exec(raw, kCreateTable, nullptr, nullptr, nullptr) != SQLITE_OK) {
+    return nullptr;
+  }
+  return db;
+}
+
 void forget_gathered() {
   g_gathered = {};
 }

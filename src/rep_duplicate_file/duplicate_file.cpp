@@ -233,6 +233,10 @@ int32_t duplicate_file2_db(ReportArgs* args) {
   return run_statistics_report(kBySize, args);
 }
 
+const char* duplicate_file_statement(const VLIBCSzHash* profile_hash) {
+  return (compares_content(profile_hash) ? kBySize : kByNameAndSize).sql;
+}
+
 int32_t duplicate_file(ReportArgs* args) {
   if (args == nullptr || args->profile_hash == nullptr) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");

@@ -8,6 +8,7 @@ namespace vornreport {
 
 // The report. 0 or -1.
 int32_t duplicate_file(ReportArgs* args);
+const char* duplicate_file_statement(const VLIBCSzHash* profile_hash);
 
 // Its query by name and size, and by size alone, in the report frame. 0 or -1.
 int32_t duplicate_file_db(ReportArgs* args);

@@ -1,8 +1,9 @@
 // How to add a report:
 //   1. Add its format to kReports of report_format/reports.hpp, at the place it shall have on the
 //      page: name, variable and limits, which page and vornctl take from there.
-//   2. Write src/rep_<name>.cpp: a StatisticsReport record and its report function; a ListedReport
-//      for one whose rows gathering has counted; for others a report function of their own.
+//   2. Write src/rep_<name>.cpp: a StatisticsReport record, its report function and the function
+//      that names its statement; a ListedReport for one whose rows gathering has counted; for others
+//      a report function of their own.
 //   3. Add its line to kRegistry below, at the same place.
 //   4. Add its section to the page: one entry in reportUI/page/src/sections.js, and its texts in
 //      the dictionaries of reportUI/template/lang.
@@ -29,23 +30,24 @@ namespace vornreport {
 namespace {
 
 constexpr ReportEntry entry(const report_format::ReportFormat& format, ReportFunction report,
+                            StatementFunction statement = nullptr,
                             CollectFunction collect = nullptr) {
   const ReportSource source = format.of_files ? ReportSource::kStatistics : ReportSource::kSystem;
-  ReportEntry made{{}, source, report, collect};
+  ReportEntry made{{}, source, report, statement, collect};
   std::string_view(format.name).copy(made.name, sizeof made.name - 1);
   return made;
 }
 
 constexpr std::array kRegistry{
     entry(report_format::kQuotaUsage, quota_usage),
-    entry(report_format::kFileOwner, file_owner_db),
-    entry(report_format::kVolumeUsage, volume_usage, volume_usage_collect_data),
-    entry(report_format::kShareList, share_list_db),
-    entry(report_format::kFileGroup, file_group_db),
-    entry(report_format::kDuplicateFile, duplicate_file),
-    entry(report_format::kLargeFile, large_file_db),
-    entry(report_format::kLeastModify, least_modify_db),
-    entry(report_format::kMostModify, most_modify_db),
+    entry(report_format::kFileOwner, file_owner_db, file_owner_statement),
+    entry(report_format::kVolumeUsage, volume_usage, nullptr, volume_usage_collect_data),
+    entry(report_format::kShareList, share_list_db, share_list_statement),
+    entry(report_format::kFileGroup, file_group_db, file_group_statement),
+    entry(report_format::kDuplicateFile, duplicate_file, duplicate_file_statement),
+    entry(report_format::kLargeFile, large_file_db, large_file_statement),
+    entry(report_format::kLeastModify, least_modify_db, least_modify_statement),
+    entry(report_format::kMostModify, most_modify_db, most_modify_statement),
     entry(report_format::kFolderUsage, folder_usage),
     entry(report_format::kFileAge, file_age),
     entry(report_format::kCoverage, coverage),

@@ -5,6 +5,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "actions.hpp"
 #include "facts/progress.hpp"
@@ -24,6 +25,7 @@
 #include "vornreport/error_log.hpp"
 #include "vornreport/registry.hpp"
 #include "vornreport/report_data.hpp"
+#include "vornreport/statements_ahead.hpp"
 
 namespace vornreport {
 namespace {
@@ -120,9 +122,22 @@ void note_owners(const VLIBCSzHash* users) {
   }
 }
 
+// What the selected reports are going to ask the statistics database, in their order.
+std::vector<const char*> statements_of(const VLIBCSzHash* profile_hash, const char* report_list) {
+  std::vector<const char*> statements;
+  for (const ReportEntry& entry : report_registry()) {
+    if (entry.statement != nullptr && is_selected(entry, report_list)) {
+      statements.push_back(entry.statement(profile_hash));
+    }
+  }
+  return statements;
+}
+
 // The number of reports run minus one.
 int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
                          const char* report_list, const LookUps& look_ups) {
+  const StatementsAhead ahead(set_value(profile_hash, "real_path_stat_db"),
+                              statements_of(profile_hash, report_list));
   int result = -1;
   for (const ReportEntry& entry : report_registry()) {
     if (!is_selected(entry, report_list)) {
