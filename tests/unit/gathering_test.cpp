@@ -9,6 +9,7 @@
 #include <csignal>
 #include <cstring>
 #include <filesystem>
+#include <map>
 #include <set>
 
 #include "facts/run_facts.hpp"
@@ -127,8 +128,9 @@ TEST_F(GatheringTest, WalkJudgesEveryFileSystemByItsKind) {
   EXPECT_EQ(rows(db_.get(), "select count(*) from file_stat where path like '/dev/shm/%'"), "0\n");
 }
 
-// As deep as a path can be, with another folder to look into on every level: the files above the cut
-// are found, the rest is logged and skipped, and neither the stack nor the file handles run out.
+// As deep as a path can be, with another folder to look into on every level: the files above the
+// cut are found, the rest is logged and skipped, and neither the stack nor the file handles run
+// out.
 TEST_F(GatheringTest, WalkGoesAsDeepAsAPathCanBe) {
   const std::string top = folder_.path("deep");
   std::filesystem::create_directories(top);
@@ -203,12 +205,16 @@ TEST_F(GatheringTest, WalkIsNotLedOutByASwappedFolder) {
 }
 
 // Two shares with the same files: one folder, one inside the other, one reached through a link, one
-// of an index. Each pair is told once; those apart aren't.
+// of an index. Each pair is told once; those apart aren't. Of what a volume's use is explained by,
+// each file counts once.
 TEST_F(GatheringTest, TellsOfSharesThatOverlap) {
   for (const char* name : {"top/inside/deep", "apart", "top/aside"}) {
     std::filesystem::create_directories(folder_.path(name));
   }
   std::filesystem::create_symlink(folder_.path("top/inside"), folder_.path("link"));
+  for (const char* name : {"top/a", "top/inside/deep/b", "apart/c", "top/aside/x"}) {
+    write_file(folder_.path(name), "text");
+  }
   make_index(folder_.path("index.db"), "('ann','1','1','x','x','',0)");
   platform.users = {{"ann", 1}};
   platform.shares = {{"outer", folder_.path("top")},       {"same", folder_.path("top/")},
@@ -226,6 +232,19 @@ TEST_F(GatheringTest, TellsOfSharesThatOverlap) {
   EXPECT_EQ(told, (std::set<std::string>{"share_overlap index, outer", "share_overlap index, same",
                                          "share_overlap link, outer", "share_overlap link, same",
                                          "share_overlap outer, same"}));
+  struct stat file {};
+  ASSERT_EQ(stat(folder_.path("top/a").c_str(), &file), 0);
+  const auto block = static_cast<uint64_t>(file.st_blocks) * 512;
+  const std::map<std::string, std::pair<uint64_t, uint64_t>> expected{{"outer", {3 * block, block}},
+                                                                      {"same", {3 * block, 0}},
+                                                                      {"link", {block, block}},
+                                                                      {"apart", {block, block}},
+                                                                      {"index", {1, 1}}};
+  for (const ShareTally& share : tallies().shares()) {
+    EXPECT_EQ(std::pair(share.allocated(), share.volumes().front().explained),
+              expected.at(share.name()))
+        << share.name();
+  }
   run_facts() = RunFacts();
 }
 
