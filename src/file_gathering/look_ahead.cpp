@@ -6,13 +6,13 @@
 #include <cerrno>
 #include <chrono>
 #include <condition_variable>
-#include <csignal>
 #include <mutex>
 #include <system_error>
 #include <thread>
 #include <utility>
 
 #include "folder_listing.hpp"
+#include "signals_blocked.hpp"
 #include "thread_count.hpp"
 
 namespace vornreport {
@@ -24,22 +24,6 @@ constexpr std::chrono::milliseconds kStretch{100};  // of the search for the num
 // Without a single look of any thread the file system has hung.
 constexpr std::chrono::seconds kSilence{120};
 constexpr size_t kSmallBatch = 64;
-
-// No signal is delivered to threads that begin while this lives.
-class SignalsBlocked {
- public:
-  SignalsBlocked() {
-    sigset_t all;
-    sigfillset(&all);
-    pthread_sigmask(SIG_SETMASK, &all, &before_);
-  }
-  ~SignalsBlocked() { pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
-  SignalsBlocked(const SignalsBlocked&) = delete;
-  SignalsBlocked& operator=(const SignalsBlocked&) = delete;
-
- private:
-  sigset_t before_{};
-};
 
 }  // namespace
 

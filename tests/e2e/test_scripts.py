@@ -62,9 +62,8 @@ ROOMS = {
     'gathering': (r'src/file_gathering/.*', PROGRAM),
     'history': (r'src/db_volume_usage\..*', PROGRAM),
     'facts': (r'src/facts/.*', 'ground format api'),
-    'ground': (r'src/(?:shell|below_share|error_log|report_data|statements_ahead)\..*|'
-               r'include/vornreport/.*',
-               'format api'),
+    'ground': (r'src/(?:shell|below_share|error_log|report_data|signals_blocked|statements_ahead|'
+               r'thread_count)\..*|include/vornreport/.*', 'format api'),
 
     'ctl-main': (r'ctl/main\.cpp', 'doctor run config schedule ctl-base ' + CONTRACTS),
     'doctor': (r'ctl/doctor/.*', 'run config schedule ctl-base ' + CONTRACTS),

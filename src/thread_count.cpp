@@ -1,7 +1,5 @@
 #include "thread_count.hpp"
 
-#include <algorithm>
-
 namespace vornreport {
 namespace {
 
@@ -10,10 +8,8 @@ constexpr double kGain = 1.1;    // what more threads must bring
 constexpr double kSame = 0.97;   // what fewer may cost
 constexpr double kChange = 1.4;  // beyond it the device has changed (a cache has come to its end)
 constexpr unsigned kMostPatience = 64;
+constexpr unsigned kKnown = 4;  // patience where a trial has just told what fewer would do
 
-constexpr unsigned more_than(unsigned count) {
-  return std::min(count * 2, ThreadCount::kMost);
-}
 constexpr unsigned fewer_than(unsigned count) {
   return std::max(count / 2, 1U);
 }
@@ -28,7 +24,7 @@ void ThreadCount::settle(unsigned count, double rate) {
 // Begins a trial, or a quiet time when there is nothing to try.
 void ThreadCount::try_next(Trying next) {
   trying_ = next;
-  count_ = next == Trying::kMore    ? more_than(settled_)
+  count_ = next == Trying::kMore    ? std::min(settled_ * 2, most_)
            : next == Trying::kFewer ? fewer_than(settled_)
                                     : settled_;
   if (next == Trying::kMore && count_ == settled_) {
@@ -52,8 +48,8 @@ void ThreadCount::end_stretch(double rate, bool is_ahead) {
     case Trying::kMore:
       if (rate > settled_rate_ * kGain) {
         settle(count_, rate);
-        patience_ = 1;
-        try_next(Trying::kMore);
+        patience_ = count_ == most_ ? kKnown : 1;
+        try_next(count_ == most_ ? Trying::kNothing : Trying::kMore);
       } else {
         try_next(Trying::kFewer);
       }
