@@ -8,6 +8,8 @@
 #include <cstdio>
 #include <filesystem>
 #include <map>
+#include <thread>
+#include <vector>
 
 #include "support.hpp"
 #include "vorn/base/file_io.hpp"
@@ -89,6 +91,32 @@ TEST(FileMd5, TellsContentsApartWhateverTheirHoles) {
     }
   }
   EXPECT_EQ(groups.size(), seen.size());
+}
+
+// Each thread has a file of its own, with zeros to leave out, and is told of its own bytes.
+TEST(FileMd5, IsForSeveralThreadsAtOnce) {
+  const support::TempFolder folder;
+  static thread_local unsigned long long t_bytes;
+  VornQazSetDigestStep([](unsigned long long bytes) { t_bytes += bytes; });
+  std::vector<std::string> expected;
+  for (int i = 0; i < 4; ++i) {
+    const std::string path = folder.path(std::to_string(i));
+    support::write_file(path,
+                        std::string(kMiB, static_cast<char>(i)) + std::string(kMiB, '\0') + "x");
+    expected.push_back(digest_of(path));
+  }
+  std::vector<std::jthread> threads;
+  for (std::size_t i = 0; i < expected.size(); ++i) {
+    threads.emplace_back([&, i] {
+      for (int round = 0; round < 50; ++round) {
+        t_bytes = 0;
+        EXPECT_EQ(expected[i], digest_of(folder.path(std::to_string(i))));
+        EXPECT_EQ(2 * kMiB + 1, t_bytes);
+      }
+    });
+  }
+  threads.clear();
+  VornQazSetDigestStep(nullptr);
 }
 
 TEST(FileMd5, EndsAtItsDeadline) {

@@ -1,8 +1,10 @@
 #include "scripted_platform.hpp"
 
+#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <filesystem>
+#include <mutex>
 
 #include "base/text_containers.hpp"
 #include "vorn/config.h"
@@ -23,6 +25,8 @@ template <typename... Words>
 void record(Words... words) {
   std::string call;
   ((call += (call.empty() ? "" : " ") + shown(words)), ...);
+  static std::mutex mutex;  // digests are computed by several threads
+  const std::lock_guard lock(mutex);
   platform.calls.push_back(call);
 }
 
@@ -282,14 +286,20 @@ int VornQazGetFileMd5(const char* path, unsigned long long /*size*/, char* diges
                       size_t digest_size) {
   const std::string file = std::filesystem::read_symlink(path);  // the caller's handle
   record("GetFileMd5", file.c_str());
-  const std::string text = platform.digests[file];
+  const auto found = platform.digests.find(file);
+  const std::string text = found != platform.digests.end() ? found->second : "";
   if (text.size() <= 2) {
-    return text == "2" ? 2 : -1;
+    errno = text == "w" ? EWOULDBLOCK : errno;
+    return text == "2" || text == "w" ? 2 : -1;
   }
   std::string padded = text;
   padded.resize(digest_size, '0');
   std::memcpy(digest, padded.data(), digest_size);
   return 0;
+}
+
+void VornQazSetDigestStep(void (*step)(unsigned long long bytes)) {
+  platform.step = step;
 }
 
 void VornQazSetDigestDeadline(unsigned long long seconds) {

@@ -34,9 +34,11 @@ struct ScriptedPlatform {
   TextMap volumes_of;            // folder to mount path, for what lies in it; else "/"
   std::set<std::string> quotas;  // mount paths of volumes that keep them
   std::vector<std::string> progress;
-  std::map<std::string, std::string> digests;  // path to MD5 text; "2" or "-1": that result
-  std::function<bool()> is_past_deadline;      // of the digests; never when it is empty
-  std::set<std::string> unselected;            // shares that the profile leaves out
+  std::map<std::string, std::string>
+      digests;  // path to MD5 text; "2" or "-1": that result; "w": 2, leased
+  std::function<bool()> is_past_deadline;            // of the digests; never when it is empty
+  void (*step)(unsigned long long bytes) = nullptr;  // of the digests
+  std::set<std::string> unselected;                  // shares that the profile leaves out
   int fs_kind = 1;
   std::map<std::string, int> fs_kinds;  // for single folders
   std::string language = "en";

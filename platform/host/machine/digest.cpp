@@ -41,22 +41,41 @@ struct ReleaseWith {
   }
 };
 
-// MD5 with all that can be kept from file to file. In a library context of its own, which no
-// configuration of the system reaches: where that demands FIPS, the default one has no MD5. Here it
-// tells copies apart and guards nothing.
-class Md5 {
+// What all threads share of MD5. In a library context of its own, which no configuration of the
+// system reaches: where that demands FIPS, the default one has no MD5. Here it tells copies apart
+// and guards nothing.
+class Algorithm {
  public:
   // Throws std::bad_alloc when OpenSSL gives no MD5.
-  Md5()
-      : library_(OSSL_LIB_CTX_new()),
-        algorithm_(EVP_MD_fetch(library_.get(), "MD5", nullptr)),
-        context_(EVP_MD_CTX_new()) {
-    if (library_ == nullptr || algorithm_ == nullptr || context_ == nullptr) {
+  Algorithm() : library_(OSSL_LIB_CTX_new()), md5_(EVP_MD_fetch(library_.get(), "MD5", nullptr)) {
+    if (library_ == nullptr || md5_ == nullptr) {
       throw std::bad_alloc();
     }
   }
 
-  bool begin() { return EVP_DigestInit_ex2(context_.get(), algorithm_.get(), nullptr) == 1; }
+  const EVP_MD* md5() const { return md5_.get(); }
+
+ private:
+  std::unique_ptr<OSSL_LIB_CTX, ReleaseWith<&OSSL_LIB_CTX_free>> library_;
+  std::unique_ptr<EVP_MD, ReleaseWith<&EVP_MD_free>> md5_;
+};
+
+const Algorithm& algorithm() {
+  static const Algorithm shared;
+  return shared;
+}
+
+// MD5 with all that can be kept from file to file; a thread's own.
+class Md5 {
+ public:
+  // Throws std::bad_alloc when OpenSSL gives none.
+  Md5() : context_(EVP_MD_CTX_new()) {
+    if (context_ == nullptr) {
+      throw std::bad_alloc();
+    }
+  }
+
+  bool begin() { return EVP_DigestInit_ex2(context_.get(), algorithm().md5(), nullptr) == 1; }
   bool add(const void* bytes, std::size_t size) {
     return EVP_DigestUpdate(context_.get(), bytes, size) == 1;
   }
@@ -65,8 +84,6 @@ class Md5 {
   }
 
  private:
-  std::unique_ptr<OSSL_LIB_CTX, ReleaseWith<&OSSL_LIB_CTX_free>> library_;
-  std::unique_ptr<EVP_MD, ReleaseWith<&EVP_MD_free>> algorithm_;
   std::unique_ptr<EVP_MD_CTX, ReleaseWith<&EVP_MD_CTX_free>> context_;
 };
 
@@ -199,10 +216,14 @@ unsigned long long hole_length(int fd, unsigned long long offset, unsigned long 
   return end > offset ? (end - offset) / kBlock * kBlock : 0;
 }
 
+// Written only while no digest is computed.
+std::optional<Clock::time_point> g_deadline;
+void (*g_step)(unsigned long long bytes) = nullptr;
+
 // Reads exactly `size` bytes, so that a file that grows for ever comes to an end as well. Only a
 // block of zeros raises the question how far a hole goes: a dense file is never asked.
 Outcome add_content(ContentDigest& digest, int fd, unsigned long long size) {
-  static const auto block = std::make_unique_for_overwrite<std::byte[]>(kBlock);
+  thread_local const auto block = std::make_unique_for_overwrite<std::byte[]>(kBlock);
   for (unsigned long long offset = 0; offset < size;) {
     if (VornQazDigestDeadlinePassed() != 0) {
       errno = ETIME;
@@ -220,12 +241,15 @@ Outcome add_content(ContentDigest& digest, int fd, unsigned long long size) {
       return failed();
     }
     offset += taken;
+    if (g_step != nullptr) {
+      g_step(length);
+    }
   }
   return kDigested;
 }
 
 Outcome digest_file(const char* path, unsigned long long size, char* digits) {
-  static ContentDigest digest;
+  thread_local ContentDigest digest;
   const Fd fd = open_to_read(path);
   if (!fd) {
     return means_changed(errno) ? kFileChanged : kFailed;
@@ -255,8 +279,6 @@ Outcome digest_file(const char* path, unsigned long long size, char* digits) {
   return digest.write_hex(digits) ? kDigested : failed();
 }
 
-std::optional<Clock::time_point> g_deadline;
-
 }  // namespace
 }  // namespace host
 
@@ -270,6 +292,10 @@ void VornQazSetDigestDeadline(unsigned long long seconds) {
 
 int VornQazDigestDeadlinePassed(void) {
   return host::g_deadline && host::Clock::now() >= *host::g_deadline ? 1 : 0;
+}
+
+void VornQazSetDigestStep(void (*step)(unsigned long long bytes)) {
+  host::g_step = step;
 }
 
 int VornQazGetFileMd5(const char* path, unsigned long long size, char* digest,

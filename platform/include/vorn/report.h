@@ -149,14 +149,20 @@ int VornQazGetTimeSecond(char* out, size_t size);
 // 0; 2 when the file vanished, may not be read, is no regular file any more, has another size or
 // changes while it is read, an expected outcome on a server in use, with errno EWOULDBLOCK when a
 // client has it leased for the moment; also 2 when the deadline passes before the end; -1 for any
-// other failure.
+// other failure. Several threads may compute digests at once.
 int VornQazGetFileMd5(const char* path, unsigned long long size, char* digest, size_t digest_size);
 
 // Digests end `seconds` from now, whatever happens to the clock: a computation that goes on then is
-// broken off, and no other begins. 0: there is no such deadline any more, as at the start.
+// broken off, and no other begins. 0: there is no such deadline any more, as at the start. Not to
+// be called while a digest is computed.
 void VornQazSetDigestDeadline(unsigned long long seconds);
-// Non-zero once the deadline has passed.
+// Non-zero once the deadline has passed. For any thread.
 int VornQazDigestDeadlinePassed(void);
+
+// From now on every thread that computes a digest calls `step` after each part of at most a MiB,
+// with the bytes that it has read of the file since the last time. It may wait there. Null: no
+// longer, as at the start. Not to be called while a digest is computed.
+void VornQazSetDigestStep(void (*step)(unsigned long long bytes));
 
 // Finishes a CSV file: puts a UTF-8 byte order mark before it unless it has one. Atomic; harmless
 // when repeated. 0 or -1.
