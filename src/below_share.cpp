@@ -95,7 +95,7 @@ Descriptor open_below(int top, const char* below) {
 }  // namespace
 
 Descriptor open_below_share(const char* share_folder, const char* path) {
-  static TopFolder top;
+  thread_local TopFolder top;
   const char* below = share_folder != nullptr ? part_below(share_folder, path) : nullptr;
   if (below == nullptr) {
     errno = share_folder == nullptr ? ENOENT : EXDEV;

@@ -4,7 +4,6 @@
 #include <atomic>
 #include <cerrno>
 #include <condition_variable>
-#include <csignal>
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
@@ -16,6 +15,7 @@
 #include <utility>
 #include <vector>
 
+#include "signals_blocked.hpp"
 #include "vorn/report.h"
 #include "vornreport/handles.hpp"
 #include "vornreport/statistics_db.hpp"
@@ -191,22 +191,6 @@ int stop_when_dropped(void* context) noexcept {
 SqliteText error_text(int result) {
   return SqliteText(sqlite3_mprintf("%s", sqlite3_errstr(result)));
 }
-
-// Threads begun in its life leave all signals to the others: a handler may count on its thread.
-class SignalsBlocked {
- public:
-  SignalsBlocked() {
-    sigset_t all;
-    sigfillset(&all);
-    pthread_sigmask(SIG_SETMASK, &all, &before_);
-  }
-  ~SignalsBlocked() { pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
-  SignalsBlocked(const SignalsBlocked&) = delete;
-  SignalsBlocked& operator=(const SignalsBlocked&) = delete;
-
- private:
-  sigset_t before_{};
-};
 
 }  // namespace
 

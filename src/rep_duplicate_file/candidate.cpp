@@ -34,14 +34,40 @@ std::string_view cut(const char* text) {
   return std::string_view(text).substr(0, kLongestText);
 }
 
+// What is left alone by threads that look ahead, and by who does so itself.
+class ErrnoKept {
+ public:
+  ErrnoKept() = default;
+  ~ErrnoKept() { errno = before_; }
+  ErrnoKept(const ErrnoKept&) = delete;
+  ErrnoKept& operator=(const ErrnoKept&) = delete;
+
+ private:
+  const int before_ = errno;
+};
+
+uint64_t sample_length(const dup_file_node& file) {
+  return std::min(file.size, kSampleSize);
+}
+uint64_t sample_offset(const dup_file_node& file) {
+  return file.size <= kSampleSize ? 0 : file.size / 2 / kSampleSize * kSampleSize;
+}
+
 // There are few shares and many files.
 const char* interned(const char* text) {
   static std::unordered_set<std::string> texts;
   return texts.emplace(cut(text)).first->c_str();
 }
 
-void log_open_failure(const dup_file_node& file) {
-  if (errno == ENOENT) {
+// Lines for a sample that couldn't be read.
+void tell_sample(const dup_file_node& file) {
+  errno = file.failure.error;
+  if (file.sample_state == SampleState::kNotMapped) {
+    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__,
+                          "map file failed, file=%s, nSeg=%llu, offset=%llu", file.path.c_str(),
+                          static_cast<unsigned long long>(sample_length(file)),
+                          static_cast<unsigned long long>(sample_offset(file)));
+  } else if (errno == ENOENT) {
     report_trace(kDuplicateModule, __LINE__, "open file failed, file=%s,(%d)%m\n",
                  file.path.c_str(), errno);
   } else {
@@ -69,63 +95,36 @@ bool is_regular_file(const Descriptor& handle, struct stat& status) {
 Descriptor open_content(const Descriptor& handle) {
   constexpr int kFlags = O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
   const std::string path = path_of(handle);
-  const int before = errno;
   Descriptor opened(open(path.c_str(), kFlags | O_NOATIME));
   if (!opened && errno == EPERM) {
-    errno = before;
     opened = Descriptor(open(path.c_str(), kFlags));
   }
   return opened;
 }
 
-enum class Try { kFirst, kLast };
-enum class Sample { kRead, kNone, kLeased };
+using SampleBytes = std::array<char, kSampleSize>;
 
 // Fills `sample` with the file's bytes and notes in `file` which file that was. Read, not mapped: a
-// file that shrinks meanwhile must not end the process. kNone, reported, leaves zeros; kLeased,
-// silent and at a first try only: somebody holds a lease, who gives it up within a moment.
-Sample read_sample(dup_file_node& file, std::array<char, kSampleSize>& sample, Try which) {
-  const uint64_t length = std::min(file.size, kSampleSize);
-  const uint64_t offset = file.size <= kSampleSize ? 0 : file.size / 2 / kSampleSize * kSampleSize;
+// file that shrinks meanwhile must not end the process. Whatever fails leaves zeros, and errno.
+SampleState read_sample(dup_file_node& file, SampleBytes& sample) {
   sample.fill(0);
-  const int before = errno;
   const Descriptor handle = open_below_share(file.share_folder, file.path.c_str());
   struct stat status {};
   const bool is_regular = handle && is_regular_file(handle, status);
   const Descriptor opened = is_regular ? open_content(handle) : Descriptor();
-  if (is_regular && !opened && errno == EWOULDBLOCK && which == Try::kFirst) {
-    errno = before;
-    return Sample::kLeased;
+  if (is_regular && !opened && errno == EWOULDBLOCK && file.sample_state == SampleState::kUnread) {
+    return SampleState::kLeased;
   }
   if (!handle || S_ISLNK(status.st_mode) || (is_regular && !opened)) {
-    log_open_failure(file);
-    return Sample::kNone;
+    return SampleState::kNotOpened;
   }
-  if (!opened || pread(opened.get(), sample.data(), length, static_cast<off_t>(offset)) < 0) {
-    REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__,
-                          "map file failed, file=%s, nSeg=%llu, offset=%llu", file.path.c_str(),
-                          static_cast<unsigned long long>(length),
-                          static_cast<unsigned long long>(offset));
-    return Sample::kNone;
+  if (!opened || pread(opened.get(), sample.data(), sample_length(file),
+                       static_cast<off_t>(sample_offset(file))) < 0) {
+    return SampleState::kNotMapped;
   }
   file.device = status.st_dev;
   file.inode = status.st_ino;
-  return Sample::kRead;
-}
-
-// False when the file is leased: it wants another try.
-bool take_sample(dup_file_node& file, Try which) {
-  static std::array<char, kSampleSize> bytes;
-  const Sample sample = read_sample(file, bytes, which);
-  if (sample == Sample::kLeased) {
-    return false;
-  }
-  if (sample == Sample::kNone) {
-    file.failure = {kDigestChanged, errno};  // what it may be now isn't for us to read
-  }
-  const XXH128_hash_t digest = XXH3_128bits(bytes.data(), bytes.size());
-  file.sample = {digest.high64, digest.low64};
-  return true;
+  return SampleState::kRead;
 }
 
 // Whether an error says that users moved, replaced or closed something since.
@@ -153,18 +152,21 @@ bool ensure_digest(dup_file_node& file) {
   if (file.digest_done) {
     return true;
   }
-  DigestFailure failure = file.failure;
-  if (failure.result == 0) {
-    failure.result = ask_digest(file);
-    if (failure.result == 0) {
-      file.digest_done = true;
-      return true;
-    }
-    failure.error = errno;
-    // Who holds a lease gives it up: the next pair may have more luck.
-    if (failure.error != EWOULDBLOCK) {
-      file.failure = failure;
-    }
+  if (file.failure.result == 0 && !file.is_ahead) {
+    compute_digest_ahead(file);
+  }
+  const bool is_new = std::exchange(file.is_ahead, false);
+  if (is_new && file.failure.result == 0) {
+    file.digest_done = true;
+    return true;
+  }
+  if (is_new && file.failure.error == 0) {
+    file.failure.error = errno;  // the platform didn't say
+  }
+  const DigestFailure failure = file.failure;
+  // Who holds a lease gives it up: the next pair may have more luck.
+  if (is_new && failure.error == EWOULDBLOCK) {
+    file.failure = {};
   }
   errno = failure.error;
   const auto size = static_cast<unsigned long long>(file.size);
@@ -213,6 +215,28 @@ int add_candidate(QAZLLNode** candidates, char* const* columns, int32_t ordinal,
   return 0;
 }
 
+void read_sample_ahead(dup_file_node& file) {
+  thread_local SampleBytes bytes;
+  const ErrnoKept kept;
+  file.sample_state = read_sample(file, bytes);
+  if (file.sample_state == SampleState::kLeased) {
+    return;
+  }
+  if (file.sample_state != SampleState::kRead) {
+    file.failure = {kDigestChanged, errno};  // what it may be now isn't for us to read
+  }
+  const XXH128_hash_t digest = XXH3_128bits(bytes.data(), bytes.size());
+  file.sample = {digest.high64, digest.low64};
+}
+
+void compute_digest_ahead(dup_file_node& file) {
+  const ErrnoKept kept;
+  errno = 0;
+  const int result = ask_digest(file);
+  file.failure = {result, result == 0 ? 0 : errno};
+  file.is_ahead = true;
+}
+
 int read_fast_digests(const QAZLLNode* candidates) {
   if (candidates == nullptr || candidates->data == nullptr) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
@@ -221,17 +245,26 @@ int read_fast_digests(const QAZLLNode* candidates) {
   if (file_of(candidates)->size == 0) {
     return 0;
   }
+  const auto settle = [](dup_file_node& file, SampleState open_question) {
+    if (file.sample_state == open_question) {
+      read_sample_ahead(file);
+    }
+    if (file.sample_state > SampleState::kRead) {
+      tell_sample(file);
+    }
+  };
   std::vector<dup_file_node*> leased;
   for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
     if (past_compare_limit(file_of(node)->size)) {
       return 0;
     }
-    if (!take_sample(*file_of(node), Try::kFirst)) {
+    settle(*file_of(node), SampleState::kUnread);
+    if (file_of(node)->sample_state == SampleState::kLeased) {
       leased.push_back(file_of(node));
     }
   }
   for (dup_file_node* file : leased) {
-    take_sample(*file, Try::kLast);
+    settle(*file, SampleState::kLeased);
   }
   return 0;
 }

@@ -16,6 +16,15 @@ namespace vornreport {
 // as impossible, and would cost one comparison of whole files.
 using SampleDigest = std::pair<uint64_t, uint64_t>;
 
+// What became of a file's sample.
+enum class SampleState : uint8_t {
+  kUnread,
+  kLeased,  // to be tried once more: somebody holds a lease, who gives it up within a moment
+  kRead,
+  kNotOpened,  // for `failure`
+  kNotMapped   // opened, but not read
+};
+
 // Why a file has no digest: VornQazGetFileMd5's result and errno. Result 0: it hasn't failed.
 struct DigestFailure {
   int32_t result;
@@ -37,7 +46,9 @@ struct dup_file_node {
   ino_t inode;               // must be of as well
   std::array<char, 32> md5;  // hexadecimal digits, once `digest_done`
   DigestFailure failure;     // of the sample or the digest; it isn't asked for again
-  bool digest_done;
+  SampleState sample_state;
+  bool is_ahead;     // md5 or failure are there, but nobody has asked for them
+  bool digest_done;  // and asked for
   bool grouped;
 };
 
@@ -54,10 +65,18 @@ inline constexpr uint64_t kSampleSize = 4096;
 int add_candidate(QAZLLNode** candidates, char* const* columns, int32_t ordinal,
                   const char* share_folder);
 
-// Reads the sample of every candidate: the whole file up to 4096 bytes, else 4096 bytes from its
-// middle. A file that can't be read (logged) keeps a sample of zeros and gets no digest. Only
-// regular files below their share's folder are opened, and none through a link. Ends when the
-// comparison's time does. 0; -1 for an empty list.
+// Two steps that need nothing but the file, so that threads may take them ahead, for different
+// files at once. What failed is noted silently; who needs the result tells. errno is left alone.
+//
+// Tries to read a sample: the whole file up to 4096 bytes, else 4096 bytes from its middle. Only a
+// regular file below its share's folder is opened, and not through a link.
+void read_sample_ahead(dup_file_node& file);
+// Computes the digest of a file whose sample was read.
+void compute_digest_ahead(dup_file_node& file);
+
+// Sees to the sample of every candidate, read ahead or not. A file that can't be read (logged)
+// keeps a sample of zeros and gets no digest. Ends when the comparison's time does. 0; -1 for an
+// empty list.
 int read_fast_digests(const QAZLLNode* candidates);
 
 // Compares two files of one size by their digests, each of which is computed once, of the file that

@@ -3,17 +3,19 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <deque>
 #include <map>
-#include <numeric>
+#include <optional>
 #include <string>
-#include <tuple>
 #include <utility>
 #include <vector>
 
+#include "bucket.hpp"
 #include "compare_limit.hpp"
 #include "facts/duplicate_tally.hpp"
 #include "facts/run_facts.hpp"
 #include "module.hpp"
+#include "readers.hpp"
 #include "report_frame.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
@@ -27,8 +29,6 @@ namespace {
 // Numbers that go on through the process.
 int32_t g_data_group = 1;  // of the next group for the page
 int32_t g_csv_group = 1;   // of the next group for the CSV file
-uint64_t g_digested = 0;   // files for which a digest was about to be computed
-uint64_t g_grouped = 0;    // files placed into groups
 
 // What the report that is being made has found.
 DuplicateTally g_tally(/*by_content=*/true);
@@ -48,134 +48,104 @@ void count_groups(const QAZLLNode* groups) {
 
 // Users may move, replace or hold a file meanwhile, which is nothing to tell. What can't be read
 // for another reason may have had a copy that the report lacks.
-void count_unread(const QAZLLNode* candidates) {
+void count_unread(const Bucket& bucket) {
   constexpr std::array kOfUsers{0, ENOENT, ENOTDIR, ELOOP, EXDEV, ESTALE, ENXIO, EWOULDBLOCK};
-  for (; candidates != nullptr; candidates = candidates->next) {
-    const dup_file_node& file = *file_of(candidates);
-    if (file.failure.result != 0 &&
-        std::find(kOfUsers.begin(), kOfUsers.end(), file.failure.error) == kOfUsers.end()) {
-      ++g_unread[file.share];
+  for (const dup_file_node* file : bucket.files()) {
+    if (file->failure.result != 0 &&
+        std::find(kOfUsers.begin(), kOfUsers.end(), file->failure.error) == kOfUsers.end()) {
+      ++g_unread[file->share];
     }
   }
 }
 
-// The candidates of a bucket, and for each the later ones with an equal sample, found by look-up:
-// comparing every pair's samples would be a million millions for a million files.
-class Bucket {
+// Buckets are kept until there are enough of them to be read ahead together: most are small.
+constexpr size_t kEnoughFiles = 4096;
+constexpr uint64_t kEnoughWork = uint64_t{64} << 20U;  // bytes
+constexpr uint64_t kWorthThreads = uint64_t{1} << 20U;
+
+std::optional<Readers> g_readers;  // while a report is made
+
+class WaitingBuckets {
  public:
-  explicit Bucket(const QAZLLNode* candidates) {
-    for (const QAZLLNode* node = candidates; node != nullptr; node = node->next) {
-      files_.push_back(file_of(node));
-    }
-    sorted_.resize(files_.size());
-    std::iota(sorted_.begin(), sorted_.end(), uint32_t{0});
-    place_.resize(files_.size());
-    sort([](const dup_file_node& a, const dup_file_node& b) { return a.sample < b.sample; });
+  void add(QAZLLNode* candidates) {
+    const Bucket& bucket = buckets_.emplace_back(candidates);
+    const uint64_t count = bucket.files().size();
+    const uint64_t cost = std::min(bucket.file_size(), kEnoughWork) + Readers::kFileCost;
+    files_ += count;
+    work_ += bucket.file_size() == 0 ? 0 : count * cost;
   }
 
-  // Appends every group to `groups`, in the order of their first members.
-  void find_groups(QAZLLNode** groups) {
-    for (uint32_t first = 0; first < files_.size(); ++first) {
-      if (files_[first]->grouped) {
-        continue;
+  bool are_enough() const { return files_ >= kEnoughFiles || work_ >= kEnoughWork; }
+
+  void clear() {
+    buckets_.clear();
+    files_ = 0;
+    work_ = 0;
+  }
+
+  // One by one in their order. 0, or -1 (logged) when one's samples could not be read.
+  int handle(const VLIBCSzHash* profile_hash, QAZLLNode** groups) {
+    int result = 0;
+    if (!buckets_.empty() && !past_compare_limit(buckets_.front().file_size())) {
+      if (g_readers && work_ >= kWorthThreads) {
+        read_ahead(*g_readers);
       }
-      dup_file_node* chain = nullptr;
-      if (!is_cut_short_) {
-        gather_matches(first, chain);
-      }
-      if (is_cut_short_) {
-        gather_digested(first, chain);
-      }
-      if (chain != nullptr && QAZLLadd(groups, chain, nullptr) < 0) {
-        REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "add node failed");
+      for (; !buckets_.empty(); buckets_.pop_front()) {
+        result = std::min(result, handle(profile_hash, groups, buckets_.front()));
       }
     }
+    clear();
+    return result;
   }
 
  private:
-  // Sorts the places of all files; those of equal ones keep the list's order.
-  template <typename Less>
-  void sort(Less less) {
-    std::stable_sort(sorted_.begin(), sorted_.end(),
-                     [&](uint32_t a, uint32_t b) { return less(*files_[a], *files_[b]); });
-    for (uint32_t place = 0; place < sorted_.size(); ++place) {
-      place_[sorted_[place]] = place;
-    }
-  }
-
-  // Puts the file and all later ones that match it before `chain`, the last match first.
-  void gather_matches(uint32_t first, dup_file_node*& chain) {
-    dup_file_node& a = *files_[first];
-    for (size_t place = place_[first] + size_t{1}; place < sorted_.size(); ++place) {
-      dup_file_node& b = *files_[sorted_[place]];
-      if (b.sample != a.sample) {
-        break;
-      }
-      if (b.grouped) {
-        continue;
-      }
-      if (past_compare_limit(a.size)) {
-        cut_short();
-        break;
-      }
-      g_digested += (a.digest_done ? 0U : 1U) + (b.digest_done ? 0U : 1U);
-      const int result = compare_files(a, b);
-      if (result < 0 && past_compare_limit(a.size)) {
-        cut_short();  // in the middle of a digest
-        break;
-      }
-      if (result != 0) {
-        report_trace(kDuplicateModule, __LINE__, "##### match(%llu/%llu), not match file=(%s,%s)\n",
-                     static_cast<unsigned long long>(g_grouped),
-                     static_cast<unsigned long long>(g_digested), a.path.c_str(), b.path.c_str());
-        continue;
-      }
-      join(a, b, chain);
-    }
-  }
-
-  // No pair is walked from now on: of those that have their digests, equal ones stand together.
-  void cut_short() {
-    is_cut_short_ = true;
-    sort([](const dup_file_node& a, const dup_file_node& b) {
-      return std::tie(a.sample, a.digest_done, a.md5) < std::tie(b.sample, b.digest_done, b.md5);
-    });
-  }
-
-  // As gather_matches(), of what is known already.
-  void gather_digested(uint32_t first, dup_file_node*& chain) {
-    dup_file_node& a = *files_[first];
-    for (size_t place = place_[first] + size_t{1}; a.digest_done && place < sorted_.size();
-         ++place) {
-      dup_file_node& b = *files_[sorted_[place]];
-      if (b.sample != a.sample || !b.digest_done || b.md5 != a.md5) {
-        break;
-      }
-      if (!b.grouped) {
-        join(a, b, chain);
+  void read_ahead(Readers& readers) {
+    std::vector<dup_file_node*> files;
+    const auto before_deadline = [&](void (*step)(dup_file_node&)) {
+      return [&files, step](size_t i) {
+        if (VornQazDigestDeadlinePassed() == 0) {
+          step(*files[i]);
+        }
+      };
+    };
+    for (const Bucket& bucket : buckets_) {
+      if (bucket.file_size() != 0) {
+        files.insert(files.end(), bucket.files().begin(), bucket.files().end());
       }
     }
-  }
-
-  static void join(dup_file_node& a, dup_file_node& b, dup_file_node*& chain) {
-    if (!a.grouped) {
-      prepend(a, chain);
+    readers.for_each(Readers::Kind::kSamples, files.size(), before_deadline(&read_sample_ahead));
+    files.clear();
+    for (Bucket& bucket : buckets_) {
+      if (bucket.file_size() != 0) {
+        bucket.add_compared(files);
+      }
     }
-    prepend(b, chain);
+    readers.for_each(Readers::Kind::kDigests, files.size(), before_deadline(&compute_digest_ahead));
   }
 
-  static void prepend(dup_file_node& file, dup_file_node*& chain) {
-    ++g_grouped;
-    file.grouped = true;
-    file.next = chain;
-    chain = &file;
+  static int handle(const VLIBCSzHash* profile_hash, QAZLLNode** groups, Bucket& bucket) {
+    int result = 0;
+    if (bucket.read_samples() < 0) {
+      REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "fast digest list failed");
+      result = -1;
+    } else {
+      bucket.find_groups(groups);
+      if (*groups != nullptr) {
+        count_groups(*groups);
+        write_data_groups(*groups, kMostDataGroups, GroupsAre::kContinued);
+        write_csv_groups(profile_hash, *groups, GroupsAre::kContinued);
+      }
+    }
+    count_unread(bucket);
+    bucket.release(groups);
+    return result;
   }
 
-  std::vector<dup_file_node*> files_;  // in list order
-  std::vector<uint32_t> sorted_;       // indices of files_, by sample; cut short, by digest, too
-  std::vector<uint32_t> place_;        // of each file in sorted_
-  bool is_cut_short_ = false;
+  std::deque<Bucket> buckets_;
+  size_t files_ = 0;
+  uint64_t work_ = 0;  // bytes, at most, to be read of them
 };
+WaitingBuckets g_waiting;
 
 void write_data_member(FILE* data, const dup_file_node& file, bool is_first) {
   static std::array<char, 4096> path;
@@ -207,15 +177,17 @@ void write_csv_member(FILE* csv, const dup_file_node& file) {
 
 }  // namespace
 
-void begin_content_groups(const VLIBCSzHash* profile_hash) {
+void begin_content_groups(const VLIBCSzHash* profile_hash, unsigned threads) {
+  abandon_content_groups();
   begin_compare_limit(profile_hash);
+  g_readers.emplace(threads);
   g_tally = DuplicateTally(/*by_content=*/true);
   g_rows = {};
   g_unread.clear();
 }
 
 void end_content_groups() {
-  end_compare_limit();
+  abandon_content_groups();
   run_facts().duplicates = g_tally.facts();
   run_facts().rows[report_format::kDuplicateFile.name] = g_rows;
   for (const auto& [share, count] : g_unread) {
@@ -228,29 +200,25 @@ void end_content_groups() {
   }
 }
 
-int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups,
-                       QAZLLNode** candidates) {
+void abandon_content_groups() {
+  g_waiting.clear();
+  g_readers.reset();
+  end_compare_limit();
+}
+
+int handle_size_bucket(const VLIBCSzHash* profile_hash, QAZLLNode** groups, QAZLLNode** candidates,
+                       GroupsAre groups_are) {
   if (profile_hash == nullptr || groups == nullptr || candidates == nullptr) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "bad parameter");
     return -1;
   }
-  int result = 0;
-  if (*candidates != nullptr && !past_compare_limit(file_of(*candidates)->size)) {
-    if (read_fast_digests(*candidates) < 0) {
-      REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "fast digest list failed");
-      result = -1;
-    } else {
-      Bucket(*candidates).find_groups(groups);
-      if (*groups != nullptr) {
-        count_groups(*groups);
-        write_data_groups(*groups, kMostDataGroups, GroupsAre::kContinued);
-        write_csv_groups(profile_hash, *groups, GroupsAre::kContinued);
-      }
-    }
+  if (*candidates != nullptr) {
+    g_waiting.add(std::exchange(*candidates, nullptr));
   }
-  count_unread(*candidates);
-  release_bucket(groups, candidates);
-  return result;
+  if (groups_are == GroupsAre::kContinued && g_readers && !g_waiting.are_enough()) {
+    return 0;
+  }
+  return g_waiting.handle(profile_hash, groups);
 }
 
 int write_data_groups(const QAZLLNode* groups, int limit, GroupsAre close) {

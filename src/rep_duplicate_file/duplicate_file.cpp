@@ -68,8 +68,8 @@ void decide_match(const VLIBCSzHash* profile_hash) {
 void collect_row(const report_row_ctx& ctx, char* const* values) {
   const std::string_view size = cut(text_of(values, kSize), kLongestSize);
   if (size != g_grouping.size) {
-    if (!g_grouping.size.empty() &&
-        handle_size_bucket(ctx.profile_hash, ctx.dup_group_list, ctx.dup_list) < 0) {
+    if (!g_grouping.size.empty() && handle_size_bucket(ctx.profile_hash, ctx.dup_group_list,
+                                                       ctx.dup_list, GroupsAre::kContinued) < 0) {
       REPORT_LOG_ERR(kDuplicateModule, __LINE__, "handle candidate error\n");
     }
     g_grouping.number = 0;
@@ -211,6 +211,7 @@ int32_t report_by_content(ReportArgs& args) {
   args.embedded = 1;  // header, closing tag and CSV finishing belong to the group writers
   if (duplicate_file2_db(&args) < 0) {
     REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "duplicate_file_db failed");
+    abandon_content_groups();
     return -1;
   }
   if (handle_size_bucket(args.profile_hash, args.dup_group_list, args.dup_list) < 0) {

@@ -232,6 +232,60 @@ TEST_F(ReportsTest, OnlyTheSharesOwnFilesAreRead) {
   }
 }
 
+// Equal files and different ones, and what fails in each way, in buckets that are read ahead
+// together or one by one.
+TEST_F(ReportsTest, ThreadsChangeNoLine) {
+  const std::string share = folder_.path();
+  const uintmax_t sizes[] = {3 << 20U, 70000, 5};
+  std::mt19937 random(3);
+  for (const uintmax_t size : sizes) {
+    for (int i = 0; i < 40; ++i) {
+      const std::string path = folder_.path(std::to_string(size) + "/" + std::to_string(i));
+      const auto kind = random() % 20;
+      support::write_file(path, "");
+      std::filesystem::resize_file(path, size);
+      if (kind < 3) {  // gone, a link, a pipe
+        unlink(path.c_str());
+        EXPECT_EQ(kind == 1   ? symlink("nothing", path.c_str())
+                  : kind == 2 ? mkfifo(path.c_str(), 0600)
+                              : 0,
+                  0);
+      }
+      platform.digests[path] =
+          i == 7 && size == 5 ? "-1" : std::array{"same", "other", "third", "2", "w"}[random() % 5];
+    }
+  }
+  std::vector<std::string> found;
+  for (const unsigned threads : {0U, 1U, 4U}) {
+    found.push_back(in_child([&] {
+      if (threads != 0) {
+        begin_content_groups(profile_.get(), threads);
+      }
+      QAZLLNode* candidates = nullptr;
+      QAZLLNode* groups = nullptr;
+      const std::string output = printed([&] {
+        for (const uintmax_t size : sizes) {
+          for (int i = 0; i < 40; ++i) {
+            const std::string text = std::to_string(size);
+            add(&candidates, share + "/" + text + "/" + std::to_string(i), text, share.c_str());
+          }
+          errno = 0;
+          handle_size_bucket(profile_.get(), &groups, &candidates,
+                             size == 5 ? GroupsAre::kComplete : GroupsAre::kContinued);
+        }
+      });
+      return output + csv("duplicate_file");
+    }));
+    unlink(folder_.path("duplicate_file.csv").c_str());
+    support::syslog_lines();  // so that there is room for the next ones
+    EXPECT_EQ(found.back(), found.front()) << threads;
+  }
+  for (const char* part :
+       {"open file failed", "map file failed", "count md5 failed", "not match"}) {
+    EXPECT_NE(found.front().find(part), std::string::npos) << part;
+  }
+}
+
 // It ends before a digest or in the middle of one; what is known by then is grouped.
 TEST_F(ReportsTest, TheComparisonEndsWithItsTime) {
   std::vector<std::string> paths;
