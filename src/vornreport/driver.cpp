@@ -31,9 +31,9 @@ int run(int argc, char** argv) {
   // Once: only the first option counts, the rest stays among the arguments.
   getopt_long_only(argc, argv, "", kOptions, nullptr);
   argv += optind;
+  end_without_memory(nullptr, nullptr);
   VornQazSetEnv();
   listen_for_incidents();
-  end_without_memory(nullptr, nullptr);
   switch (gACT) {
     case kReport:
       setup_signal(SIGTERM);

@@ -44,10 +44,10 @@ std::unique_ptr<char[]> g_reserve;
 void end_without_memory(const char* profile, const VLIBCSzHash* profile_hash) {
   g_profile = profile;
   g_profile_hash = profile_hash;
+  std::set_new_handler(end_run);  // first: the reserve may be what there is no room for
   if (!g_reserve) {
     g_reserve = std::make_unique<char[]>(kReserve);
   }
-  std::set_new_handler(end_run);
 }
 
 }  // namespace vornreport
