@@ -33,6 +33,8 @@ namespace {
 
 using report_format::RunStatus;
 
+// False, reported, when it can't be stored. There is none then: the word of an earlier run must not
+// stand for this one.
 bool store_status(const std::string& profile, const RunStatus& status) {
   const int saved_errno = errno;
   const std::string path = VORN_PATH_STATUS "/" + profile;
@@ -45,6 +47,8 @@ bool store_status(const std::string& profile, const RunStatus& status) {
   }
   log_line(R"(status "%s" of profile "%s" can't be stored in %s (%s))", status.word.c_str(),
            profile.c_str(), path.c_str(), std::strerror(errno));
+  const ErrnoKeeper keeper;
+  unlink(path.c_str());
   return false;
 }
 
@@ -57,15 +61,6 @@ void take_back(const ReportRun& run) {
   if (!remove_tree(run.unfinished)) {
     log_line("unfinished report %s can't be removed (%s); remove it by hand",
              run.unfinished.c_str(), std::strerror(errno));
-  }
-}
-
-// A run that couldn't take its profile comes to nothing, and the word of the one before must not
-// stand for it.
-void tell_unlocked(const std::string& profile) {
-  const ErrnoKeeper keeper;
-  if (!store_status(profile, {.word = report_format::kFail})) {
-    unlink((VORN_PATH_STATUS "/" + profile).c_str());
   }
 }
 
@@ -189,7 +184,8 @@ int VornQazProfileRunning(const char* profile) {
   try {
     const host::TakeResult taken = host::take_profile(profile);
     if (taken == host::TakeResult::failed) {
-      host::tell_unlocked(profile);
+      const host::ErrnoKeeper keeper;
+      host::store_status(profile, {.word = report_format::kFail});  // it comes to nothing
     }
     return taken == host::TakeResult::busy ? 1 : 0;
   } catch (const std::exception&) {
