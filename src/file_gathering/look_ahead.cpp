@@ -21,8 +21,6 @@ namespace {
 using Clock = std::chrono::steady_clock;
 
 constexpr std::chrono::milliseconds kStretch{100};  // of the search for the number of threads
-// Without a single look of any thread the file system has hung.
-constexpr std::chrono::seconds kSilence{120};
 constexpr size_t kSmallBatch = 64;
 
 }  // namespace
@@ -31,7 +29,8 @@ constexpr size_t kSmallBatch = 64;
 // side touches: a folder's system calls are those of the thread that has taken it.
 class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
  public:
-  explicit Shared(unsigned threads) : fixed_count_(threads) {}
+  Shared(unsigned threads, std::chrono::milliseconds silence)
+      : fixed_count_(threads), silence_(silence) {}
   Shared(const Shared&) = delete;
   Shared& operator=(const Shared&) = delete;
   ~Shared() {
@@ -122,7 +121,7 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
     is_stopping_ = true;
     work_.notify_all();
     rest_.notify_all();
-    return ended_.wait_for(lock, is_silent_ ? std::chrono::seconds(0) : kSilence,
+    return ended_.wait_for(lock, is_silent_ ? std::chrono::milliseconds(0) : silence_,
                            [this] { return alive_ == 0; });
   }
 
@@ -241,7 +240,7 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
       }
       work_.notify_one();
       const uint64_t looks = all_looks_;
-      if (ready_.wait_for(lock, kSilence) == std::cv_status::timeout && looks == all_looks_ &&
+      if (ready_.wait_for(lock, silence_) == std::cv_status::timeout && looks == all_looks_ &&
           !has_news(folder)) {
         is_silent_ = true;
       }
@@ -391,13 +390,15 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
   std::vector<std::unique_ptr<Batch>> abandoned_;
 
   const unsigned fixed_count_;
+  const std::chrono::milliseconds silence_;
   ThreadCount count_;
   unsigned started_ = 0, alive_ = 0;
   uint64_t all_looks_ = 0, stretch_looks_ = 0;
   Clock::time_point stretch_begin_ = Clock::now();
 };
 
-LookAhead::LookAhead(unsigned threads) : shared_(std::make_shared<Shared>(threads)) {}
+LookAhead::LookAhead(unsigned threads, std::chrono::milliseconds silence)
+    : shared_(std::make_shared<Shared>(threads, silence)) {}
 
 LookAhead::~LookAhead() {
   shared_->stop();

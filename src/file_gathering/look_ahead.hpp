@@ -19,6 +19,7 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 
+#include <chrono>
 #include <cstdint>
 #include <deque>
 #include <memory>
@@ -91,7 +92,8 @@ class LookAhead {
   static constexpr size_t kLongestPath = 4095;
 
   // `threads`: 0 for as many as give speed (thread_count.hpp), or a fixed number.
-  explicit LookAhead(unsigned threads = 0);
+  // `silence`: without a single look of any thread for so long, the file system has hung.
+  LookAhead(unsigned threads, std::chrono::milliseconds silence);
   // Ends the threads. One that hangs in a file system is left behind.
   ~LookAhead();
   LookAhead(const LookAhead&) = delete;

@@ -42,8 +42,9 @@ bool is_walked_kind(int kind) {
 // 2048 folders deep, and a buffer a level would be 8 MiB of stack).
 class Walk {
  public:
-  Walk(sqlite3* db, const char* share, const VLIBCSzHash* types, unsigned threads)
-      : db_(db), share_(share), types_(types), ahead_(threads) {}
+  Walk(sqlite3* db, const char* share, const VLIBCSzHash* types, unsigned threads,
+       std::chrono::milliseconds silence)
+      : db_(db), share_(share), types_(types), ahead_(threads, silence) {}
 
   int top(const char* folder) {
     path_.format("%s", folder);
@@ -297,7 +298,8 @@ class Walk {
 }  // namespace
 
 int ReportShareWalk(sqlite3* db, const char* szShareName, const char* szFolderPath,
-                    const VLIBCSzHash* pshFileType, unsigned threads) {
+                    const VLIBCSzHash* pshFileType, unsigned threads,
+                    std::chrono::milliseconds silence) {
   const char* missing = nullptr;
   if (db == nullptr) {
     missing = "((void *)0) != db";
@@ -312,7 +314,7 @@ int ReportShareWalk(sqlite3* db, const char* szShareName, const char* szFolderPa
     report_invalid_argument(kGatheringModule, __LINE__, missing);
     return -1;
   }
-  return Walk(db, szShareName, pshFileType, threads).top(szFolderPath);
+  return Walk(db, szShareName, pshFileType, threads, silence).top(szFolderPath);
 }
 
 }  // namespace vornreport

@@ -1,19 +1,37 @@
 // Walks with threads: what they find, in which order, and how many there are.
 #include <dirent.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <cmath>
+#include <cstring>
 #include <filesystem>
 #include <functional>
+#include <latch>
 #include <random>
 
 #include "file_gathering/share_walk.hpp"
 #include "fixture.hpp"
 #include "thread_count.hpp"
 #include "vornreport/statistics_db.hpp"
+
+namespace {
+
+std::latch* g_answer = nullptr;  // what looks at files named "hangs" wait for
+
+}  // namespace
+
+// In place of the system's: there is no file system here that could be made to hang.
+extern "C" int fstatat(int folder, const char* name, struct stat* status, int flags) noexcept {
+  if (g_answer != nullptr && std::strcmp(name, "hangs") == 0) {
+    g_answer->wait();
+  }
+  return static_cast<int>(syscall(SYS_newfstatat, folder, name, status, flags));
+}
 
 namespace vornreport {
 namespace {
@@ -31,11 +49,13 @@ class LookAheadTest : public UnitTest {
   }
 
   // Everything that a walk leaves: its rows in their order, and what it printed.
-  std::string walked(const std::string& top, unsigned threads) {
+  std::string walked(const std::string& top, unsigned threads,
+                     std::chrono::milliseconds silence = std::chrono::minutes(2)) {
     std::string text;
     sqlite3_exec(db_.get(), "begin", nullptr, nullptr, nullptr);
     std::string output = printed([&] {
-      EXPECT_EQ(ReportShareWalk(db_.get(), "share", top.c_str(), types_.get(), threads), 0);
+      EXPECT_EQ(ReportShareWalk(db_.get(), "share", top.c_str(), types_.get(), threads, silence),
+                0);
     });
     const auto add = [](void* out, int, char** values, char**) {
       *static_cast<std::string*>(out) += std::string(values[0]) + "\n";
@@ -120,6 +140,21 @@ TEST_F(LookAheadTest, TellsWhatItCannotReadInItsPlace) {
     EXPECT_NE(one.find(line), std::string::npos) << line;
   }
   EXPECT_EQ(std::count(one.begin(), one.begin() + static_cast<long>(one.find('(')), '\n'), 60);
+}
+
+TEST_F(LookAheadTest, GoesOnWithoutAThreadThatHangs) {
+  const std::string top = folder_.path("top");
+  write_file(top + "/a", "");
+  write_file(top + "/b/hangs", "");
+  static std::latch answer(1);  // the thread outlives this
+  g_answer = &answer;
+  const std::string found = walked(top, 4, std::chrono::milliseconds(300));
+  g_answer = nullptr;
+  answer.count_down();  // what comes now has nobody to take it
+  for (const std::string& part : {top + "/a\n", std::string("(Connection timed out)"),
+                                  "Failed to opendir [" + top + "/b]."}) {
+    EXPECT_NE(found.find(part), std::string::npos) << found;
+  }
 }
 
 // --- The number of threads ----------------------------------------------------------------------
