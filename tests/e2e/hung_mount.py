@@ -1,3 +1,4 @@
+#!/usr/bin/python3
 """Mounts a file system whose daemon stops answering: hung_mount.py FD FOLDER [ANSWERS]
 
 FD is an open /dev/fuse. The daemon takes every request, but answers only the first ANSWERS look-ups

@@ -105,6 +105,14 @@ class Running(CtlTest):
         doctor = self.ctl('doctor').out
         self.assertIn('share gone is missing', doctor)
 
+    def test_a_mail_that_nobody_got(self):
+        self.m.profile('mailed', report_list='share_list', mail_to='a@b.example',
+                       smtp_url='smtp://127.0.0.1:1')
+        unsent = 'the mail of the last report reached nobody; .*'
+        self.check(['run', 'mailed'], 3, rf'{self.m.reports}/mailed/.*\n', unsent)
+        self.assertIn('\nmail = failed\n', (self.m.vorn / 'var/status/mailed').read_text())
+        self.assertRegex(self.ctl('status', 'mailed').out, unsent)
+
     def test_failure_tells_what_the_log_says(self):
         logs = self.m.base / 'logs'
         logs.mkdir()

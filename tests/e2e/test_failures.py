@@ -25,10 +25,9 @@ class Settings(ProductTest):
                 ('bad line', {}, (config, f'[weekly]\nreport_list = {REPORTS}\nword\n'),
                  [r'vornreport\.conf:3: malformed line', 'section=weekly']),
                 ('no shares', {}, ('etc/share.conf', None), [r'share\.conf can\'t be read']),
+                ('no share of use', {}, ('etc/share.conf', '[007]\npath = /\n'),
+                 [r'share\.conf holds no share that can be used; add one']),
                 ('no script', {}, (script, None), ['create template failed']),
-                ('bad script', {}, (script, '#!/bin/sh\nexit 1\n'), ['create template failed']),
-                ('empty script', {}, (script, '#!/bin/sh\n'),
-                 ['page .* is missing or lacks', 'no link to']),
                 ('no profile', {}, None, ['section=unheard', 'init profile failed']),
                 ('no name', {}, None, [r'"\.\./x" is no profile name', 'init profile failed'])):
             with self.subTest(name):
@@ -48,6 +47,10 @@ class Settings(ProductTest):
                 if profile == 'weekly':
                     self.assertNotEqual(self.m.status('weekly'), 'success')
                 self.assertEqual((self.m.report_folders('weekly'), self.m.leftovers()), ([], []))
+                if name == 'no share of use':
+                    self.m.profile('volumes', report_list='volume_usage')
+                    self.m.run('--report', 'volumes')
+                    self.assertEqual(self.m.status('volumes'), 'success')
 
     def test_a_report_all_the_same(self):
         with self.m.shares.open('a') as file:

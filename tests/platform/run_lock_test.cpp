@@ -3,7 +3,6 @@
 #include <unistd.h>
 
 #include <filesystem>
-#include <vector>
 
 #include "support.hpp"
 #include "vorn/paths.h"
@@ -24,31 +23,6 @@ TEST(Holding, LastsUntilTheHolderDiesOrTakesTheNext) {
   EXPECT_EQ(VornQazProfileRunning("next"), 0);
   EXPECT_TRUE(OtherRun("held").started());
   EXPECT_EQ(support::syslog_text(), "");
-}
-
-TEST(Holding, OnlyOneOfManyStartersWins) {
-  int gate[2];
-  ASSERT_EQ(pipe(gate), 0);
-  std::vector<pid_t> starters(6);
-  for (pid_t& starter : starters) {
-    starter = support::fork_child([&] {
-      close(gate[1]);
-      char byte = 0;
-      if (read(gate[0], &byte, 1) != 0) {  // until the gate opens: all at once
-        return -1;
-      }
-      const bool won = VornQazProfileRunning("race") == 0;
-      usleep(300'000);  // hold it until everyone has asked
-      return won ? 1 : 0;
-    });
-  }
-  close(gate[0]);
-  close(gate[1]);
-  int winners = 0;
-  for (const pid_t starter : starters) {
-    winners += support::wait_child(starter);
-  }
-  EXPECT_EQ(winners, 1);
 }
 
 TEST(Holding, NoChildOfTheHolderHoldsIt) {

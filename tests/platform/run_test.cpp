@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <set>
 
@@ -143,7 +144,13 @@ TEST_F(Run, TakesItsNamesInTmpFromWhoeverPlantedThem) {
   fs::create_symlink(folder.path("victim"), data);
   write_file(body, "planted");
   ASSERT_EQ(chmod(body.c_str(), 0666), 0);
+  fs::remove(temporary("cmd", getpid()));
+  write_file(temporary("cmd", getpid()) + "/of a user", "kept");
   ASSERT_EQ(begin("tmp"), 0);
+  EXPECT_NE(support::syslog_text().find("was a folder in the way"), std::string::npos);
+  EXPECT_EQ(std::count_if(fs::directory_iterator("/tmp"), fs::directory_iterator(),
+                          [](const fs::path& path) { return exists(path / "of a user"); }),
+            1);
   for (const std::string& name : {data, body, temporary("cmd", getpid())}) {
     struct stat status {};
     ASSERT_EQ(lstat(name.c_str(), &status), 0);
@@ -178,6 +185,19 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   fs::create_directory_symlink(folder.path(), own + "/template");
   fs::create_directory_symlink(folder.path(), own + "/.x.partial");
   write_file("/usr/vorn/var/stat/other/stat.db", "");
+  const pid_t dead = support::fork_child([] { return 0; });
+  support::wait_child(dead);
+  const std::string gone[] = {VORN_PATH_STATUS "/.killed.aB3dE6",
+                              "/usr/vorn/etc/.vornreport.conf.aB3dE6", temporary("body", dead)};
+  const std::string kept[] = {VORN_PATH_STATUS "/.other.aB3dE6",
+                              VORN_PATH_STATUS "/.killed.aB3dE67", temporary("body", getppid()),
+                              temporary("mine", dead)};
+  for (const auto& name : gone) {
+    write_file(name, "");
+  }
+  for (const auto& name : kept) {
+    write_file(name, "");
+  }
 
   // While it lives, clearing up takes nothing from it.
   ASSERT_EQ(init("killed", 0), 0);
@@ -191,6 +211,8 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   ASSERT_EQ(begin("killed"), 0);
   EXPECT_FALSE(exists(data) || exists(database) || exists(database + "-journal"));
   EXPECT_TRUE(exists("/usr/vorn/var/stat/other/stat.db"));
+  EXPECT_TRUE(std::none_of(std::begin(gone), std::end(gone), exists));
+  EXPECT_TRUE(std::all_of(std::begin(kept), std::end(kept), exists));
   std::set<std::string> left;
   for (const auto& entry : fs::directory_iterator(own)) {
     left.insert(entry.path());

@@ -241,18 +241,6 @@ TEST_F(ActionsTest, TemplateLinkIsLeftAlone) {
   EXPECT_TRUE(std::filesystem::is_symlink(folder_.path("template")));
 }
 
-TEST_F(ActionsTest, LostDataNeverBecomesAPage) {
-  const pid_t child = support::fork_child([&] {
-    mark_report_data_lost();
-    return run(report_action, {"p1"}) == -1 &&
-                   output_.find("create template failed") != std::string::npos
-               ? 0
-               : 1;
-  });
-  EXPECT_EQ(support::wait_child(child), 0);
-  EXPECT_FALSE(support::exists(folder_.path("it's final")));
-}
-
 // A call of the script that fails, whichever, prints nothing and skips nothing; but what it should
 // have written is missing.
 TEST_F(ActionsTest, AFailedCommandLosesTheRunsData) {
