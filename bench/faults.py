@@ -7,10 +7,8 @@ Two shares, files of three owners, a volume and a quota tool make one report wit
 first run under strace counts the system calls of the program. Then, for each of them, the run is
 made again with that one call failing (strace's fault injection), and its page and CSV files are
 compared with those of the undisturbed run. What may differ from run to run (times, what is used on
-the volume) is left out of the comparison.
-
-Threads count their own calls, so that the Nth of each fails; commands that the program starts are
-left alone.
+the volume) is left out of the comparison. These are the calls of the main thread. Those of the
+threads that look ahead follow for one share's folders: each line has the calls on that folder.
 
     same    the report is what it would have been
     told    it is not, and the run says so: status "fail", no report, or an incident in the report
@@ -37,8 +35,8 @@ PROGRAM = VORN / 'bin/vornreport'
 PROFILE = 'faults'
 # Of the dynamic loader, before the program begins, and of its end.
 BEFORE = 'execve arch_prctl set_tid_address set_robust_list rseq prlimit64'.split()
-# A close that fails has closed all the same, which strace can't play.
-NEVER = ['exit_group', 'rt_sigreturn', 'restart_syscall', 'close', 'getpid']
+# A close that fails has closed all the same, which strace can't play, and waking a thread never fails.
+NEVER = ['exit_group', 'rt_sigreturn', 'restart_syscall', 'close', 'getpid', 'futex']
 ERRORS = 'EIO,ENOMEM,EACCES,EINTR'
 LIMIT = 120  # seconds, which no run comes near
 OWNERS = {'root': 0, 'games': 5, 'mail': 8}
@@ -55,11 +53,11 @@ def make_server(base):
     shares = ''
     for share in ('photos', 'music'):
         for number, (name, uid) in enumerate(OWNERS.items()):
-            for i in range(12):
-                folder = base / share / f'of {name}' / str(i // 3)
-                folder.mkdir(parents=True, exist_ok=True)
-                path = folder / f'{share} {i}.{("jpg", "mp3", "x")[i % 3]}'
-                path.write_bytes(b'x' * (1000 * (number + 1) * (i % 3 + 1)))
+            folder = base / share / f'of {name}'
+            folder.mkdir(parents=True)
+            for i in range(3):
+                path = folder / f'{share} {i}.{("jpg", "mp3", "x")[i]}'
+                path.write_bytes(b'x' * (1000 * (number + 1) * (i + 1)))
                 os.chown(path, uid, uid)
                 os.utime(path, (1.6e9 + i, 1.6e9 + i))
         shares += f'[{share}]\npath = {base / share}\n'
@@ -111,26 +109,23 @@ def run(options=()):
     return shown, bool(facts['incidents']), done.stdout
 
 
-STRACE = ['strace', '-f', '-b', 'execve', '-qq']
-
-
-def counted_calls():
-    """How often a thread of the undisturbed program makes each call at most, and how often it is made
-    before the program's own code runs."""
+def counted_calls(options):
+    """How often the undisturbed program makes each call, and how often before its own code runs.
+    Of several threads or processes, as strace counts each for itself, the one that makes most."""
     with tempfile.NamedTemporaryFile() as file:
-        run([*STRACE, '-o', file.name])
-        threads, loader = collections.defaultdict(collections.Counter), collections.Counter()
-        in_loader = True
+        run(['strace', '-qq', '-o', file.name, *options])
+        each, loader = collections.Counter(), collections.Counter()
+        in_loader = not options
         for line in Path(file.name).read_text(errors='replace').splitlines():
-            if match := re.match(r'(\d+) +(\w+)\(', line):
-                threads[match[1]][match[2]] += 1
+            if match := re.match(r'((?:\d+ +)?)(\w+)\(', line):
+                each[match[1], match[2]] += 1
                 if in_loader:
                     loader[match[2]] += 1
                 # The first thing that the program itself does.
                 in_loader = in_loader and 'F_GETFD' not in line
-    calls = collections.Counter()
-    for thread in threads.values():
-        calls |= thread
+    calls = {}
+    for (_, call), count in each.items():
+        calls[call] = max(count, calls.get(call, 0))
     return calls, loader
 
 
@@ -146,19 +141,31 @@ def inside(args):
     base = Path(tempfile.mkdtemp(prefix='faults-', dir='/var/tmp'))
     try:
         make_server(base)
-        measure(args)
+        measure(args, base)
     finally:
         shutil.rmtree(base)
 
 
-def measure(args):
+def measure(args, base):
     run()
     shown, told, _ = run()
     assert shown is not None and not told, 'the undisturbed run tells something already'
     assert run()[0] == shown, 'two undisturbed runs differ'
-    calls, loader = counted_calls()
     total, untold = collections.Counter(), []
     print(f'{"call":20} {"made":>6} {"failed":>7} {"same":>6} {"told":>6} {"untold":>7}')
+    fail_each(args, shown, [], total, untold)
+    for folder in (base / 'photos', base / 'photos/of root'):
+        print(f'on {folder.relative_to(base)}:')
+        fail_each(args, shown, ['-f', '-P', str(folder)], total, untold)
+    print(f'{"all":27} {sum(total.values()):7} {total["same"]:6} '
+          f'{total["told"]:6} {total["untold"]:7}')
+    for call, number, error in untold:
+        print(f'untold: {call} number {number} with {error}')
+
+
+def fail_each(args, shown, options, total, untold):
+    """Fails each call that strace sees with these options; prints a line a call."""
+    calls, loader = counted_calls(options)
     for call in sorted(calls):
         if call in BEFORE + NEVER or (args.only and call not in args.only):
             continue
@@ -166,7 +173,8 @@ def measure(args):
         for number in range(loader[call] + 1, calls[call] + 1, args.every):
             # Each call meets one of the errors, its neighbours the others.
             error = args.errors[number % len(args.errors)]
-            got, told, output = run([*STRACE, '-o', '/dev/null', '-e', f'trace={call}', '-e',
+            got, told, output = run(['strace', '-qq', '-o', '/dev/null', *options, '-e',
+                                     f'trace={call}', '-e',
                                      f'inject={call}:error={error}:when={number}'])
             outcome = 'same' if got == shown else 'told' if told else 'untold'
             counts[outcome] += 1
@@ -178,11 +186,7 @@ def measure(args):
                         + b'\n'.join(b'+' + part for part in got if part not in shown))
         print(f'{call:20} {calls[call]:6} {sum(counts.values()):7} {counts["same"]:6} '
               f'{counts["told"]:6} {counts["untold"]:7}', flush=True)
-        total += counts
-    print(f'{"all":20} {sum(calls.values()):6} {sum(total.values()):7} {total["same"]:6} '
-          f'{total["told"]:6} {total["untold"]:7}')
-    for call, number, error in untold:
-        print(f'untold: {call} number {number} with {error}')
+        total.update(counts)
 
 
 def main():
