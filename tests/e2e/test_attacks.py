@@ -48,10 +48,11 @@ class HungMounts(ProductTest):
         make_files(self.m.share('photos'), {'a.jpg': 10})
         hung = self.m.share('hung')
         self.m.profile('weekly', report_list='share_list')
-        run = Run(self.m, ['/bin/sh', '-c', f'''
+        # Only the daemon may have the device: the mount ends with the last one who has.
+        run = Run(self.m, ['/bin/bash', '-c', f'''
             {ROOT}/tests/e2e/hung_mount.py {fuse} {hung} >/tmp/mounted 2>&1 & echo $! >/tmp/daemon
             until [ -s /tmp/mounted ]; do sleep 0.01; done
-            exec {PROGRAM} --report weekly'''], self.m.new_log(), pass_fds=[fuse])
+            exec {PROGRAM} --report weekly {fuse}>&-'''], self.m.new_log(), pass_fds=[fuse])
         os.close(fuse)
         program = run.pid()
         self.addCleanup(lambda: os.kill(int((self.m.tmp / 'daemon').read_text()), signal.SIGKILL))
