@@ -33,8 +33,6 @@ namespace {
 
 using report_format::RunStatus;
 
-// False, reported, when it can't be stored. There is none then: the word of an earlier run must not
-// stand for this one.
 bool store_status(const std::string& profile, const RunStatus& status) {
   const int saved_errno = errno;
   const std::string path = VORN_PATH_STATUS "/" + profile;
@@ -47,9 +45,18 @@ bool store_status(const std::string& profile, const RunStatus& status) {
   }
   log_line(R"(status "%s" of profile "%s" can't be stored in %s (%s))", status.word.c_str(),
            profile.c_str(), path.c_str(), std::strerror(errno));
-  const ErrnoKeeper keeper;
-  unlink(path.c_str());
   return false;
+}
+
+// As store_status(), for the first word of a run: where it can't be stored, that of the run before
+// must not stand for this one.
+bool store_first_status(const std::string& profile, const RunStatus& status) {
+  const bool is_stored = store_status(profile, status);
+  if (!is_stored) {
+    const ErrnoKeeper keeper;
+    unlink((VORN_PATH_STATUS "/" + profile).c_str());
+  }
+  return is_stored;
 }
 
 // When a report isn't whole, nothing may look like one: what stands at the finished name takes its
@@ -138,7 +145,8 @@ int update_status(const std::string& profile, std::string_view word) {
     forget_index_copy();
   }
   const RunStatus status = ended ? outcome_of(*ended, word) : RunStatus{.word = std::string(word)};
-  if (!store_status(profile, status)) {
+  const bool is_first = word == kCollecting;
+  if (!(is_first ? store_first_status(profile, status) : store_status(profile, status))) {
     return -1;
   }
   if (!status.report.empty() && ended->keep > 0) {
@@ -185,7 +193,7 @@ int VornQazProfileRunning(const char* profile) {
     const host::TakeResult taken = host::take_profile(profile);
     if (taken == host::TakeResult::failed) {
       const host::ErrnoKeeper keeper;
-      host::store_status(profile, {.word = report_format::kFail});  // it comes to nothing
+      host::store_first_status(profile, {.word = report_format::kFail});  // it comes to nothing
     }
     return taken == host::TakeResult::busy ? 1 : 0;
   } catch (const std::exception&) {
