@@ -127,7 +127,7 @@ class Refusals(ProductTest):
         self.m.options += ['--bind', tool, os.path.realpath('/sbin/repquota')]
 
         def outcome(profile, *options):
-            """The blocks, and whether they are vouched for."""
+            """The blocks with the facts of shares, and whether they are vouched for."""
             run = self.m.start('--report', profile) if not options else Run(self.m, [
                 'strace', '-f', '-qq', '-o', '/dev/null', *options, PROGRAM, '--report', profile],
                 self.m.new_log())
@@ -137,14 +137,16 @@ class Refusals(ProductTest):
             if not status.exists() or self.m.status(profile) != 'success':
                 self.assertEqual((folders, bool(run.log_lines)), ([], True))
                 return None, False
-            blocks = data_blocks(folders[0])
-            is_whole = facts(folders[0])['incidents'] == []
+            told = facts(folders[0])
+            blocks = data_blocks(folders[0]), told['shares']
+            is_whole = told['incidents'] == []
             self.m.shell(f"rm -r '{folders[0]}'")
             return blocks, is_whole
         right = {profile: outcome(profile) for profile in ('files', 'quotas')}
         self.assertEqual([is_whole for _, is_whole in right.values()], [True, True])
         for name, profile, path, injected in (
                 ('volume', 'files', photos, 'statfs:error=EIO'),
+                ('volume of a share', 'files', photos, 'statx:error=ENOMEM'),
                 ('mount table', 'files', '/proc/self/mountinfo', 'openat:error=EMFILE'),
                 ('mount table, read', 'files', '/proc/self/mountinfo', 'read:error=EIO:when=2'),
                 ('accounts', 'files', '/etc/passwd', 'openat:error=EMFILE'),

@@ -214,9 +214,10 @@ int VORNVolumeOfPath(const char* path, char* mount_path, size_t size) try {
   *mount_path = '\0';
   const int saved_errno = errno;
   const host::ServerVolumes server = host::read_volumes();
+  errno = 0;
   const host::Mount* mount = host::mount_holding(server.mounts, path);
   if (mount == nullptr) {
-    errno = ENOENT;
+    errno = errno != 0 ? errno : ENOENT;  // what failed, if anything
     return -1;
   }
   const host::Volume* volume = server.holding(path);
