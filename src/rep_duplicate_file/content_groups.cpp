@@ -37,12 +37,12 @@ std::map<std::string, uint64_t> g_unread;  // files whose content can't be read,
 
 void count_groups(const QAZLLNode* groups) {
   for (; groups != nullptr; groups = groups->next) {
-    const dup_file_node& first = *file_of(groups);
-    for (const dup_file_node* file = &first; file != nullptr; file = file->next) {
+    const uint64_t size = file_of(groups)->size;
+    for (const dup_file_node* file = file_of(groups); file != nullptr; file = file->next) {
       g_tally.file(file->share_folder, file->path.c_str());
       ++g_rows.rows;
     }
-    g_tally.end_group(first.size);
+    g_tally.end_group(size);
   }
 }
 
