@@ -7,7 +7,7 @@
 #include <new>
 
 #include "facts/run_facts.hpp"
-#include "vorn/paths.h"
+#include "history_db.hpp"
 #include "vornreport/error_log.hpp"
 #include "vornreport/handles.hpp"
 
@@ -22,32 +22,6 @@ constexpr char kRotation[] =
 constexpr uint64_t kSecondsPerDay = 86400;
 
 using EscapedText = std::array<char, 4096>;
-
-struct CloseDb {
-  void operator()(VORNDB* db) const { VornQazDBClose(&db); }
-};
-using DbHandle = std::unique_ptr<VORNDB, CloseDb>;
-using ResultHandle = std::unique_ptr<VORNDBResult, ReleaseWith<&VORNDBFreeResult>>;
-
-// Null, logged, when it can't be opened.
-DbHandle open_history() {
-  VORNDB* db = nullptr;
-  const int opened = VornQazDBOpen(&db, VORN_PATH_HISTORY_DB, VORN_PATH_HISTORY_SCHEMA);
-  DbHandle handle(db);
-  if (opened < 0) {
-    REPORT_LOG_ERR(kModule, __LINE__, "Failed to open qaz DB\n");
-    return nullptr;
-  }
-  return handle;
-}
-
-// False on failure, which the caller logs.
-bool execute(VORNDB* db, const char* sql, ResultHandle& result) {
-  VORNDBResult* rows = nullptr;
-  const int executed = VORNDBExecute(db, sql, &rows);
-  result.reset(rows);
-  return executed != -1;
-}
 
 bool escape(VORNDB* db, const char* text, EscapedText& out) {
   return VORNDBEscapeStringEX(db, out.data(), out.size(), text, std::strlen(text)) != 0;
@@ -79,11 +53,6 @@ bool escape_sample(VORNDB* db, const char* profile, const char* volume, const ch
   }
   report_trace(kModule, __LINE__, "date=%s, esc date=%s\n\n", date, out.date.data());
   return true;
-}
-
-const char* field(VORNDBResult* result, VORNDBRow* row, const char* column) {
-  const char* text = VORNDBFetchField(result, row, column);
-  return text != nullptr ? text : "";
 }
 
 uint64_t to_u64(const char* text) {
@@ -191,7 +160,7 @@ int32_t VornQazDBVolumeUsageInsert(const char* profile, const char* volume, cons
       return -1;
     }
   }
-  const DbHandle db = open_history();
+  const DbHandle db = open_history(kModule, __LINE__);
   auto escaped = std::make_unique<EscapedSample>();
   if (!db || !escape_sample(db.get(), profile, volume, percent, sampleDate, *escaped)) {
     tell_lost_sample(volume);
@@ -212,7 +181,7 @@ int32_t VornQazDBVolumeUsageInsert(const char* profile, const char* volume, cons
 }
 
 std::optional<StoredSamples> VolumeUsageSamples(int64_t since) {
-  const DbHandle db = open_history();
+  const DbHandle db = open_history(kModule, __LINE__);
   if (!db) {
     return std::nullopt;
   }
@@ -241,7 +210,7 @@ int32_t VornQazDBVolumeUsageSelect(const char* profile, QAZLLNode** list) {
     REPORT_LOG_ERR(kModule, __LINE__, "bad parameter\n");
     return -1;
   }
-  const DbHandle db = open_history();
+  const DbHandle db = open_history(kModule, __LINE__);
   if (!db) {
     return 0;
   }
@@ -265,7 +234,7 @@ int32_t VolumeUsageDBExec(const char* sql) {
     REPORT_LOG_ERR(kModule, __LINE__, "bad parameter\n");
     return -1;
   }
-  const DbHandle db = open_history();
+  const DbHandle db = open_history(kModule, __LINE__);
   ResultHandle result;
   if (db && !execute(db.get(), sql, result)) {
     REPORT_LOG_ERR(kModule, __LINE__, "Failed to select volume usage DB, sql=%s\n", sql);

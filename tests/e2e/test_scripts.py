@@ -60,7 +60,7 @@ ROOMS = {
     'report': (r'src/rep_([a-z_]+)[./].*', 'frame history ' + PROGRAM),
     'frame': (r'src/(?:report_frame|listed_report)\..*', PROGRAM),
     'gathering': (r'src/file_gathering/.*', PROGRAM),
-    'history': (r'src/db_volume_usage\..*', PROGRAM),
+    'history': (r'src/(?:history_db|db_volume_usage|db_snapshots)\..*', PROGRAM),
     'facts': (r'src/facts/.*', 'ground format api'),
     'ground': (r'src/(?:shell|below_share|error_log|report_data|signals_blocked|statements_ahead|'
                r'thread_count)\..*|include/vornreport/.*', 'format api'),
