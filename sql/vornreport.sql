@@ -16,3 +16,16 @@ CREATE TABLE IF NOT EXISTS VolumeUsage (
 CREATE INDEX IF NOT EXISTS VolumeUsageHistory ON VolumeUsage (profile, sampleDate);
 -- For the rotation, which looks for the oldest collections of all profiles.
 CREATE INDEX IF NOT EXISTS VolumeUsageDates ON VolumeUsage (sampleDate);
+
+-- What finished reports counted, for growth: one row per profile and report. `time` is when the run
+-- began, in seconds since the epoch; `valid` is 0 until the report is finished; `folders` is how
+-- many `details` holds. Both texts are lines of fields with tabs between them.
+CREATE TABLE IF NOT EXISTS Snapshot (
+  profile TEXT NOT NULL,
+  time INTEGER NOT NULL,
+  valid INTEGER NOT NULL,
+  folders INTEGER NOT NULL,
+  summary TEXT NOT NULL,
+  details TEXT NOT NULL,
+  PRIMARY KEY (profile, time)
+);

@@ -26,6 +26,7 @@ void FolderTotals::begin_share(size_t share) {
 void FolderTotals::forget_share(size_t share) {
   std::erase_if(kept_, [share](const Total& total) { return total.share == share; });
   std::make_heap(kept_.begin(), kept_.end(), comes_before);
+  cut_.erase(share);
   inside_.clear();
 }
 
@@ -55,9 +56,11 @@ void FolderTotals::leave() {
   // The order of the heap is that of the list, so that its front is the list's last.
   if (kept_.size() == kMost) {
     if (!comes_before(total, kept_.front())) {
+      cut_.insert(total.share);
       return;
     }
     std::pop_heap(kept_.begin(), kept_.end(), comes_before);
+    cut_.insert(kept_.back().share);
     kept_.pop_back();
   }
   kept_.push_back(std::move(total));

@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -38,6 +39,8 @@ class FolderTotals {
 
   // The largest, by size; of those of one size the shorter path first, then the first found.
   std::vector<LargeFolder> largest() const;
+  // Whether it has every folder of the share.
+  bool has_all(size_t share) const { return !cut_.contains(share); }
 
  private:
   // A folder's path costs its name only: those above it are kept as well.
@@ -61,6 +64,7 @@ class FolderTotals {
   uint64_t left_ = 0;
   std::vector<Total> inside_;  // the folders that the walk is in
   std::vector<Total> kept_;    // a heap: the one that goes first is in front
+  std::set<size_t> cut_;       // shares that lack a folder
 };
 
 }  // namespace vornreport

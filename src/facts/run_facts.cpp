@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <ctime>
+#include <iterator>
 
 #include "facts/forecast.hpp"
 #include "report_format/values.hpp"
@@ -13,7 +14,6 @@ namespace vornreport {
 namespace {
 
 constexpr char kModule[] = "src/facts";
-constexpr size_t kMostQuotas = 20;
 
 }  // namespace
 
@@ -39,12 +39,17 @@ void QuotaTally::add(const QuotaTally& other) {
   }
 }
 
+std::vector<report_format::QuotaFacts> QuotaTally::users() const {
+  const size_t count = std::min(users_.size(), kMostUsers);
+  return {users_.begin(), std::next(users_.begin(), static_cast<std::ptrdiff_t>(count))};
+}
+
+// Behind those that are as pressing.
 void QuotaTally::keep(report_format::QuotaFacts facts) {
-  const auto place =
-      std::upper_bound(users_.begin(), users_.end(), facts,
-                       [](const auto& one, const auto& two) { return one.percent > two.percent; });
-  users_.insert(place, std::move(facts));
-  users_.resize(std::min(users_.size(), kMostQuotas));
+  users_.insert(std::move(facts));
+  if (users_.size() > kMost) {
+    users_.erase(std::prev(users_.end()));
+  }
 }
 
 RunFacts& run_facts() {

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "facts/growth.hpp"
 #include "report_format/facts.hpp"
 #include "vorn/text.h"
 #include "vorn/volume.h"
@@ -32,19 +33,31 @@ struct RowCounts {
 // The users nearest to their soft limits or over them, on all volumes.
 class QuotaTally {
  public:
+  static constexpr size_t kMostUsers = 20;
+  static constexpr size_t kMost = 2000;  // for those who come to be among them later
+
   // Sizes in bytes; a user without a limit isn't counted.
   void add(std::string volume, std::string user, uint64_t used, uint64_t quota);
   // Adds what another tally has counted.
   void add(const QuotaTally& other);
-  // The most pressing first, at most 20; of equal ones those that were added first.
-  const std::vector<report_format::QuotaFacts>& users() const { return users_; }
+  // The most pressing first, at most kMostUsers; of equal ones those that were added first.
+  std::vector<report_format::QuotaFacts> users() const;
+  // In the same order, at most kMost.
+  const auto& kept() const { return users_; }
   // All that are near or over, those that aren't kept included.
   uint64_t pressing() const { return pressing_; }
 
  private:
+  struct IsMorePressing {
+    bool operator()(const report_format::QuotaFacts& one,
+                    const report_format::QuotaFacts& two) const {
+      return one.percent > two.percent;
+    }
+  };
+  using Users = std::multiset<report_format::QuotaFacts, IsMorePressing>;
   void keep(report_format::QuotaFacts facts);
 
-  std::vector<report_format::QuotaFacts> users_;
+  Users users_;
   uint64_t pressing_ = 0;
 };
 
@@ -60,6 +73,7 @@ struct RunFacts {
   std::optional<report_format::DuplicateFacts> duplicates;
   std::optional<std::map<unsigned, std::string>> owners;  // names by user id, of those to be told
   std::optional<std::set<std::string>> limit_user;        // nobody else is told of
+  std::optional<Growth> growth;                           // since what there is to compare with
 
   bool may_tell(const std::string& user) const { return !limit_user || limit_user->contains(user); }
 };

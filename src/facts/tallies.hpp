@@ -132,6 +132,7 @@ class Tallies {
 
   const std::vector<ShareTally>& shares() const { return shares_; }
   std::vector<LargeFolder> largest_folders() const { return folders_.largest(); }
+  bool has_all_folders(size_t share) const { return folders_.has_all(share); }
   const OldestFile& oldest() const { return oldest_; }
   uint64_t files() const { return files_; }
 
