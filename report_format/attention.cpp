@@ -18,6 +18,11 @@ constexpr ValueFormat kVolumeUsed[] = {{"volume", kName}, {"percent", kPercent},
 constexpr ValueFormat kQuota[] = {
     {"user", kName}, {"volume", kName}, {"used", kBytes}, {"quota", kBytes}, {"percent", kPercent}};
 constexpr ValueFormat kMore[] = {{"n", kCount}};
+constexpr ValueFormat kGrew[] = {{"volume", kName}, {"bytes", kBytes}, {"date", kTime}};
+constexpr ValueFormat kGrewIn[] = {
+    {"volume", kName}, {"bytes", kBytes}, {"date", kTime}, {"place", kName}};
+constexpr ValueFormat kGrewInBy[] = {
+    {"volume", kName}, {"bytes", kBytes}, {"date", kTime}, {"place", kName}, {"owner", kName}};
 constexpr ValueFormat kShareValues[] = {{"share", kName}, {"bytes", kBytes}};
 constexpr ValueFormat kOwnerValues[] = {{"owner", kName}, {"bytes", kBytes}};
 constexpr ValueFormat kDuplicates[] = {{"bytes", kBytes}, {"groups", kCount}};
@@ -30,6 +35,9 @@ constexpr std::array kFormats{
     AttentionFormat{"quota_over", kQuotaUsage.name, kQuota},
     AttentionFormat{"quota_near", kQuotaUsage.name, kQuota},
     AttentionFormat{"quota_more", kQuotaUsage.name, kMore},
+    AttentionFormat{"volume_grew", kGrowth.name, kGrew},
+    AttentionFormat{"volume_grew_in", kGrowth.name, kGrewIn},
+    AttentionFormat{"volume_grew_in_by", kGrowth.name, kGrewInBy},
     AttentionFormat{"share_largest", kShareList.name, kShareValues},
     AttentionFormat{"owner_most", kFileOwner.name, kOwnerValues},
     AttentionFormat{"duplicates_possible", kDuplicateFile.name, kDuplicates},

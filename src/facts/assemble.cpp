@@ -6,6 +6,7 @@
 
 #include "facts/attention.hpp"
 #include "facts/forecast.hpp"
+#include "facts/growth_facts.hpp"
 #include "report_format/reports.hpp"
 #include "vorn/volume.h"
 
@@ -96,6 +97,24 @@ std::vector<report_format::VolumeFacts> volumes_of(const RunFacts& run, const Ta
   std::stable_sort(volumes.begin(), volumes.end(),
                    [](const auto& one, const auto& two) { return pressure(one) > pressure(two); });
   return volumes;
+}
+
+// What the volumes hold and what has grown on them. They are in another order than in the run.
+void add_causes(std::vector<report_format::VolumeFacts>& volumes, const RunFacts& run,
+                const Tallies& tallies, const FactsSource& source) {
+  const auto* names =
+      run.owners && is_asked_for(report_format::kFileOwner, source) ? &*run.owners : nullptr;
+  for (const MeasuredVolume& volume : run.volumes) {
+    const auto place = std::find_if(volumes.begin(), volumes.end(), [&](const auto& facts) {
+      return facts.path == facts_text(volume.path);
+    });
+    place->filled_by = filled_by(tallies, names, volume.path);
+    if (run.growth) {
+      if (auto grown = growth_on(*run.growth, volume.path)) {
+        place->grown_by = std::move(grown->causes);
+      }
+    }
+  }
 }
 
 // --- Lists of the gathering ---------------------------------------------------------------------
@@ -264,6 +283,13 @@ Facts assemble_facts(const RunFacts& run, const Tallies& tallies, const FactsSou
   if (run.quotas) {
     facts.quotas = run.quotas->users();
   }
+  if (source.has_walked) {
+    add_causes(facts.volumes, run, tallies, source);
+  }
+  if (run.growth) {
+    add_grown(facts, *run.growth);
+  }
+  add_samples(facts, source.snapshots, run);
   facts.duplicates = run.duplicates;
   facts.reports = reports_of(run, source);
   facts.attention = attention_of(facts, run, tallies);

@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "facts/run_facts.hpp"
+#include "facts/snapshot.hpp"
 #include "facts/tallies.hpp"
 #include "report_format/facts.hpp"
 
@@ -19,6 +20,7 @@ struct FactsSource {
   bool has_walked = false;  // gathering was asked for
   // Samples by the name under which a volume is stored.
   std::map<std::string, std::vector<report_format::Sample>> samples;
+  SnapshotSamples snapshots;
 };
 
 // Volumes are asked for their identifiers.

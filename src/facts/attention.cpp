@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "facts/forecast.hpp"
+#include "facts/growth_facts.hpp"
 #include "report_format/attention.hpp"
 #include "report_format/reports.hpp"
 #include "report_format/values.hpp"
@@ -70,6 +71,15 @@ void add_volume(List& list, const report_format::VolumeFacts& volume) {
   }
 }
 
+// All users near or over their quotas, and those of the list that soon will be.
+uint64_t pressing_users(const Facts& facts, const RunFacts& run) {
+  return run.quotas->pressing() +
+         static_cast<uint64_t>(
+             std::count_if(facts.quotas->begin(), facts.quotas->end(), [](const auto& user) {
+               return user.level != Level::kOk && quota_level(user.percent, nullptr) == Level::kOk;
+             }));
+}
+
 void add_quotas(List& list, const Facts& facts, const RunFacts& run) {
   if (!facts.quotas) {
     return;
@@ -80,7 +90,7 @@ void add_quotas(List& list, const Facts& facts, const RunFacts& run) {
       return;
     }
     if (told == kMostUsers) {
-      list.add(user.level, "quota_more", {{"n", as_number(run.quotas->pressing() - told)}});
+      list.add(user.level, "quota_more", {{"n", as_number(pressing_users(facts, run) - told)}});
       return;
     }
     ++told;
@@ -90,6 +100,48 @@ void add_quotas(List& list, const Facts& facts, const RunFacts& run) {
               {"used", as_number(user.used)},
               {"quota", as_number(user.quota)},
               {"percent", user.percent}});
+  }
+}
+
+// What accounts for at least half of the growth: the largest folder that does, else a share.
+const report_format::Cause* main_cause(const VolumeGrowth& growth, std::string_view kind) {
+  const auto found = std::find_if(growth.causes.begin(), growth.causes.end(), [&](const auto& one) {
+    return one.kind == kind && one.bytes >= growth.bytes - growth.bytes / 2;
+  });
+  return found == growth.causes.end() ? nullptr : &*found;
+}
+
+void add_growth(List& list, const std::string& volume, const VolumeGrowth& growth) {
+  Values values{{"volume", report_format::facts_text(volume)},
+                {"bytes", growth.bytes},
+                {"date", growth.since}};
+  const auto* place = main_cause(growth, "folder");
+  place = place != nullptr ? place : main_cause(growth, "share");
+  const auto* owner = main_cause(growth, "owner");
+  if (place != nullptr) {
+    values.emplace_back("place",
+                        place->name.empty() ? place->share : place->share + "/" + place->name);
+  }
+  if (place != nullptr && owner != nullptr) {
+    values.emplace_back("owner", owner->name);
+  }
+  list.add(Level::kOk,
+           place == nullptr   ? "volume_grew"
+           : owner == nullptr ? "volume_grew_in"
+                              : "volume_grew_in_by",
+           std::move(values));
+}
+
+// In the order of the volumes. Files that two shares hold would count twice.
+void add_growth(List& list, const RunFacts& run) {
+  if (!run.growth || sums_are_doubtful()) {
+    return;
+  }
+  for (const MeasuredVolume& volume : run.volumes) {
+    const auto growth = growth_on(*run.growth, volume.path);
+    if (growth && growth->bytes > 0) {
+      add_growth(list, volume.path, *growth);
+    }
   }
 }
 
@@ -135,6 +187,7 @@ std::vector<Attention> attention_of(const Facts& facts, const RunFacts& run,
     add_volume(list, volume);
   }
   add_quotas(list, facts, run);
+  add_growth(list, run);
   add_largest(list, facts);
   if (facts.duplicates && facts.duplicates->reclaimable > 0) {
     list.add(Level::kOk,

@@ -22,6 +22,13 @@ int clean_action(char** args);
 // into `out_path`. The number of reports run minus one, or -1.
 int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, char* out_path,
                        int out_size);
+// Stores what the run has counted, for later ones to compare with; it counts from keep_snapshot().
+// False when there is nothing to store, or (logged, and an incident) it can't be stored.
+bool store_snapshot(const VLIBCSzHash* profile_hash);
+// The report is finished: what was stored counts (logged when not).
+void keep_snapshot();
+// The run has failed: what was stored goes.
+void drop_snapshot();
 // Closes the facts of the run: writes them as a block of the data file and as report.json into the
 // dated working folder. False, logged, when a part of that failed; the run's data is lost then.
 bool close_facts(const VLIBCSzHash* profile_hash, const char* data_path);

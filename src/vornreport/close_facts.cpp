@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "actions.hpp"
+#include "db_snapshots.hpp"
 #include "db_volume_usage.hpp"
 #include "facts/assemble.hpp"
 #include "facts/run_facts.hpp"
@@ -57,6 +58,10 @@ FactsSource source_of(const char* report_list) {
   source.has_walked = gathers(report_list);
   if (auto samples = VolumeUsageSamples(source.now - kHistoryDays * kDay)) {
     source.samples = std::move(*samples);
+    if (auto seen =
+            SnapshotSamplesOf(run_facts().profile, source.now - kHistoryDays * kDay, source.now)) {
+      source.snapshots = std::move(*seen);
+    }
   } else {
     record_incident(
         "history_lost", "history",

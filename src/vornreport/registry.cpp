@@ -19,6 +19,7 @@
 #include "rep_file_group.hpp"
 #include "rep_file_owner.hpp"
 #include "rep_folder_usage.hpp"
+#include "rep_growth.hpp"
 #include "rep_large_file.hpp"
 #include "rep_modify_time.hpp"
 #include "rep_quota_usage.hpp"
@@ -50,6 +51,7 @@ constexpr std::array kRegistry{
     entry(report_format::kMostModify, most_modify_db, most_modify_statement),
     entry(report_format::kFolderUsage, folder_usage),
     entry(report_format::kFileAge, file_age),
+    entry(report_format::kGrowth, growth),
     entry(report_format::kCoverage, coverage),
 };
 

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "actions.hpp"
+#include "facts/owner_names.hpp"
 #include "facts/progress.hpp"
 #include "facts/run_facts.hpp"
 #include "facts/tallies.hpp"
@@ -20,7 +21,6 @@
 #include "sigterm.hpp"
 #include "vorn/paths.h"
 #include "vorn/report.h"
-#include "vorn/user.h"
 #include "vorn/volume.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/registry.hpp"
@@ -99,29 +99,6 @@ bool found_no_quotas(std::string_view name) {
          run_facts().quotas->users().empty() && !report_data_lost();
 }
 
-void note_owner(const VLIBCSzHash* users, uid_t uid) {
-  RunFacts& facts = run_facts();
-  VORNUser* user = nullptr;
-  const bool is_known = VORNUserGetByUID(uid, &user) >= 0;
-  const UserHandle owned(user);
-  if (is_known && user != nullptr && !is_unset(user->name) && facts.may_tell(user->name) &&
-      VLIBCSzHashGetValue(users, user->name) != nullptr) {
-    (*facts.owners)[uid] = user->name;
-  }
-}
-
-// The names of those who own files, as far as they may be told.
-void note_owners(const VLIBCSzHash* users) {
-  run_facts().owners.emplace();
-  for (const ShareTally& share : tallies().shares()) {
-    for (const VolumeTally& volume : share.volumes()) {
-      for (const auto& [uid, amount] : volume.owners) {
-        note_owner(users, uid);
-      }
-    }
-  }
-}
-
 // What the selected reports are going to ask the statistics database, in their order.
 std::vector<const char*> statements_of(const VLIBCSzHash* profile_hash, const char* report_list) {
   std::vector<const char*> statements;
@@ -162,8 +139,9 @@ int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
   return result;
 }
 
-// Steps of a loaded profile up to the published report. 0 or -1.
-int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
+// Steps of a loaded profile up to the published report. 0 or -1. `has_snapshot`: whether it has
+// stored one by then, which goes again when the run fails.
+int make_report(const char* profile, const VLIBCSzHash* profile_hash, bool& has_snapshot) {
   report_trace(kDriverModule, 357, "create report, profile name=%s\n\n", profile);
   PathText data_path;
   // What the data file holds is assembled even when a part of it failed. Lost data is another
@@ -175,6 +153,7 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
   report_trace(kDriverModule, 363, "########## report.tmp=%s\n\n", data_path.c_str());
   progress_phase(report_format::Phase::kAssembling);
   if (!report_data_lost()) {
+    has_snapshot = store_snapshot(profile_hash);
     close_facts(profile_hash, data_path.c_str());
   }
   const int sections = build_report_html(profile, profile_hash, data_path.c_str());
@@ -185,6 +164,9 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash) {
   if (correct_report_dir(profile, profile_hash) < 0 || report_data_lost()) {
     REPORT_LOG_ERR_NESTED(kDriverModule, 370, "correct dir failed");
     return -1;
+  }
+  if (has_snapshot) {
+    keep_snapshot();
   }
   progress_phase(report_format::Phase::kPublishing);
   publish_report(profile, profile_hash);
@@ -240,7 +222,7 @@ int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, cha
   }
   const int result = run_selected_reports(profile, profile_hash, report_list, look_ups);
   if (report_format::is_selected(report_format::kFileOwner.name, report_list)) {
-    note_owners(look_ups.users.get());
+    note_owner_names(look_ups.users.get());
   }
   return result;
 }
@@ -283,7 +265,11 @@ int report_action(char** args) {
   end_without_memory(profile, hash.get());
   begin_facts(profile, hash.get());
   progress_begin(profile, count_selected(hash.get()));
-  const int result = end_run(profile, hash.get(), make_report(profile, hash.get()));
+  bool has_snapshot = false;
+  const int result = end_run(profile, hash.get(), make_report(profile, hash.get(), has_snapshot));
+  if (result < 0 && has_snapshot) {
+    drop_snapshot();
+  }
   end_without_memory(nullptr, nullptr);
   progress_end();
   if (stat_db != nullptr) {

@@ -101,7 +101,8 @@ class PreparedServer(ProductTest):
                 top = server.root / volume / share
                 count = {'name': share, 'path': f'/srv/{volume}/{share}', 'volume': f'/srv/{volume}',
                          'files': 0, 'folders': 0, 'bytes': 0, 'allocated': 0, 'unreadable': 0,
-                         'other': 0, 'whole': True, 'index': False, 'grown': None, 'samples': None}
+                         'other': 0, 'whole': True, 'index': False,
+                         'grown': {'last': None, 'week': None, 'month': None}}
                 for path, folders, files in os.walk(os.fsencode(top)):
                     folders[:] = [name for name in folders if name != b'@eaDir']
                     count['folders'] += len(folders)
@@ -128,6 +129,8 @@ class PreparedServer(ProductTest):
                             below[share, way].append((status.st_size, changed))
                         duplicates[name, status.st_size].add((status.st_dev, status.st_ino))
                 shares[share] = count
+        for share in found['shares']:
+            self.assertEqual(share.pop('samples'), [[found['started'], share['bytes']]])
         self.assertEqual({share['name']: share for share in found['shares']}, shares)
         self.assertEqual([share['bytes'] for share in found['shares']],
                          sorted((share['bytes'] for share in shares.values()), reverse=True))

@@ -215,6 +215,59 @@ TEST_F(FactsTest, QuotasNearestToTheirLimit) {
   EXPECT_EQ(attention(), "warning quota_near anna\n");
 }
 
+TEST_F(FactsTest, QuotasThatSoonAreUsedUp) {
+  run_facts().quotas.emplace();
+  run_facts().quotas->add("/", "calm", 850, 1000);
+  run_facts().quotas->add("/", "fast", 750, 1000);
+  for (int64_t day = 1; day < 12; ++day) {
+    source_.snapshots.users[{"/", "fast"}].push_back(
+        {kNow - day * kDay, static_cast<uint64_t>(750 - 25 * day)});
+  }
+  const auto quotas = facts().quotas.value();
+  EXPECT_EQ(quotas[0].user + " " + quotas[1].user, "fast calm");
+  EXPECT_EQ(quotas[0].forecast->days, 10);
+  EXPECT_EQ(quotas[1].forecast->state, report_format::ForecastState::kShort);
+  EXPECT_EQ(attention(), "warning quota_near fast\n");
+}
+
+TEST_F(FactsTest, GrowthIsToldWhereItIsAskedFor) {
+  share("a", "/srv/a", {{"/srv/a/1", 100, 1}, {"/srv/a/2", 50, 2, "text"}});
+  share("new", "/srv/new", {{"/srv/new/1", 10, 1}});
+  run_facts().volumes = {{"/", 1000, 500, kNow}};
+  run_facts().owners = {{1, "anna"}};
+  source_.snapshots.shares["a"] = {{kNow - kDay, 30}};
+  const std::vector<Change> changes{{GrowthKind::kShare, "a", "/", "", 1, 60},
+                                    {GrowthKind::kOwner, "a", "/", "anna", 1, 40},
+                                    {GrowthKind::kType, "a", "/", "image", 1, -3},
+                                    {GrowthKind::kFolder, "a", "/", "x", 1, 29}};
+  const Facts none = facts();
+  EXPECT_FALSE(none.shares->front().grown || none.owners->front().grown ||
+               none.volumes[0].grown_by);
+  EXPECT_EQ(none.shares->front().samples->size(), 2U);
+  EXPECT_EQ(none.volumes[0].filled_by->size(), 3U);  // two shares and an owner
+
+  run_facts().growth = {{"last", kNow - kDay, {}}, {"week", kNow - 7 * kDay, changes}};
+  const Facts grown = facts();
+  EXPECT_FALSE(grown.shares->front().grown->last || grown.shares->front().grown->month);
+  EXPECT_EQ(grown.shares->front().grown->week->bytes, 60);
+  EXPECT_FALSE(grown.shares->back().grown->week);
+  EXPECT_EQ(grown.owners->front().grown->week->bytes, 40);
+  EXPECT_EQ(grown.types->front().grown->week->bytes, -3);
+  ASSERT_EQ(grown.volumes[0].grown_by->size(), 3U);
+  EXPECT_EQ(grown.volumes[0].grown_by->front().since, kNow - 7 * kDay);
+  const auto entry = std::find_if(grown.attention.begin(), grown.attention.end(),
+                                  [](const auto& one) { return one.section == "growth"; });
+  ASSERT_NE(entry, grown.attention.end());
+  EXPECT_EQ(entry->code, "volume_grew_in_by");  // no folder has half of it
+  EXPECT_EQ(std::get<std::string>(*entry->find("place")), "a");
+
+  run_facts().owners.reset();
+  source_.report_list = "share_list";
+  const Facts less = facts();
+  EXPECT_FALSE(less.owners || less.types);
+  EXPECT_EQ(less.volumes[0].filled_by->size(), 2U);
+}
+
 TEST_F(FactsTest, NoSuperlativeOfADoubtfulSum) {
   share("small", "/srv/a", {{"/srv/a/1", 1, 1, "image", 1, 1, kNow - 91 * kDay}});
   share("large", "/srv/b", {{"/srv/b/old", 5, 1, "image", 1, 1, kNow - 90 * kDay}});

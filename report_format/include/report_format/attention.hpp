@@ -35,6 +35,9 @@ struct AttentionFormat {
 // quota_over            a user is over the soft limit on a volume
 // quota_near            a user is near it
 // quota_more            `n` further users are near or over
+// volume_grew           what shares hold on a volume has grown by `bytes` since `date`
+// volume_grew_in        most of it in `place`: a share, or a folder below one
+// volume_grew_in_by     and most of it by `owner`
 // share_largest         the share that takes the most
 // owner_most            the owner who takes the most
 // duplicates_possible   what duplicates by name and size take

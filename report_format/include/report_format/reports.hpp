@@ -1,4 +1,4 @@
-// The nine reports as those who write and those who read them must agree on: names, variables of
+// The reports as those who write and those who read them must agree on: names, variables of
 // the page's blocks, and how many rows the page gets. The page's script takes them from here too
 // (report_format/export).
 #pragma once
@@ -43,12 +43,14 @@ inline constexpr ReportFormat kMostModify{"most_modify", "vornMostModifyData", 4
 
 inline constexpr ReportFormat kFolderUsage{"folder_usage", "vornFolderUsageData", 5, 2000, 10000};
 inline constexpr ReportFormat kFileAge{"file_age", "vornFileAgeData", 4, 0, 0};
+inline constexpr ReportFormat kGrowth{"growth", "vornGrowthData", 6, 0, 0};
 inline constexpr ReportFormat kCoverage{"coverage", "vornCoverageData", 7, 0, 0};
 
 // In the order in which reports run and stand in the page.
 inline constexpr std::array kReports{&kQuotaUsage, &kFileOwner,     &kVolumeUsage, &kShareList,
                                      &kFileGroup,  &kDuplicateFile, &kLargeFile,   &kLeastModify,
-                                     &kMostModify, &kFolderUsage,   &kFileAge,     &kCoverage};
+                                     &kMostModify, &kFolderUsage,   &kFileAge,     &kGrowth,
+                                     &kCoverage};
 
 // A report is selected when its name occurs anywhere in the list.
 constexpr bool is_selected(std::string_view name, std::string_view report_list) {
