@@ -144,6 +144,9 @@ test('sizes and percentages follow one rule', async () => {
 const VALUES = {
   volume_full: {volume: '/srv/a', percent: 100, used: GIB}, volume_used: {volume: '/srv/a', percent: 93.4, free: 2 * GIB},
   volume_fills: {volume: '/srv/a', days: 24, days_low: 19, days_high: 33, percent: 90, free: GIB, window: 30},
+  volume_grew: {volume: '/srv/a', bytes: GIB, date: 1500000000},
+  volume_grew_in: {volume: '/srv/a', bytes: GIB, date: 1500000000, place: 'CAD/b'},
+  volume_grew_in_by: {volume: '/srv/a', bytes: GIB, date: 1500000000, place: 'CAD/b', owner: 'anna'},
   quota_over: {user: 'anna', volume: '/home', used: 12 * GIB, quota: 10 * GIB, percent: 120},
   quota_near: {user: 'anna', volume: '/home', used: 9 * GIB, quota: 10 * GIB, percent: 90}, quota_more: {n: 1234},
   share_largest: {share: 'CAD', bytes: 3 * GIB}, owner_most: {owner: 'chen', bytes: 4 * GIB},
@@ -152,6 +155,8 @@ const VALUES = {
 };
 const LINES = {
   volume_full: '/srv/a: full', volume_used: '/srv/a: 93.4% used, 2 GiB free', volume_fills: '/srv/a: full in about 24 days (19 to 33)',
+  volume_grew: '/srv/a grew by 1 GiB since Jul 14, 2017', volume_grew_in: '/srv/a grew by 1 GiB since Jul 14, 2017, mostly CAD/b',
+  volume_grew_in_by: '/srv/a grew by 1 GiB since Jul 14, 2017, mostly CAD/b, mostly by anna',
   quota_over: 'anna is over the quota on /home: 12 GiB of 10 GiB', quota_near: 'anna has used 90% of the quota on /home',
   quota_more: 'Further users near or over their quota: 1,234', share_largest: 'The largest share is CAD with 3 GiB',
   owner_most: 'chen owns the most: 4 GiB', duplicates_possible: 'Possible duplicates could free 5 GiB',

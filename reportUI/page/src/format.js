@@ -115,6 +115,15 @@ export function size(value) {
   return `${figure(count, count < 10 ? 2 : count < 100 ? 1 : 0)}\u00a0${UNITS[unit]}`;
 }
 
+// A change: with its sign, and the true minus.
+const signed = (value, text) => value > 0 ? `+${text}` : value < 0 ? `\u2212${text}` : text;
+const magnitude = value => String(value).replace(/^-/, '');
+export const isSigned = text => /^-?[0-9]+$/.test(text);
+export const numberChange = value => isSigned(value) ?
+  signed(Number(value), number(magnitude(value))) : UNKNOWN;
+export const sizeChange = value => isSigned(value) ?
+  signed(Number(value), size(magnitude(value))) : UNKNOWN;
+
 export const exactSize = value => say('bytes', {n: BigInt(value).toLocaleString(language)});
 
 // `value` is a number of hundredths. What is below 100 is never rounded to it: it isn't full yet.

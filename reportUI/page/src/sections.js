@@ -3,6 +3,7 @@
 //
 //   always    without a block the report has failed: it has no way to have no rows
 //   missing   what is said without a block, in place of that
+//   empty     what is said of no rows, by the facts
 //   cut       what is said when the page lacks rows of it
 //   mode      a variable whose value chooses the heading
 //   show      the section's content, a list of elements, from what was read: {tables, heading, csv}
@@ -14,7 +15,7 @@ import {h, shownPlain} from './dom.js';
 import * as format from './format.js';
 import {history} from './history.js';
 import {outlookOrder, outlookText} from './outlook.js';
-import {table} from './table.js';
+import {table, typeName} from './table.js';
 import {levelElement} from './volumes.js';
 
 const FILES = [['file', 'path'], ['size', 'size'], ['changed', 'time'], ['share', 'text']];
@@ -112,6 +113,20 @@ function ageTotals(rows) {
 }
 const ageName = age => age === 'future' ? format.say('future') : age.replace('-', '–');
 
+const SINCE = {last: 'sinceLast', week: 'sinceWeek', month: 'sinceMonth'};
+const GROWN = {share: 'grownShare', owner: 'grownOwner', type: 'grownType', folder: 'grownFolder',
+               folder_at_least: 'grownAtLeast'};
+const sayOf = (texts, word) => Object.hasOwn(texts, word) ? format.say(texts[word]) : word;
+
+function growthTable(data) {
+  const rows = rowsOf(data).map(([since, kind, share, name, files, bytes]) => [
+    sayOf(SINCE, since), sayOf(GROWN, kind), share, kind === 'type' ? typeName(name) : name, bytes,
+    files]);
+  return table([['since', 'text'], ['kind', 'text'], ['share', 'text'], ['name', 'name'],
+                ['grown', 'change'], ['filesGrown', 'countChange']],
+               rows, {caption: data.heading, csv: data.csv});
+}
+
 export const REPORTS = {
   volume_usage: {
     always: true,
@@ -191,6 +206,11 @@ export const REPORTS = {
             rowsOf(data).map(([volume, share, files, bytes, allocated, unreadable, other]) => [
               format.volumeName(volume), share, bytes, allocated, files, unreadable, other]),
             {caption: data.heading, csv: data.csv})]
+  },
+  growth: {
+    empty: facts => facts.volumes.some(volume => volume.grown_by) ? 'nothingGrew' :
+      'nothingToCompare',
+    show: data => [growthTable(data)]
   }
 };
 for (const {name, variable, columns, has_csv_rows: hasCsv} of FORMATS) {
@@ -200,17 +220,18 @@ for (const {name, variable, columns, has_csv_rows: hasCsv} of FORMATS) {
 const note = (key, values) => h('p', {class: 'note'}, format.say(key, values));
 
 // What is said of a report without a block.
-function absence({always, missing}, known, emptyReports) {
-  return missing ?? (always ? 'missing' : known ? (known.rows ? 'missing' : 'noRows') :
+function absence({always, missing, empty}, facts, known, emptyReports) {
+  return missing ?? (always ? 'missing' :
+    known ? (known.rows ? 'missing' : empty?.(facts) ?? 'noRows') :
     {none: 'missing', all: 'noRows', some: 'unclear'}[emptyReports]);
 }
 
 // What the section says besides its rows: of failure, damage, a cut, and of nothing to show.
-// `known`: the facts about the report, if any.
-function notesOf(report, data, known, emptyReports) {
+// `facts`: those of the run, and `known`: those about the report, if any.
+function notesOf(report, data, facts, known, emptyReports) {
   const notes = known?.ok === false ? [note('failed')] : [];
   if (!data) {
-    return notes.length ? notes : [note(absence(report, known, emptyReports))];
+    return notes.length ? notes : [note(absence(report, facts, known, emptyReports))];
   }
   const rows = rowsOf(data).length;
   const count = format.number(rows);
@@ -246,7 +267,7 @@ export function fillSection(section, name, {data, facts, emptyReports, mark}) {
   section.replaceChildren(
     h('h2', {id: `${name}-heading`}, name === 'volume_usage' ? format.say('history') : heading,
       mark && levelElement(mark, false)),
-    ...report ? notesOf(report, data, known, emptyReports) : [note('unknown')],
+    ...report ? notesOf(report, data, facts, known, emptyReports) : [note('unknown')],
     ...data && rowsOf(data).length ? report.show({...data, heading, csv}, facts).filter(Boolean) :
       []);
   for (const title of section.querySelectorAll('.title')) {

@@ -15,6 +15,13 @@ export function sizeElement(bytes, tabindex = 0) {
            format.size(bytes));
 }
 
+function changeElement(bytes) {
+  const exact = format.isSigned(bytes) ? format.exactSize(bytes) : undefined;
+  return exact === undefined ? h('span', {}, format.UNKNOWN) :
+    h('span', {class: 'bytes', tabindex: -1, title: exact, 'data-exact': exact},
+      format.sizeChange(bytes));
+}
+
 function barElement(share, content) {
   const bar = h('span', {class: 'bar', 'aria-hidden': 'true'});
   bar.style.inlineSize = `${Math.max(0, Math.min(100, share || 0))}%`;
@@ -43,6 +50,7 @@ function pathElement(path) {
 
 // A number to compare, or NaN for what is shown as unknown.
 const known = text => format.isNumber(text) ? Number(text) : NaN;
+const signed = text => format.isSigned(text) ? Number(text) : NaN;
 
 // How each kind of column is written, compared and looked for.
 const KINDS = {
@@ -59,6 +67,10 @@ const KINDS = {
     text: value => value === '0' ? format.say('noLimit') : format.size(value)
   },
   count: {number: true, key: known, cell: format.number, text: format.number},
+  change: {
+    number: true, key: signed, cell: value => changeElement(value), text: format.sizeChange
+  },
+  countChange: {number: true, key: signed, cell: format.numberChange, text: format.numberChange},
   percent: {
     number: true,
     key: value => parseFloat(value),
