@@ -149,13 +149,11 @@ int32_t growth(ReportArgs* args) {
     REPORT_LOG_ERR_NESTED(kModule, __LINE__, "Bad Parameter");
     return -1;
   }
+  // Without the snapshots the page and the CSV file have no rows, and the report has failed.
   std::optional<Growth> found = compare(*args, report_list);
-  if (!found) {
-    return -1;
-  }
-  const int32_t result = write_rows(rows_of(*found), csv_dir);
+  const int32_t result = write_rows(rows_of(found.value_or(Growth())), csv_dir);
   run_facts().growth = std::move(found);
-  return result;
+  return run_facts().growth ? result : -1;
 }
 
 }  // namespace vornreport

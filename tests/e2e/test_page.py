@@ -4,6 +4,7 @@ import os
 import shutil
 import subprocess
 import tempfile
+import time
 from pathlib import Path
 
 from expected import Tree
@@ -36,9 +37,13 @@ class Page(ProductTest):
         self.addCleanup(folder.cleanup)
         self.pages = Path(folder.name)
 
-    def make(self, name, **keys):
-        """Has the machine's report made, as the page `name`."""
+    def make(self, name, grow=None, **keys):
+        """Has the machine's report made, as the page `name`; of its growth since before `grow`."""
         self.m.profile(name, report_list=ALL, volume_history='true', **keys)
+        if grow:
+            self.m.run('--report', name)
+            grow()
+            time.sleep(1.1)  # reports are called by the second
         run = self.m.run('--report', name)
         self.assertEqual((run.status, self.m.status(name)), (0, 'success'), run.log_lines)
         shutil.copytree(self.m.report_folders(name)[-1], self.pages / name)
@@ -48,11 +53,16 @@ class Page(ProductTest):
         return run.log_lines
 
     def test_in_the_browser(self):
-        Server(self.m, self).history()
+        server = Server(self.m, self)
+        server.history()
         mails = MailServer(self, self.m.base / 'mails')
-        self.make('big', limit_user='anna,john-doe,chen', mail_to='admin@files.example',
+
+        def grow():
+            server.add(server.root / 'media/Photos', 'to sort/new.raw', 3 << 30, 3001, 0)
+            next((server.root / 'media/Videos').rglob('*.mp4')).unlink()
+        self.make('big', grow, limit_user='anna,john-doe,chen', mail_to='admin@files.example',
                   smtp_url=f'smtp://127.0.0.1:{mails.port}')
-        mail, = mails.mails()
+        _, mail = mails.mails()
         (self.pages / 'big/mail.txt').write_text(
             mail['subject'] + '\n' + mail.get_body(('plain',)).get_content())
 
@@ -70,7 +80,7 @@ class Page(ProductTest):
         folder = self.m.base / 'shares' / SHARE
         (self.pages / 'names.json').write_text(json.dumps(
             [[f'{folder}/{name}', f'{folder}/{shown or name}'] for name, shown in NAMES.items()]))
-        self.make('hostile', limit_user='john-doe,007', duplicate_compare='true', language='xx')
+        self.make('hostile', lambda: tree.add('docs', "it's\nnew", b'plan'), limit_user='john-doe,007', duplicate_compare='true', language='xx')
 
         # No history can be read or written, and there is no quota tool.
         make_files(self.m.share('docs'), {'a.odt': 7})

@@ -80,15 +80,16 @@ test('reports that failed say so, and empty ones that nothing was found', async 
   const short = ['There are only samples of a single day yet. Each report and each run with --data global adds one.'];
   const [quotas] = CASES['no quotas'][3];
   for (const [name, expected] of [
-    ['broken', {quota_usage: [quotas], duplicate_file: nothing, least_modify: nothing}],
+    ['broken', {quota_usage: [quotas], duplicate_file: nothing, least_modify: nothing, growth: nothing}],
     ['empty', {...Object.fromEntries(ALL.map(report => [report, nothing])), quota_usage: [quotas],
                volume_usage: [], folder_usage: undefined, coverage: undefined}]]) {
     const bare = withBlock(pageOf(name), FORMAT.facts_variable, '');
-    for (const [page, usage] of [[pageOf(name), short], [bare, []]]) {
+    const first = ['There is no earlier report to compare with yet. What has grown is told from the next report on.'];
+    for (const [page, usage, growth] of [[pageOf(name), short, first], [bare, [], nothing]]) {
       await t.test(name, () => withPage(page, async view => {
         await choose(view, 'en');
         for (const [report, {notes, rows}] of Object.entries(await sections(view))) {
-          assert.deepEqual(notes, report === 'volume_usage' ? usage : expected[report] ?? [], report);
+          assert.deepEqual(notes, {volume_usage: usage, growth}[report] ?? expected[report] ?? [], report);
           assert.equal(rows.length > 0, report === 'volume_usage' || !expected[report], report);
         }
         await assertSensible(view);

@@ -2,7 +2,7 @@
 import assert from 'node:assert/strict';
 import test from 'node:test';
 
-import {FORMAT, read, section, textOf, withBlock, withPage} from './browser.mjs';
+import {fileOf, FORMAT, read, section, textOf, withBlock, withPage} from './browser.mjs';
 import {pageOf} from './facts.mjs';
 
 const shares = withBlock(read('hostile'), 'vornShareListData', `[\n${[
@@ -45,6 +45,17 @@ test('filtering, and all rows', () => withPage(pageOf('big'), async page => {
   assert.deepEqual(await page.$$eval('a.csv', all => all.map(each => each.getAttribute('href')).sort()), FORMAT.reports
     .filter(report => report.has_csv_rows).map(({name}) => `csv/${name}.csv`).sort());
 }));
+
+test('growth has its sign, and is told where there is something to compare with', async () => {
+  await withPage(fileOf('big'), async page => {
+    const rows = (await textOf(page, '#growth tbody tr')).map(row => row.replace(/\s+/g, ' ').trim());
+    assert.ok(rows.some(row => /^last report Share Photos \+3 GiB \+1$/.test(row)), rows.join('\n'));
+    assert.ok(rows.some(row => /^last report Share Videos \u2212[\d.]+ \w+ \u22121$/.test(row)), rows.join('\n'));
+    assert.ok(rows.some(row => /^last report File type Videos Video \u2212/.test(row)), rows.join('\n'));
+    assert.match((await textOf(page, '#attention')).join(), /\/srv\/media grew by [\d.]+\sGiB since .*, mostly Photos\/to sort, mostly by anna/);
+  });
+  await withPage(fileOf('empty'), async page => assert.match((await section(page, 'growth')).notes[0], /keinen früheren Bericht/));
+});
 
 test('sizes tell their bytes to the keyboard', () => withPage(shares, async page => {
   const [share, , volume] = await page.locator('#share_list thead button').all();

@@ -122,7 +122,7 @@ function growthTable(data) {
   const rows = rowsOf(data).map(([since, kind, share, name, files, bytes]) => [
     sayOf(SINCE, since), sayOf(GROWN, kind), share, kind === 'type' ? typeName(name) : name, bytes,
     files]);
-  return table([['since', 'text'], ['kind', 'text'], ['share', 'text'], ['name', 'name'],
+  return table([['since', 'text'], ['kind', 'text'], ['share', 'name'], ['name', 'text'],
                 ['grown', 'change'], ['filesGrown', 'countChange']],
                rows, {caption: data.heading, csv: data.csv});
 }
