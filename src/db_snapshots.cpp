@@ -1,7 +1,6 @@
 #include "db_snapshots.hpp"
 
 #include <cstdlib>
-#include <utility>
 
 #include "facts/run_facts.hpp"
 #include "history_db.hpp"
@@ -112,7 +111,7 @@ std::optional<Snapshot> checked(std::optional<Snapshot> set, int64_t time) {
 }
 
 // The set keeps what it has, but for its smaller folders.
-void cut(Snapshots& history, int64_t time, SnapshotText text) {
+void cut(Snapshots& history, int64_t time, const SnapshotText& text) {
   std::optional<Snapshot> set = checked(snapshot_of(time, text), time);
   if (!set) {
     history.run("DELETE FROM Snapshot" + history.own() + at(time));
@@ -139,7 +138,7 @@ void thin_out(Snapshots& history, int64_t now) {
                  [&](const auto& column) {
                    text = {column("summary"), column("details")};
                  });
-    cut(history, time, std::move(text));
+    cut(history, time, text);
   }
 }
 

@@ -28,6 +28,7 @@ class Growth(ProductTest):
 
     def database(self, sql, *values):
         with sqlite3.connect(self.m.vorn / 'etc/vornreport.db') as db:
+            db.text_factory = lambda text: text.decode(errors='surrogateescape')
             rows = db.execute(sql, values).fetchall()
         db.close()
         return rows
@@ -123,6 +124,8 @@ class Growth(ProductTest):
         folder = self.m.report_folders('p')[-1]
         self.assertNotIn(b'anna', (folder / 'report.json').read_bytes() + (
             folder / 'csv/growth.csv').read_bytes())
+        (details,), = self.database('SELECT details FROM Snapshot ORDER BY time DESC LIMIT 1')
+        self.assertNotIn('anna', details)
 
     def test_runs_that_leave_none(self):
         make_files(self.top / 'one', {'1': 1})

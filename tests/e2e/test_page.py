@@ -59,7 +59,8 @@ class Page(ProductTest):
 
         def grow():
             server.add(server.root / 'media/Photos', 'to sort/new.raw', 3 << 30, 3001, 0)
-            next((server.root / 'media/Videos').rglob('*.mp4')).unlink()
+            min((server.root / 'media/Videos').rglob('*.mp4'),
+                key=lambda path: path.stat().st_size).unlink()
         self.make('big', grow, limit_user='anna,john-doe,chen', mail_to='admin@files.example',
                   smtp_url=f'smtp://127.0.0.1:{mails.port}')
         _, mail = mails.mails()

@@ -1,6 +1,7 @@
 // Snapshots, what grew between two of them, and which of them stay in the history.
 #include "facts/growth.hpp"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -8,6 +9,7 @@
 #include "db_snapshots.hpp"
 #include "facts/growth_facts.hpp"
 #include "facts/run_facts.hpp"
+#include "facts/tallies.hpp"
 #include "fixture.hpp"
 #include "history_db.hpp"
 #include "vorn/paths.h"
@@ -86,6 +88,26 @@ TEST_F(GrowthTest, DamagedTextsAreNone) {
     EXPECT_FALSE(snapshot_of(0, {summary, details})) << summary << details;
   }
   EXPECT_TRUE(snapshot_of(0, {"1\nz\tunknown\nnor this\n", "1\n"}));
+}
+
+TEST_F(GrowthTest, NamesAreKeptOnlyWhereTheyMayBeTold) {
+  struct stat status {};
+  status.st_uid = 7;
+  tallies().clear();
+  tallies().begin_share("a", "/srv/a", kNow);
+  tallies().file({"a", "/srv/a/1", "1", "image", &status}, RowSource::kWalk);
+  tallies().end_share();
+  const auto details = [](const char* report_list) {
+    return to_text(take_snapshot(run_facts(), tallies(), report_list)).details;
+  };
+  EXPECT_EQ(details("file_owner,share_list"), "1\ns\ta\t1\nv\t/\n");  // nobody noted the names
+  run_facts().owners = {{7, "anna"}};
+  run_facts().limit_user = {"anna"};
+  EXPECT_EQ(details("file_group"),
+            "1\nO\tanna,\nT\ns\ta\t1\nv\t/\no\tanna\t1\t0\nt\timage\t1\t0\n");
+  record_incident("users_unknown", "7", "said", AlreadyLogged::kYes);
+  EXPECT_EQ(details(""), "1\ns\ta\t1\nv\t/\n");
+  tallies().clear();
 }
 
 TEST_F(GrowthTest, Bases) {
