@@ -117,15 +117,19 @@ class Growth(ProductTest):
         self.assertEqual([(entry['values']['place'], entry['values']['owner']) for entry in said],
                          [('one/a/b', 'anna')])
 
-        # Who may no longer be told of isn't told of by an older set either.
-        self.m.config.write_text(self.m.config.read_text() + 'limit_user = bjoern\n')
-        time.sleep(1.1)
-        self.assertSucceeded(self.m.run('--report', 'p'), 'p')
-        folder = self.m.report_folders('p')[-1]
-        self.assertNotIn(b'anna', (folder / 'report.json').read_bytes() + (
-            folder / 'csv/growth.csv').read_bytes())
-        (details,), = self.database('SELECT details FROM Snapshot ORDER BY time DESC LIMIT 1')
-        self.assertNotIn('anna', details)
+        # Who may no longer be told of, or is gone, isn't told of by an older set either.
+        passwd = self.m.base / 'passwd'
+        for file, text in ((passwd, passwd.read_text().replace('anna:x:3001:0::/:/bin/sh\n', '')),
+                           (passwd, passwd.read_text()),
+                           (self.m.config, self.m.config.read_text() + 'limit_user = bjoern\n')):
+            file.write_text(text)
+            time.sleep(1.1)
+            self.assertEqual(self.m.run('--report', 'p').status, 0)
+            folder = self.m.report_folders('p')[-1]
+            told = (folder / 'report.json').read_bytes() + (folder / 'csv/growth.csv').read_bytes()
+            (details,), = self.database('SELECT details FROM Snapshot ORDER BY time DESC LIMIT 1')
+            is_told = file == passwd and 'anna' in text
+            self.assertEqual((b'anna' in told, 'anna' in details), (is_told, is_told))
 
     def test_runs_that_leave_none(self):
         make_files(self.top / 'one', {'1': 1})
