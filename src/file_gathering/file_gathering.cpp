@@ -1,5 +1,7 @@
 #include "file_gathering.hpp"
 
+#include <malloc.h>
+
 #include <cerrno>
 #include <cstdio>
 #include <string>
@@ -180,6 +182,7 @@ int file_gathering(const char* profile, const VLIBCSzHash* profile_hash) {
       ++walked;
     }
   }
+  malloc_trim(0);  // what the walk's threads have left is room for the reports' sorting
   report_trace(kGatheringModule, __LINE__, "stat complete\n\n");
   std::fflush(nullptr);
   return walked;

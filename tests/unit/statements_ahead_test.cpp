@@ -117,7 +117,8 @@ TEST_F(StatementsAheadTest, ChangeNoReport) {
   platform.volume_ids = {{"/v", "volume"}};
   for (int i = 0; i < 20'000; ++i) {
     add(db_.get(), i % 2 != 0 ? "s" : "t", "f" + std::to_string(i / 3), i / 3 * 7919 % 10'007,
-        static_cast<uid_t>(i % 3), std::time(nullptr) - i * 600, i % 5 != 0 ? "doc" : "image");
+        static_cast<uid_t>(i % 3), std::time(nullptr) - i * 600 - 300,
+        i % 5 != 0 ? "doc" : "image");
   }
   sqlite3_exec(db_.get(), "COMMIT", nullptr, nullptr, nullptr);
   for (const auto& [hash, key] : {std::pair(&users_, "ann"), {&volumes_, "s"}, {&shares_, "s"}}) {
