@@ -91,7 +91,11 @@ void tell_failing_service(int error) {
 template <typename Ask>
 Found ask_name_service(Ask ask) {
   constexpr std::size_t kLargestBuffer = std::size_t{1} << 20;
-  constexpr int kMostTries = 2;  // a source that failed for a moment reads as "unknown", too
+  // A source that failed for a moment reads as "unknown", too, so such an answer is asked for
+  // again; but not without end, where there are hundreds of thousands of strangers.
+  constexpr int kMostTries = 2;
+  constexpr int kMostDoubted = 1000;
+  static int doubted = 0;
   const ErrnoKeeper keeper;  // a name service probes sockets that needn't exist
   const long hint = sysconf(_SC_GETPW_R_SIZE_MAX);
   std::vector<char> buffer(hint > 0 ? static_cast<std::size_t>(hint) : 1024);
@@ -104,7 +108,7 @@ Found ask_name_service(Ask ask) {
     }
     if (error == ERANGE && buffer.size() < kLargestBuffer) {
       buffer.resize(buffer.size() * 2);
-    } else if (tries++ == kMostTries) {
+    } else if (tries++ == kMostTries || (means_unknown(error) && doubted++ >= kMostDoubted)) {
       error = means_unknown(error) ? accounts_file_error() : error;
       if (error != 0) {
         tell_failing_service(error);
