@@ -106,7 +106,7 @@ class Quotas(ProductTest):
             return "cat <<'END'\n" + head + ''.join(
                 f'{user} -- {used} {soft}{tail}' for user, used, soft in rows) + 'END\n'
         many = [(user, i * 37 % 50, i % 3 * 100) for i, user in enumerate(MANY)]
-        strangers = [(f'#{i}', i, 20) for i in range(200_000)]
+        strangers = [(f'#{i}', i, 20) for i in range(100_000)]
         for name, script, rows, message in (
                 ('users', cat(users), users, ''),
                 ('nothing used', cat(users[-1:]), users[-1:], ''),

@@ -108,8 +108,10 @@ Found ask_name_service(Ask ask) {
     }
     if (error == ERANGE && buffer.size() < kLargestBuffer) {
       buffer.resize(buffer.size() * 2);
-    } else if (tries++ == kMostTries || (means_unknown(error) && doubted++ >= kMostDoubted)) {
-      error = means_unknown(error) ? accounts_file_error() : error;
+    } else if (tries++ == kMostTries || (means_unknown(error) && ++doubted > kMostDoubted)) {
+      if (means_unknown(error)) {
+        error = doubted < kMostDoubted ? accounts_file_error() : 0;
+      }
       if (error != 0) {
         tell_failing_service(error);
       }

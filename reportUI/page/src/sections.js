@@ -198,6 +198,11 @@ export const REPORTS = {
         rowsOf(data).map(([share, age, files, bytes]) => [share, ageName(age), bytes, files]),
         {caption: format.nameOf('columns', 'share')}))]
   },
+  growth: {
+    empty: facts => facts.volumes.some(volume => volume.grown_by) ? 'nothingGrew' :
+      'nothingToCompare',
+    show: data => [growthTable(data)]
+  },
   coverage: {
     show: (data, facts) => [
       ...facts ? explainedTable(facts) : [],
@@ -206,11 +211,6 @@ export const REPORTS = {
             rowsOf(data).map(([volume, share, files, bytes, allocated, unreadable, other]) => [
               format.volumeName(volume), share, bytes, allocated, files, unreadable, other]),
             {caption: data.heading, csv: data.csv})]
-  },
-  growth: {
-    empty: facts => facts.volumes.some(volume => volume.grown_by) ? 'nothingGrew' :
-      'nothingToCompare',
-    show: data => [growthTable(data)]
   }
 };
 for (const {name, variable, columns, has_csv_rows: hasCsv} of FORMATS) {
