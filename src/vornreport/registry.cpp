@@ -2,8 +2,8 @@
 //   1. Add its format to kReports of report_format/reports.hpp, at the place it shall have on the
 //      page: name, variable and limits, which page and vornctl take from there.
 //   2. Write src/rep_<name>.cpp: a StatisticsReport record, its report function and the function
-//      that names its statement; a ListedReport for one whose rows gathering has counted; for others
-//      a report function of their own.
+//      that names its statement; a ListedReport for one whose rows gathering has counted; for
+//      others a report function of their own.
 //   3. Add its line to kRegistry below, at the same place.
 //   4. Add its section to the page: one entry in reportUI/page/src/sections.js, and its texts in
 //      the dictionaries of reportUI/template/lang.

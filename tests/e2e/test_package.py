@@ -231,7 +231,7 @@ class Package(unittest.TestCase):
             path.chmod(0o700)
             shutil.chown(path, 'nobody')
         shutil.chown(elsewhere, group='users')
-        elsewhere.chmod(0o2770)
+        elsewhere.chmod(0o2750)
         self.configure('share.conf', '[mine]\npath = /home/share\n')
         port = self.serve_mail(self.base / 'mails')
         self.configure('vornreport.conf', (

@@ -409,8 +409,9 @@ TEST(FactsFile, HasEveryKey) {
             "used ");
   EXPECT_EQ(keys(json["volumes"][0]["forecast"]),
             "days days_high days_low jump per_day state window ");
-  EXPECT_EQ(keys(json["shares"][0]),
-            "allocated bytes files folders grown index name other path samples unreadable volume whole ");
+  EXPECT_EQ(
+      keys(json["shares"][0]),
+      "allocated bytes files folders grown index name other path samples unreadable volume whole ");
   EXPECT_EQ(keys(json["quotas"][0]), "forecast level percent quota used user volume ");
   EXPECT_TRUE(json["volumes"][0]["explained"].is_null());
   EXPECT_EQ(json["duplicates"]["mode"], "content");

@@ -16,9 +16,9 @@ extern "C" {
 #endif
 
 // Prepares the process once and then costs nothing: open descriptors 0 to 2, a clean environment
-// for children, the C.UTF-8 locale for them, umask 027, SQLite configured for connections that belong
-// to one thread each and without memory statistics, and as many file handles as a folder tree can be
-// deep. To be called before the first thread begins.
+// for children, the C.UTF-8 locale for them, umask 027, SQLite configured for connections that
+// belong to one thread each and without memory statistics, and as many file handles as a folder
+// tree can be deep. To be called before the first thread begins.
 void VornQazSetEnv(void);
 
 // --- Profiles -----------------------------------------------------------------------------------
