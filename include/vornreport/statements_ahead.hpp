@@ -16,9 +16,11 @@ namespace vornreport {
 class StatementsAhead {
  public:
   // Begins `statements` over the database at `path`, in the order in which they will be asked for;
-  // one that is passed over is given up. Their texts outlive the object. Without a path nothing is
-  // begun. Says nothing: one that can't be begun is run when it is asked for.
-  StatementsAhead(const char* path, std::span<const char* const> statements);
+  // one that is passed over is given up. `longest`, one of them or null, begins before all others.
+  // Their texts outlive the object. Without a path nothing is begun. Says nothing: one that can't
+  // be begun is run when it is asked for.
+  StatementsAhead(const char* path, std::span<const char* const> statements,
+                  const char* longest = nullptr);
   // Stops what nobody has asked for, and waits for the end of all threads.
   ~StatementsAhead();
   StatementsAhead(const StatementsAhead&) = delete;

@@ -99,12 +99,21 @@ bool found_no_quotas(std::string_view name) {
          run_facts().quotas->users().empty() && !report_data_lost();
 }
 
-// What the selected reports are going to ask the statistics database, in their order.
-std::vector<const char*> statements_of(const VLIBCSzHash* profile_hash, const char* report_list) {
-  std::vector<const char*> statements;
+// What the selected reports are going to ask the statistics database.
+struct Statements {
+  std::vector<const char*> in_order;
+  const char* longest = nullptr;  // takes as long as all others together
+};
+
+Statements statements_of(const VLIBCSzHash* profile_hash, const char* report_list) {
+  Statements statements;
   for (const ReportEntry& entry : report_registry()) {
-    if (entry.statement != nullptr && is_selected(entry, report_list)) {
-      statements.push_back(entry.statement(profile_hash));
+    if (entry.statement == nullptr || !is_selected(entry, report_list)) {
+      continue;
+    }
+    statements.in_order.push_back(entry.statement(profile_hash));
+    if (std::string_view(entry.name) == report_format::kDuplicateFile.name) {
+      statements.longest = statements.in_order.back();
     }
   }
   return statements;
@@ -113,8 +122,9 @@ std::vector<const char*> statements_of(const VLIBCSzHash* profile_hash, const ch
 // The number of reports run minus one.
 int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
                          const char* report_list, const LookUps& look_ups) {
-  const StatementsAhead ahead(set_value(profile_hash, "real_path_stat_db"),
-                              statements_of(profile_hash, report_list));
+  const Statements statements = statements_of(profile_hash, report_list);
+  const StatementsAhead ahead(set_value(profile_hash, "real_path_stat_db"), statements.in_order,
+                              statements.longest);
   int result = -1;
   for (const ReportEntry& entry : report_registry()) {
     if (!is_selected(entry, report_list)) {

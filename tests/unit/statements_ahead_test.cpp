@@ -84,7 +84,8 @@ TEST_F(StatementsAheadTest, AreSeenAsThoseRunWhenAskedFor) {
   for (const auto& c : cases) {
     statements.push_back(c.sql.c_str());
   }
-  const StatementsAhead ahead(path().c_str(), statements);
+  const char* longest = cases[6].sql.c_str();
+  const StatementsAhead ahead(path().c_str(), statements, longest);
   for (const auto& [sql, stop] : cases) {
     const std::string expected = seen(sqlite3_exec, db_.get(), sql, stop);
     const std::string got = seen(run_statement, nullptr, sql, stop);
@@ -134,7 +135,8 @@ TEST_F(StatementsAheadTest, ChangeNoReport) {
           statements.push_back(entry.statement(profile_.get()));
         }
       }
-      const StatementsAhead ahead(are_ahead ? path().c_str() : nullptr, statements);
+      const StatementsAhead ahead(are_ahead ? path().c_str() : nullptr, statements,
+                                  statements.back());
       std::string text;
       for (const ReportEntry& entry : report_registry()) {
         if (entry.statement != nullptr) {

@@ -66,10 +66,10 @@ void configure_sqlite() {
   // Every connection belongs to one thread.
   sqlite3_config(SQLITE_CONFIG_MULTITHREAD);
   sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);
-  // Pages (8 MiB) that a sort gathers before it writes them out: with the default of a quarter of
-  // that, ten million rows are merged in one level more.
-  constexpr unsigned kSortedRun = 2000;
-  sqlite3_config(SQLITE_CONFIG_PMASZ, kSortedRun);
+  // What a sort gathers before it writes it out is as large as the page cache (2 MiB), whatever the
+  // size of a page is: it should fit into the processor's caches.
+  constexpr unsigned kLeastPagesOfSortedRun = 64;
+  sqlite3_config(SQLITE_CONFIG_PMASZ, kLeastPagesOfSortedRun);
 #ifndef VORN_HOST_ASAN  // the sanitizer sees errors in blocks of the system allocator only
   sqlite3_config(SQLITE_CONFIG_MALLOC, &host::sqlite_memory);
 #endif
