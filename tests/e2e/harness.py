@@ -12,6 +12,7 @@ import re
 import shutil
 import signal
 import socket
+import sqlite3
 import subprocess
 import tempfile
 import threading
@@ -21,7 +22,7 @@ from pathlib import Path
 
 ROOT = Path(__file__).resolve().parents[2]
 BUILD = Path(os.environ.get('VORN_BUILD', ROOT / 'build'))
-PROGRAM = '/usr/vorn/bin/vornreport'
+PROGRAM, CTL = '/usr/vorn/bin/vornreport', '/usr/vorn/bin/vornctl'
 SCRIPTS = 'usr/vorn/vornreport/reportUI'
 FORMAT = json.loads((BUILD / 'report_format.json').read_text())
 ALL = ','.join(report['name'] for report in FORMAT['reports'])  # the whole list of reports
@@ -64,14 +65,14 @@ class Run:
         self.process = subprocess.Popen(machine.sandbox(log) + ['--', *command],
                                         stdin=subprocess.DEVNULL, **streams)
 
-    def pid(self):
+    def pid(self, program='vornreport'):
         """Waits for the program: the sandbox's only child. Its process id."""
         path = f'/proc/{self.process.pid}/task/{self.process.pid}/children'
 
         def find():
             for pid in Path(path).read_text().split():
                 try:
-                    if os.readlink(f'/proc/{pid}/exe').endswith('/vornreport'):
+                    if os.readlink(f'/proc/{pid}/exe').endswith(f'/{program}'):
                         return int(pid)
                 except FileNotFoundError:
                     pass  # a short-lived child of the sandbox script
@@ -127,12 +128,30 @@ class Machine:
         self.options = []  # for the sandbox, besides those for the folders above
         self._logs = 0
 
-    def share(self, name, path=None):
+    def share(self, name, path=None, inside=False):
+        """A share, whose folder is made, unless the sandbox alone has it."""
         folder = Path(path or self.base / 'shares' / name)
-        folder.mkdir(parents=True, exist_ok=True)
+        if not inside:
+            folder.mkdir(parents=True, exist_ok=True)
         with self.shares.open('ab') as file:
             file.write(f'[{name}]\npath = {folder}\n'.encode())
         return folder
+
+    def history(self, sql, *values):
+        """The rows that a statement gives on the history database."""
+        with sqlite3.connect(self.vorn / 'etc/vornreport.db') as db:
+            db.text_factory = lambda text: text.decode(errors='surrogateescape')
+            rows = db.execute(sql, values).fetchall()
+        db.close()
+        return rows
+
+    def samples(self, rows):
+        """Makes the history database with samples: profile, volume, used, free, percent, date."""
+        with sqlite3.connect(self.vorn / 'etc/vornreport.db') as db:
+            db.executescript((self.vorn / 'vornreport/sql/vornreport.sql').read_text())
+            db.executemany('INSERT INTO VolumeUsage VALUES (?, ?, ?, ?, ?, ?)',
+                           [tuple(map(str, row)) for row in rows])
+        db.close()
 
     def profile(self, name, **keys):
         keys = {'report_dir': self.reports} | keys
@@ -240,6 +259,39 @@ class ProductTest(unittest.TestCase):
         folders = self.m.report_folders(profile)
         self.assertRegex(folders[-1].name, r'^\d{4}-\d\d-\d\d_\d\d-\d\d-\d\d')
         return folders[-1]
+
+
+class CtlTest(ProductTest):
+    def ctl(self, *arguments, log=None):
+        run = Run(self.m, [CTL, *arguments], log).finish()
+        self.assertNotIn('terminate called', run.err)
+        return run
+
+    def check(self, arguments, status=0, err='', out=''):
+        run = self.ctl(*arguments)
+        self.assertEqual(run.status, status, run.out + run.err)
+        self.assertRegex(run.out, f'^{out}$')
+        self.assertRegex(run.err, f'^vornctl: .*{err}.*\n$' if err else '^$')
+
+
+def call(*command, **options):
+    """What a command prints, which must succeed."""
+    done = subprocess.run(list(map(str, command)), stdin=subprocess.DEVNULL, text=True,
+                          stdout=subprocess.PIPE, stderr=subprocess.STDOUT, **options)
+    assert done.returncode == 0, f'{command}: {done.returncode}\n{done.stdout}'
+    return done.stdout
+
+
+def mount_image(test, folder, size, *features, options='loop'):
+    """Mounts a new ext4 of `size` bytes as `folder`, until the test ends; its device."""
+    image = folder.with_suffix('.image')
+    folder.mkdir(parents=True)
+    with image.open('wb') as file:
+        file.truncate(size)
+    call('mkfs.ext4', '-q', *features, image)
+    call('mount', '-o', options, image, folder)
+    test.addCleanup(call, 'umount', folder)
+    return call('findmnt', '-n', '-o', 'SOURCE', folder).strip()
 
 
 def wait_for(condition, what):

@@ -2,11 +2,9 @@
 shares on them, users with quotas, a year of history, duplicates, old files and odd names."""
 import os
 import random
-import sqlite3
-import subprocess
 import time
 
-from harness import private_mounts
+from harness import call, mount_image, private_mounts
 
 GIB = 1 << 30
 DAY = 86400
@@ -29,11 +27,6 @@ ODD = ("</script><script>document.title='run'</script>", '<!--<script>', "'\"><i
        'bytes\udcff\udcc3', 'tab\tand\x1b[31m', '&lt;b&gt;&amp;', '007', "it's 100 %")
 
 
-def call(*command):
-    subprocess.run(list(map(str, command)), check=True, stdout=subprocess.DEVNULL,
-                   stderr=subprocess.DEVNULL)
-
-
 class Server:
     """Fills `machine`, whose /srv it becomes. Needs root; `test` unmounts the volumes again."""
 
@@ -51,16 +44,10 @@ class Server:
         self.quotas()
 
     def mount(self, name, size):
-        folder, image = self.root / name, self.machine.base / f'{name}.image'
-        folder.mkdir(parents=True)
-        with image.open('wb') as file:
-            file.truncate(size * GIB)
-        call('mkfs.ext4', '-q', '-m', '0', '-O', '^quota,^has_journal,^resize_inode', '-T',
-             'largefile4', '-E', 'lazy_itable_init=1,nodiscard', image)
         quota = ',usrquota' if name == 'home' else ''
-        call('mount', '-o', f'loop,noinit_itable{quota}', image, folder)
-        self.test.addCleanup(call, 'umount', folder)
-        device = subprocess.check_output(['findmnt', '-n', '-o', 'SOURCE', folder], text=True).strip()
+        device = mount_image(self.test, self.root / name, size * GIB, '-m', '0', '-O',
+                             '^quota,^has_journal,^resize_inode', '-T', 'largefile4', '-E',
+                             'lazy_itable_init=1,nodiscard', options=f'loop,noinit_itable{quota}')
         self.machine.options += ['--bind', device, device]
 
     def fill(self, volume, gib):
@@ -68,8 +55,7 @@ class Server:
         for i, share in enumerate(SHARES[volume]):
             part = gib * (.5, .26, .16, .08)[i] / sum((.5, .26, .16, .08)[:len(SHARES[volume])])
             folder = self.root / volume / share
-            with self.machine.shares.open('a') as file:
-                file.write(f'[{share}]\npath = /srv/{volume}/{share}\n')
+            self.machine.share(share, f'/srv/{volume}/{share}', inside=True)
             for n in range(70):
                 # Sizes that halve every eight files sum up to some eleven times the first.
                 self.add(folder, self.name(share), int(part * GIB * .083 * .5 ** (n / 8)),
@@ -129,8 +115,4 @@ class Server:
                              f'{use * 100 / size / GIB:f}'[:7], self.now - day * DAY))
         # A volume that is no longer there.
         rows.append(('global', '/srv/retired', 1, 1, '50.0000', self.now - 9 * DAY))
-        with sqlite3.connect(self.machine.vorn / 'etc/vornreport.db') as db:
-            db.executescript((self.machine.vorn / 'vornreport/sql/vornreport.sql').read_text())
-            db.executemany('INSERT INTO VolumeUsage VALUES (?, ?, ?, ?, ?, ?)',
-                           [tuple(map(str, row)) for row in rows])
-        db.close()
+        self.machine.samples(rows)

@@ -1,11 +1,8 @@
 """The command line, its actions and the mail."""
-import email
-import email.policy
 import json
 import re
-import subprocess
 
-from harness import PROGRAM, ROOT, ProductTest, make_files, wait_for
+from harness import PROGRAM, MailServer, ProductTest, make_files, wait_for
 
 
 class CommandLine(ProductTest):
@@ -95,23 +92,17 @@ class Mail(ProductTest):
         files = {'a/same.bin': 3 << 20, 'b/same.bin': 3 << 20, 'c/same.bin': 3 << 20, 'a/x': 5}
         make_files(self.m.share('photos'), files)
         make_files(self.m.share('small'), {'y': 1024})
-        mails = self.m.base / 'mails'
-        mails.mkdir()
-        server = subprocess.Popen([ROOT / 'tests/platform/smtp_server.py', mails],
-                                  stdout=subprocess.PIPE, text=True)
-        self.addCleanup(lambda: (server.kill(), server.communicate()))
+        server = MailServer(self, self.m.base / 'mails')
         self.m.profile('weekly', report_list='volume_usage,share_list,duplicate_file', language='de',
                        keep_reports=1, mail_to='a@example.com',
-                       smtp_url=f'smtp://127.0.0.1:{int(server.stdout.readline())}')
+                       smtp_url=f'smtp://127.0.0.1:{server.port}')
         for _ in range(2):
             folder = self.assertSucceeded(self.m.run('--report', 'weekly'), 'weekly')
         self.assertEqual(self.m.report_folders('weekly'), [folder])
         self.assertEqual(self.m.shell('exec /usr/vorn/bin/vornctl profile test-mail weekly').out,
                          'sent to a@example.com\n')
 
-        first, last, test = (
-            email.message_from_bytes((mails / f'{n}.eml').read_bytes(), policy=email.policy.default)
-            for n in (1, 2, 3))
+        first, last, test = server.mails()
         self.assertIn('Dies ist ein Test', test.get_body(('plain',)).get_content())
         facts = json.loads((folder / 'report.json').read_text())
         # Whatever this machine's own volumes are like.

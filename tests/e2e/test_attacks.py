@@ -7,9 +7,7 @@ import signal
 from pathlib import Path
 
 from expected import data_blocks, facts
-from harness import ALL, PROGRAM, ROOT, ProductTest, Run, make_files, needs_root, wait_for
-
-CTL = '/usr/vorn/bin/vornctl'
+from harness import ALL, CTL, PROGRAM, ROOT, ProductTest, Run, make_files, needs_root, wait_for
 
 
 class Folders(ProductTest):

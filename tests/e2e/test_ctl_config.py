@@ -3,21 +3,12 @@ import json
 import os
 import shutil
 
-from harness import ALL, ProductTest, Run, needs_root
+from harness import ALL, CTL, CtlTest, Run, needs_root
 
-CTL = '/usr/vorn/bin/vornctl'
 SHARES = '# top\n\n# of one\n[one]\n path=/etc ; not a comment\n\n[two]\npath = /usr\n# end'
 
 
-class ControlTest(ProductTest):
-    def ctl(self, *arguments, **options):
-        return Run(self.m, [CTL, *arguments], None, **options).finish()
-
-    def check(self, arguments, status=0, err='', out=''):
-        run = self.ctl(*arguments)
-        self.assertEqual((run.status, run.out), (status, out), run.err)
-        self.assertRegex(run.err, f'^(vornctl: .*{err}.*\n)$' if err else '^$')
-
+class ControlTest(CtlTest):
     def check_table(self, file, before, cases):
         """Each case: arguments, the file after them or None when they are refused with `message`."""
         for arguments, after, message in cases:
@@ -72,11 +63,10 @@ class Shares(ControlTest):
 
     def test_writers_at_once_lose_nothing(self):
         self.m.shares.write_text('')
-        names = [f's{number}' for number in range(12)]
-        runs = [Run(self.m, [CTL, 'share', 'add', name, '/etc'], None) for name in names]
-        self.assertEqual([run.finish().status for run in runs], [0] * len(names))
-        self.assertEqual(sorted(self.m.shares.read_text().replace('\npath = /etc\n', '').split()),
-                         sorted(f'[{name}]' for name in names))
+        runs = [Run(self.m, [CTL, 'share', 'add', f's{n}', '/etc'], None) for n in range(12)]
+        self.assertEqual({run.finish().status for run in runs}, {0})
+        self.assertEqual(set(self.m.shares.read_text().replace('\npath = /etc\n', '').split()),
+                         {f'[s{n}]' for n in range(12)})
 
     def test_full_disk_keeps_the_file(self):
         self.m.options += ['--tmpfs', '8192', '/usr/vorn/etc']
@@ -139,19 +129,15 @@ class Samba(ControlTest):
 
     def test_smb_conf_as_testparm_reads_it(self):
         before = self.m.shares.read_text()
-        arguments = 'share', 'import-samba'
-        self.assertEqual(self.ctl(*arguments, '--dry-run').out.splitlines(),
-                         self.lines(self.decisions, 'would import'))
-        self.assertEqual(self.m.shares.read_text(), before)
-        for decisions, after in (
-                (self.decisions, f'{before}\n[plain]\npath = {self.folder}\n'),
-                ([('skipped', 'plain', 'there is a share of this name already') if name == 'plain'
-                  else (verb, name, text) for verb, name, text in self.decisions],) * 2):
-            run = self.ctl(*arguments)
-            self.assertEqual(run.out.splitlines(), self.lines(decisions), run.err)
-            if isinstance(after, str):
-                first = after
-            self.assertEqual(self.m.shares.read_text(), first)
+        after = f'{before}\n[plain]\npath = {self.folder}\n'
+        again = [('skipped', 'plain', self.decisions[3][2]) if name == 'plain' else (verb, name, text)
+                 for verb, name, text in self.decisions]
+        for option, lines, text in (
+                (['--dry-run'], self.lines(self.decisions, 'would import'), before),
+                ([], self.lines(self.decisions), after), ([], self.lines(again), after)):
+            run = self.ctl('share', 'import-samba', *option)
+            self.assertEqual(run.out.splitlines(), lines, run.err)
+            self.assertEqual(self.m.shares.read_text(), text)
 
     @needs_root  # Samba trusts no other's folder of user shares
     def test_shares_of_users(self):
@@ -245,8 +231,7 @@ class Profiles(ControlTest):
         self.m.profile('p', report_list='share_list', schedule_collect_id='p')
         self.m.share('s')
         job = self.m.cron / 'vornreport-p'
-        run = self.m.run('--report', 'p')
-        report = self.assertSucceeded(run, 'p')
+        report = self.assertSucceeded(self.m.run('--report', 'p'), 'p')
         self.m.stop_at('lang')
         running = self.m.start('--report', 'p')
         self.m.stopped_pid()

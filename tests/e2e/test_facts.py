@@ -3,7 +3,6 @@ import collections
 import json
 import os
 import re
-import sqlite3
 import subprocess
 import time
 
@@ -231,8 +230,7 @@ class Shapes(ProductTest):
         machine = super().new_machine()
         for name in SHAPES:
             machine.options += ['--tmpfs', SIZE, f'/tmp/{name}']
-            with machine.shares.open('a') as file:
-                file.write(f'[{name}]\npath = /tmp/{name}\n')
+            machine.share(name, f'/tmp/{name}', inside=True)
         return machine
 
     def prepare(self):
@@ -246,11 +244,7 @@ class Shapes(ProductTest):
         # Two seconds ago there was a little less.
         used = int(SIZE * SHAPES['flat'][1]) - 500 * 1024
         rows.append(('global', '/tmp/flat', used, SIZE - used, '57.0000', now - 2))
-        with sqlite3.connect(self.m.vorn / 'etc/vornreport.db') as db:
-            db.executescript((self.m.vorn / 'vornreport/sql/vornreport.sql').read_text())
-            db.executemany('INSERT INTO VolumeUsage VALUES (?, ?, ?, ?, ?, ?)',
-                           [tuple(map(str, row)) for row in rows])
-        db.close()
+        self.m.samples(rows)
 
     def run_report(self, command):
         fill = ''.join(f'head -c {int(SIZE * use)} /dev/zero >/tmp/{name}/file 2>/dev/null\n'

@@ -4,13 +4,13 @@ import os
 import re
 import shutil
 import stat
-import subprocess
 import tempfile
 import unittest
 from pathlib import Path
 
 from expected import data_rows
-from harness import BUILD, LIMIT, ROOT, needs_loop_devices, needs_root, private_mounts
+from harness import (BUILD, LIMIT, ROOT, MailServer, call, mount_image, needs_loop_devices,
+                     needs_root, private_mounts)
 
 CGROUPS = [Path('/sys/fs/cgroup', name) for name in ('', 'systemd', 'unified')]
 # The package's own folders, and where the tests put what is theirs.
@@ -20,13 +20,6 @@ PLACES = ('usr/vorn', 'usr/share/vornreport', 'usr/share/doc/vornreport', 'srv',
 RECORDS = re.compile(r'/(var/lib/dpkg/(status|available|lock|triggers)|var/cache/|var/log/)')
 ENVIRONMENT = {'PATH': '/usr/sbin:/usr/bin:/sbin:/bin', 'DEBIAN_FRONTEND': 'noninteractive'}
 PROFILE = 'duplicate_compare = true\nreport_list = duplicate_file,quota_usage,volume_usage\n'
-
-
-def call(*command, **options):
-    done = subprocess.run(list(map(str, command)), stdin=subprocess.DEVNULL, text=True,
-                          stdout=subprocess.PIPE, stderr=subprocess.STDOUT, **options)
-    assert done.returncode == 0, f'{command}: {done.returncode}\n{done.stdout}'
-    return done.stdout
 
 
 @needs_root
@@ -137,28 +130,14 @@ class Package(unittest.TestCase):
 
     def quota_volume(self):
         """A volume with a quota for the user nobody; the options that make it /mnt."""
-        image, volume = self.base / 'image', self.base / 'volume'
-        call('truncate', '--size=16M', image)
-        call('mkfs.ext4', '-q', '-O', '^quota', image)
-        volume.mkdir()
-        call('mount', '-o', 'loop,usrquota', image, volume)
+        volume = self.base / 'volume'
+        device = mount_image(self, volume, 16 << 20, '-O', '^quota', options='loop,usrquota')
         (volume / 'file').write_bytes(b'x' * (8 << 10))
         shutil.chown(volume / 'file', 'nobody')
         call('sync', '-f', volume)
         call('quotacheck', '-cum', volume)
         call('setquota', '-u', 'nobody', 16, 32, 0, 0, volume)
-        device = call('findmnt', '-n', '-o', 'SOURCE', volume).strip()
         return [f'--bind={volume}:/mnt', f'--bind={device}']
-
-    def serve_mail(self, mails):
-        """A mail server on loopback; its port."""
-        mails.mkdir()
-        server = subprocess.Popen(
-            ['/usr/bin/python3', ROOT / 'tests/platform/smtp_server.py', mails],
-            stdout=subprocess.PIPE, text=True)
-        self.addCleanup(server.communicate)
-        self.addCleanup(server.terminate)
-        return int(server.stdout.readline())
 
     def test_lintian(self):
         call('lintian', '--allow-root', '--fail-on', 'error,warning', self.package)
@@ -233,9 +212,9 @@ class Package(unittest.TestCase):
         shutil.chown(elsewhere, group='users')
         elsewhere.chmod(0o2750)
         self.configure('share.conf', '[mine]\npath = /home/share\n')
-        port = self.serve_mail(self.base / 'mails')
+        mails = MailServer(self, self.base / 'mails')
         self.configure('vornreport.conf', (
-            f'[home]\n{PROFILE}mail_to = ann@localhost\nsmtp_url = smtp://localhost:{port}\n'
+            f'[home]\n{PROFILE}mail_to = ann@localhost\nsmtp_url = smtp://localhost:{mails.port}\n'
             f'[elsewhere]\n{PROFILE}report_dir = /srv/elsewhere\n'
             f'[denied]\n{PROFILE}report_dir = /srv\n'))
         own = self.root / 'etc/systemd/system/vornreport@elsewhere.service.d/own.conf'
@@ -262,7 +241,7 @@ systemctl list-timers --no-legend
         for expected in ("['nobody', 16384, 8192, 50.0]", "'/home/share/first', 6", "[ '/mnt', "):
             self.assertIn(expected, text)
         self.assertEqual(len(data_rows(text, 'vornVolumeUsageData')), 2, text[:1000])
-        self.assertEqual(len(list((self.base / 'mails').iterdir())), 1)
+        self.assertEqual(len(mails.mails()), 1)
         page, = elsewhere.glob('elsewhere/*/report.html')
         for path in (page, page.with_name('report.json')):
             self.assertEqual((path.owner(), path.group(), path.stat().st_mode & 0o777),

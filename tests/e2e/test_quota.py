@@ -2,10 +2,10 @@
 import os
 import re
 import struct
-import subprocess
 
 from expected import SCRIPT, data_blocks
-from harness import PROGRAM, ProductTest, needs_loop_devices, private_mounts
+from harness import (PROGRAM, ProductTest, call, mount_image, needs_loop_devices,
+                     private_mounts)
 
 ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002, 'carl': 3003, 'john-doe': 3004}
 MANY = {f'u{i:03}': 4000 + i for i in range(150)}
@@ -54,22 +54,13 @@ class Quotas(ProductTest):
         self.assertEqual(self.m.leftovers(), [])
         return run, data_blocks(self.m.report_folders('q')[-1]), run.out.split('<<<\n')[1]
 
-    def call(self, *command):
-        subprocess.run(list(map(str, command)), check=True, stderr=subprocess.DEVNULL)
-
     @needs_loop_devices
     def test_real_tool(self):
-        volume, image = self.m.base / 'volume', self.m.base / 'image'
-        volume.mkdir()
-        with image.open('wb') as file:
-            file.truncate(16 << 20)
-        self.call('mkfs.ext4', '-q', '-O', '^quota', image)
+        volume = self.m.base / 'volume'
         private_mounts()
-        self.call('mount', '-o', 'loop,usrquota', image, volume)
-        self.addCleanup(self.call, 'umount', volume)
+        device = mount_image(self, volume, 16 << 20, '-O', '^quota', options='loop,usrquota')
         # The tool looks at the device, which the sandbox's own /dev lacks.
-        device = subprocess.check_output(['findmnt', '-n', '-o', 'SOURCE', volume], text=True)
-        self.m.options += ['--bind', device.strip(), device.strip()]
+        self.m.options += ['--bind', device, device]
         # Users under, at, above and without a quota, and one that nobody knows.
         usage = {3001: (600, 1000), 3002: (500, 500), 3003: (700, 650), 3004: (400, 0),
                  UNKNOWN: (900, 1200)}
@@ -77,10 +68,10 @@ class Quotas(ProductTest):
             path = volume / f'file{uid}'
             path.write_bytes(b'x' * (kib << 10))
             os.chown(path, uid, -1)
-        self.call('sync', '-f', volume)
-        self.call('quotacheck', '-cum', volume)
+        call('sync', '-f', volume)
+        call('quotacheck', '-cum', volume)
         for uid, (_, soft) in usage.items():
-            self.call('setquota', '-u', uid, soft, 2 * soft, 0, 0, volume)
+            call('setquota', '-u', uid, soft, 2 * soft, 0, 0, volume)
         run, data, output = self.report_on(
             volume, f"stat -f -c '%S %b %f %a' {volume}\n/sbin/repquota {volume}")
         size, output = output.split('\n', 1)

@@ -1,7 +1,6 @@
 """Volume usage: measuring, the history over many runs, the estimate, page and CSV file."""
 import json
 import re
-import sqlite3
 import time
 
 from expected import MARK, SCRIPT, data_blocks
@@ -19,24 +18,11 @@ class Volumes(ProductTest):
         machine = super().new_machine()
         for i, path in enumerate(VOLUMES):
             machine.options += ['--tmpfs', 8 * MIB, path]
-            with machine.shares.open('a') as file:  # the folder is there in the sandbox only
-                file.write(f'[share{i}]\npath = {path}\n')
+            machine.share(f'share{i}', path, inside=True)
         return machine
 
-    def database(self, script, rows=()):
-        with sqlite3.connect(self.m.vorn / 'etc/vornreport.db') as db:
-            if rows:
-                db.executescript((self.m.vorn / 'vornreport/sql/vornreport.sql').read_text())
-                db.executemany(script, [tuple(map(str, row)) for row in rows])
-            found = rows or db.execute(script).fetchall()
-        db.close()
-        return found
-
-    def store(self, rows):
-        self.database('INSERT INTO VolumeUsage VALUES (?, ?, ?, ?, ?, ?)', rows)
-
     def dates(self):
-        return {int(date) for date, in self.database('SELECT sampleDate FROM VolumeUsage')}
+        return {int(date) for date, in self.m.history('SELECT sampleDate FROM VolumeUsage')}
 
     def run_program(self, *arguments):
         """Fills the volumes, runs the program, and measures the volumes in the same place."""
@@ -67,8 +53,8 @@ class Volumes(ProductTest):
             self.assertEqual(row[3], ('%f' % (row[1] * 100.0 / (row[1] + row[2])))[:7])
 
     def test_collection_and_rotation(self):
-        self.store([(profile, '/some', 1, 2, '33.3333', 1_500_000_000 + 3600 * i)
-                    for i in range(1010) for profile in ('global', 'p1')])
+        self.m.samples([(profile, '/some', 1, 2, '33.3333', 1_500_000_000 + 3600 * i)
+                        for i in range(1010) for profile in ('global', 'p1')])
         self.m.profile('p1', report_list='volume_usage')
         for profile, status in (('p1', 'success'), ('global', 'collect_data')):
             with self.subTest(profile):
@@ -79,8 +65,8 @@ class Volumes(ProductTest):
                 new, = self.dates() - before
                 dates = sorted(before | {new}, reverse=True)
                 self.assertEqual(self.dates(), set(dates) - set(dates[1000:1005]))
-                rows = self.database('SELECT volume, sizeUse, sizeFree, percent, profile FROM '
-                                     f'VolumeUsage WHERE sampleDate = {new}')
+                rows = self.m.history('SELECT volume, sizeUse, sizeFree, percent, profile FROM '
+                                      f'VolumeUsage WHERE sampleDate = {new}')
                 self.assertEqual({row[4] for row in rows}, {profile})
                 self.assertMeasured([(row[0], int(row[1]), int(row[2]), row[3]) for row in rows])
                 self.assertEqual(len({row[0] for row in rows}), len(rows) - 1)  # the two of 31
@@ -96,7 +82,7 @@ class Volumes(ProductTest):
         def sample(volume, used, date, profile='global'):
             return (profile, volume, used, 8 * MIB - used, '%.4f' % (used / 8 / MIB), date)
         start, recently = 1_700_000_000, int(time.time()) - 1000
-        self.store([
+        self.m.samples([
             sample('/tmp/grow', 5 * MIB, recently),  # more than now: passed over
             sample('/tmp/grow', 0, recently - 600_000), sample('/tmp/grow', 2 * MIB, start),
             sample('/tmp/grow', 0, start + 8, 'p1'),  # another profile's
@@ -127,8 +113,8 @@ class Volumes(ProductTest):
         self.assertEqual({row[0]: row[4] for row in rows if row[4] != '0'},
                          {'/tmp/grow': '12', '/tmp/slow': '30'} if history else {})
 
-        known = self.database('SELECT volume, sampleDate, sizeUse, percent FROM VolumeUsage '
-                              'WHERE profile = "global" ORDER BY sampleDate') if history else []
+        known = self.m.history('SELECT volume, sampleDate, sizeUse, percent FROM VolumeUsage '
+                               'WHERE profile = "global" ORDER BY sampleDate') if history else []
         clocks = [re.search(rb"' : \[\n\[ '(\d+)'", part)[1].decode()
                   for part in rest[0].split(b'\n]')[:-1]] if history else [''] * len(rows)
         series, csv_lines, named = [], [], set()
