@@ -22,28 +22,20 @@ class Growth(ProductTest):
         self.accounts = {'root': 0, 'anna': 3001, 'bjoern': 3002}
         self.m.accounts(self.accounts)
         self.top = self.m.base / 'srv'
-        for share in ('one', 'two'):
-            self.m.share(share, self.top / share)
+        self.shares = {name: self.m.share(name, self.top / name) for name in ('one', 'two')}
         self.m.profile('p', report_list=LIST)
 
-    def database(self, sql, *values):
-        with sqlite3.connect(self.m.vorn / 'etc/vornreport.db') as db:
-            db.text_factory = lambda text: text.decode(errors='surrogateescape')
-            rows = db.execute(sql, values).fetchall()
-        db.close()
-        return rows
-
     def times(self, condition='1'):
-        return [time for time, in self.database(
+        return [time for time, in self.m.history(
             f'SELECT time FROM Snapshot WHERE {condition} ORDER BY time')]
 
     def sums(self):
         """Files and bytes by kind, share and name."""
         names = {uid: name for name, uid in self.accounts.items()}
         sums = collections.defaultdict(lambda: [0, 0])
-        for share in sorted(os.listdir(self.top)):
-            for path, folders, files in os.walk(self.top / share):
-                below = os.path.relpath(path, self.top / share)
+        for share, top in self.shares.items():
+            for path, folders, files in os.walk(top):
+                below = os.path.relpath(path, top)
                 parts = [] if below == '.' else below.split('/')
                 above = ['.'] + ['/'.join(parts[:i + 1]) for i in range(len(parts))]
                 for folder in above:
@@ -59,19 +51,24 @@ class Growth(ProductTest):
         return {key: tuple(sum_) for key, sum_ in sums.items()}
 
     def rows(self, bases, now):
+        """The changes in shares that were there at both times."""
         rows = []
         for since, then in bases:
+            both = {key[1] for key in then} & {key[1] for key in now}
             changes = [(*key, *(b - a for a, b in zip(then.get(key, (0, 0)), now.get(key, (0, 0)))))
-                       for key in then.keys() | now.keys()]
+                       for key in then.keys() | now.keys() if key[1] in both]
             rows += sorted(((since, *row) for row in changes if any(row[3:])), key=lambda row: (
                 KINDS.index(row[1]), -abs(row[5]), -abs(row[4]), os.fsencode(row[2]),
                 os.fsencode(row[3])))
         return rows
 
-    def report(self, bases):
+    def report(self, bases, log=''):
         """Runs the report, whose rows must be the changes since `bases`; its facts."""
         time.sleep(1.1)  # its folder and snapshot are called by the second
-        self.assertSucceeded(self.m.run('--report', 'p'), 'p')
+        run = self.m.run('--report', 'p')
+        self.assertRegex(''.join(run.log_lines), f'^{log}\n*$')
+        run.log_lines = []
+        self.assertSucceeded(run, 'p')
         folder = self.m.report_folders('p')[-1]
         now = self.sums()
         rows = self.rows(bases, now)
@@ -88,13 +85,13 @@ class Growth(ProductTest):
         found, first = self.report([])
         self.assertEqual(found['shares'][0]['grown'], {'last': None, 'week': None, 'month': None})
         self.assertEqual({volume['grown_by'] and 0 for volume in found['volumes']}, {None})
-        self.database('UPDATE Snapshot SET time = time - ?', 33 * DAY)
+        self.m.history('UPDATE Snapshot SET time = time - ?', 33 * DAY)
 
         os.rename(self.top / 'one/moves/x', self.top / 'two/x')
         make_files(self.top / 'one', {'a/b/grows.jpg': 400, f'{ODD}/new': 0})
         found, second = self.report([('last', first), ('month', first)])
-        self.database('UPDATE Snapshot SET time = time - ? WHERE time > ?', 8 * DAY,
-                      self.times()[0])
+        self.m.history('UPDATE Snapshot SET time = time - ? WHERE time > ?', 8 * DAY,
+                       self.times()[0])
 
         (self.top / 'one/a/goes').unlink()
         shutil.rmtree(self.top / 'two/deep')
@@ -127,9 +124,36 @@ class Growth(ProductTest):
             self.assertEqual(self.m.run('--report', 'p').status, 0)
             folder = self.m.report_folders('p')[-1]
             told = (folder / 'report.json').read_bytes() + (folder / 'csv/growth.csv').read_bytes()
-            (details,), = self.database('SELECT details FROM Snapshot ORDER BY time DESC LIMIT 1')
+            (details,), = self.m.history('SELECT details FROM Snapshot ORDER BY time DESC LIMIT 1')
             is_told = file == passwd and 'anna' in text
             self.assertEqual((b'anna' in told, 'anna' in details), (is_told, is_told))
+
+    def test_shares_that_come_and_go_and_a_clock_set_back(self):
+        long = 'n' * 255
+        make_files(self.top / 'one', {'a/1': 10, f'{long}/{long}/x': 5, 'sparse': 1 << 40})
+        make_files(self.top / 'two', {'2': 7})
+        os.link(self.top / 'one/a/1', self.top / 'one/a/linked')
+        _, first = self.report([])
+        self.m.history('UPDATE Snapshot SET time = time - ?', 2 * DAY)
+        # One share lies in the other from now on, and one is gone.
+        before = self.m.shares.read_text()
+        self.m.shares.write_text(before.split('[two]')[0])
+        self.shares = {'one': self.top / 'one', 'inner': self.m.share('inner', self.top / 'one/a')}
+        os.link(self.top / 'one/a/1', self.top / f'one/{long}/linked')
+        make_files(self.top / 'one', {'sparse': 1 << 41, f'{long}/{long}/{long}': 6, 'a/new': 1})
+        overlap = '.*shares inner and one hold the same files.*'
+        found, _ = self.report([('last', first)], overlap)
+        self.assertEqual([(each['kind'], each['what']) for each in found['incidents']],
+                         [('share_overlap', 'inner, one')])
+        # As if that report had been made tomorrow: it counts for nothing until then.
+        self.m.history('UPDATE Snapshot SET time = time + ? WHERE time > ?', 2 * DAY, self.times()[0])
+        self.m.shares.write_text(before)
+        self.shares = {name: self.top / name for name in ('one', 'two')}
+        (self.top / 'two/2').unlink()
+        found, now = self.report([('last', first)])
+        outer, = (volume for volume in found['volumes'] if volume['grown_by'])
+        self.assertEqual({cause['bytes'] for cause in outer['grown_by'] if cause['kind'] == 'share'},
+                         {now['share', 'one', ''][1] - first['share', 'one', ''][1]})
 
     def test_runs_that_leave_none(self):
         make_files(self.top / 'one', {'1': 1})

@@ -3,8 +3,9 @@ import os
 import signal
 import sqlite3
 import struct
+import time
 
-from expected import csv, data_rows, facts
+from expected import DAY, csv, data_rows, facts
 from harness import ProductTest, make_files
 
 PAGE = 4096
@@ -163,6 +164,25 @@ class Indexes(ProductTest):
         root = root.ljust(start, b'\0') + struct.pack('>IB', 3, 1) * cells
         data[28:32] = struct.pack('>I', 3)
         path.write_bytes(data[:PAGE] + root + leaf)
+
+    def test_its_folders_and_ages_are_those_of_a_walk(self):
+        walked, now, rows = self.m.share('walked'), int(time.time()), []
+        for i, (name, days) in enumerate({
+                '1': 3, 'a/b/2': 10, 'a/' + 'n' * 255 + '/' + 'x' * 255: 50, 'a.b/3': 200,
+                "a/it's\\\n/4": 500, 'a/b.c/5': 1500, 'a/b/6': 9999, 'z/7': -9}.items()):
+            make_files(walked, {name: 100 + i * i})
+            os.utime(walked / name, (now - days * DAY,) * 2)
+            rows.append(changed(path=name, name=name.split('/')[-1], size=100 + i * i,
+                                time_modify=now - days * DAY))
+        self.add('indexed', rows=rows)
+        self.m.profile('p', report_list='folder_usage,file_age')
+        self.assertSucceeded(self.m.run('--report', 'p'), 'p')
+        for report, count in (('folder_usage', 8), ('file_age', 8)):
+            lines = (self.m.report_folders('p')[0] / f'csv/{report}.csv').read_bytes().split(b'\n')
+            found = {share: sorted(line.split(b'\t', 1)[1] for line in lines if line.startswith(
+                share)) for share in (b'"walked"', b'"indexed"')}
+            self.assertEqual(found[b'"walked"'], found[b'"indexed"'])
+            self.assertEqual(len(found[b'"walked"']), count, found)
 
     def test_nothing_of_one_outlives_the_run(self):
         self.add('good')
