@@ -25,14 +25,8 @@ void write_block(FILE* data, const ListedReport& report, std::span<const ListedR
   for (const ListedRow& row : rows) {
     std::fputs(row_before, data);
     row_before = ",\n";
-    const char* before = "[ '";
-    for (size_t i = 0; i < report.columns.size(); ++i) {
-      std::fputs(before, data);
-      write_data_text(data, report.columns[i].data_text, row[i].c_str(), report.module);
-      std::fputc('\'', data);
-      before = ", '";
-    }
-    std::fputs(" ]", data);
+    write_data_fields(
+        data, report.columns, [&](size_t i) { return row[i].c_str(); }, report.module);
   }
   std::fputs(rows.empty() ? "</script>\n" : "\n];\n</script>\n", data);
 }
@@ -40,14 +34,8 @@ void write_block(FILE* data, const ListedReport& report, std::span<const ListedR
 void write_csv(FILE* csv, const ListedReport& report, std::span<const ListedRow> rows) {
   std::fprintf(csv, "%s\n", report.csv_header);
   for (const ListedRow& row : rows) {
-    const char* before = "\"";
-    for (size_t i = 0; i < report.columns.size(); ++i) {
-      std::fputs(before, csv);
-      write_csv_text(csv, report.columns[i].csv_text, row[i].c_str(), report.module);
-      std::fputc('"', csv);
-      before = "\t\"";
-    }
-    std::fputc('\n', csv);
+    write_csv_fields(
+        csv, report.columns, [&](size_t i) { return row[i].c_str(); }, report.module);
   }
 }
 

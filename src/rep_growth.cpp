@@ -1,6 +1,5 @@
 #include "rep_growth.hpp"
 
-#include <algorithm>
 #include <array>
 #include <optional>
 #include <string>
@@ -12,19 +11,18 @@
 #include "facts/owner_names.hpp"
 #include "facts/run_facts.hpp"
 #include "facts/tallies.hpp"
-#include "report_format/reports.hpp"
-#include "report_frame.hpp"
+#include "listed_report.hpp"
 #include "vornreport/error_log.hpp"
 #include "vornreport/handles.hpp"
-#include "vornreport/report_data.hpp"
 
 namespace vornreport {
 namespace {
 
-constexpr char kModule[] = "src/rep_growth";
-constexpr char kHeader[] = "Since\tKind\tShare\tName\tFile Count\tSize(Byte)";
-
-using Row = std::array<std::string, report_format::kGrowth.columns>;
+constexpr std::array kColumns{kName, kName, kName, kName, kName, kName};
+constexpr ListedReport kReport{.format = report_format::kGrowth,
+                               .module = "src/rep_growth",
+                               .csv_header = "Since\tKind\tShare\tName\tFile Count\tSize(Byte)",
+                               .columns = kColumns};
 
 // An account may have gone, or been left out of the profile, since the set was made.
 void forget_owners(Snapshot& set, const VLIBCSzHash* users) {
@@ -71,8 +69,8 @@ std::optional<Growth> compare(const ReportArgs& args, const char* report_list) {
   return growth;
 }
 
-std::vector<Row> rows_of(const Growth& growth) {
-  std::vector<Row> rows;
+std::vector<ListedRow> rows_of(const Growth& growth) {
+  std::vector<ListedRow> rows;
   for (const GrowthSince& since : growth) {
     for (const Change& change : greatest_changes(since)) {
       rows.push_back({since.since, word_of(change.kind), change.share, change.name,
@@ -82,76 +80,18 @@ std::vector<Row> rows_of(const Growth& growth) {
   return rows;
 }
 
-// In the form of the reports over the statistics database.
-void write_data(FILE* data, const std::vector<Row>& rows) {
-  if (!rows.empty()) {
-    std::fprintf(data, "<script type='text/javascript'>\nvar %s = [\n",
-                 report_format::kGrowth.variable);
-  }
-  const char* between_rows = "";
-  for (const Row& row : rows) {
-    std::fputs(std::exchange(between_rows, ",\n"), data);
-    const char* before = "[ '";
-    for (const std::string& value : row) {
-      std::fputs(std::exchange(before, ", '"), data);
-      write_data_text(data, ColumnText::kEscaped, value.c_str(), kModule);
-      std::fputc('\'', data);
-    }
-    std::fputs(" ]", data);
-  }
-  std::fputs(rows.empty() ? "</script>\n" : "\n];\n</script>\n", data);
-}
-
-void write_csv(FILE* csv, const std::vector<Row>& rows) {
-  std::fprintf(csv, "%s\n", kHeader);
-  for (const Row& row : rows) {
-    const char* before = "\"";
-    for (const std::string& value : row) {
-      std::fputs(std::exchange(before, "\t\""), csv);
-      write_csv_text(csv, ColumnText::kField, value.c_str(), kModule);
-      std::fputc('"', csv);
-    }
-    std::fputc('\n', csv);
-  }
-}
-
-int32_t write_rows(const std::vector<Row>& rows, const char* csv_dir) {
-  const PathText data_path = report_data_path();
-  PathText csv_path;
-  csv_path.format("%s/%s.csv", csv_dir, report_format::kGrowth.name);
-  FileHandle data = open_report_file(data_path.c_str(), "a", kModule, __LINE__);
-  FileHandle csv =
-      open_report_file(csv_path.c_str(), "a", kModule, __LINE__, LogForm::kNested, Costs::kReport);
-  if (!data || !csv) {
-    return -1;
-  }
-  write_data(data.get(), rows);
-  write_csv(csv.get(), rows);
-  run_facts().rows[report_format::kGrowth.name] = {rows.size(), rows.size()};
-  const bool data_kept = close_report_file(std::move(data), data_path.c_str(), kModule, __LINE__);
-  const bool csv_kept =
-      close_report_file(std::move(csv), csv_path.c_str(), kModule, __LINE__, Costs::kReport);
-  if (!data_kept || !csv_kept) {
-    return -1;
-  }
-  finish_csv(report_format::kGrowth, csv_path.c_str());
-  return 0;
-}
-
 }  // namespace
 
 int32_t growth(ReportArgs* args) {
-  const char* csv_dir =
-      args_are_complete(args) ? set_value(args->profile_hash, "real_path_csv") : nullptr;
   const char* report_list =
-      csv_dir != nullptr ? set_value(args->profile_hash, "report_list") : nullptr;
+      args_are_complete(args) ? set_value(args->profile_hash, "report_list") : nullptr;
   if (report_list == nullptr) {
-    REPORT_LOG_ERR_NESTED(kModule, __LINE__, "Bad Parameter");
+    REPORT_LOG_ERR_NESTED(kReport.module, __LINE__, "Bad Parameter");
     return -1;
   }
   // Without the snapshots the page and the CSV file have no rows, and the report has failed.
   std::optional<Growth> found = compare(*args, report_list);
-  const int32_t result = write_rows(rows_of(found.value_or(Growth())), csv_dir);
+  const int32_t result = run_listed_report(kReport, args, rows_of(found.value_or(Growth())));
   run_facts().growth = std::move(found);
   return run_facts().growth ? result : -1;
 }

@@ -100,27 +100,13 @@ void write_data_row(const report_row_ctx& ctx, const RowValues& row) {
   } else {
     std::fputs(",\n", ctx.data_fp);
   }
-  const char* before = "[ '";
-  size_t place = 0;
-  for (const ReportColumn& column : ctx.report->columns) {
-    std::fputs(before, ctx.data_fp);
-    write_data_text(ctx.data_fp, column.data_text, row.text[place++], ctx.report->module);
-    std::fputc('\'', ctx.data_fp);
-    before = ", '";
-  }
-  std::fputs(" ]", ctx.data_fp);
+  write_data_fields(
+      ctx.data_fp, ctx.report->columns, [&](size_t i) { return row.text[i]; }, ctx.report->module);
 }
 
 void write_csv_row(const report_row_ctx& ctx, const RowValues& row) {
-  const char* before = "\"";
-  size_t place = 0;
-  for (const ReportColumn& column : ctx.report->columns) {
-    std::fputs(before, ctx.csv_fp);
-    write_csv_text(ctx.csv_fp, column.csv_text, row.text[place++], ctx.report->module);
-    std::fputc('"', ctx.csv_fp);
-    before = "\t\"";
-  }
-  std::fputc('\n', ctx.csv_fp);
+  write_csv_fields(
+      ctx.csv_fp, ctx.report->columns, [&](size_t i) { return row.text[i]; }, ctx.report->module);
 }
 
 bool has_volume_column(const StatisticsReport& report) {

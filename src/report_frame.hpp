@@ -17,6 +17,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <span>
+#include <utility>
 
 #include "report_format/reports.hpp"
 #include "vorn/text.h"
@@ -122,5 +123,30 @@ void finish_csv(const report_format::ReportFormat& format, const char* path);
 // (kField, kTime, kRaw), without quotes around it.
 void write_data_text(FILE* data, ColumnText text, const char* value, const char* module);
 void write_csv_text(FILE* csv, ColumnText text, const char* value, const char* module);
+
+// Writes one row of the block, or a line of the CSV file: `text_of(place)` is what stands in the
+// column at that place of `columns`, whose `data_text` or `csv_text` says how it is written.
+template <typename Columns, typename TextOf>
+void write_data_fields(FILE* data, const Columns& columns, TextOf&& text_of, const char* module) {
+  const char* before = "[ '";
+  size_t place = 0;
+  for (const auto& column : columns) {
+    std::fputs(std::exchange(before, ", '"), data);
+    write_data_text(data, column.data_text, text_of(place++), module);
+    std::fputc('\'', data);
+  }
+  std::fputs(" ]", data);
+}
+template <typename Columns, typename TextOf>
+void write_csv_fields(FILE* csv, const Columns& columns, TextOf&& text_of, const char* module) {
+  const char* before = "\"";
+  size_t place = 0;
+  for (const auto& column : columns) {
+    std::fputs(std::exchange(before, "\t\""), csv);
+    write_csv_text(csv, column.csv_text, text_of(place++), module);
+    std::fputc('"', csv);
+  }
+  std::fputc('\n', csv);
+}
 
 }  // namespace vornreport

@@ -30,6 +30,20 @@ unsigned long long parse_number(const char* text) {
   return text != nullptr ? std::strtoull(text, nullptr, 10) : 0;
 }
 
+// Runs a statement, which is logged when it fails. SQLite's result.
+int run_logged(sqlite3* db, const char* sql, int (*row)(void*, int, char**, char**),
+               void* context) {
+  VornQazSetEnv();
+  char* message = nullptr;
+  const int result = sqlite3_exec(db, sql, row, context, &message);
+  const SqliteText owned(message);
+  if (result != SQLITE_OK) {
+    REPORT_LOG_ERR(kGatheringModule, __LINE__, "Exec sql:[%s] error: %s\n\n", sql,
+                   message != nullptr ? message : "");
+  }
+  return result;
+}
+
 // Runs the index query; every row goes to ReportFileIndexRow.
 int copy_rows(sqlite3* index, const char* share_path, FileIndexImport& import) {
   FixedText<4096> query;
@@ -37,16 +51,7 @@ int copy_rows(sqlite3* index, const char* share_path, FileIndexImport& import) {
       "select owner_name, time_modify, size, '%s/'||path, name, file_ext from file_info where "
       "is_dir=0;",
       share_path);
-  VornQazSetEnv();
-  char* message = nullptr;
-  const int result = sqlite3_exec(index, query.c_str(), ReportFileIndexRow, &import, &message);
-  const SqliteText owned(message);
-  if (result != SQLITE_OK) {
-    REPORT_LOG_ERR(kGatheringModule, __LINE__, "Exec sql:[%s] error: %s\n\n", query.c_str(),
-                   message != nullptr ? message : "");
-    return -1;
-  }
-  return 0;
+  return run_logged(index, query.c_str(), ReportFileIndexRow, &import) == SQLITE_OK ? 0 : -1;
 }
 
 // Folders from files that pass in the order of their paths, where all that lie below one folder
@@ -109,16 +114,8 @@ void count_index_folders(const char* share, const char* share_path, sqlite3* db)
     }
     return 0;
   };
-  VornQazSetEnv();
-  char* message = nullptr;
-  const int result = sqlite3_exec(db, sql.c_str(), add, &folders, &message);
-  const SqliteText owned(message);
-  if (result != SQLITE_OK) {
-    REPORT_LOG_ERR(kGatheringModule, __LINE__, "Exec sql:[%s] error: %s\n\n", sql.c_str(),
-                   message != nullptr ? message : "");
-    if (is_storage_failure(result)) {
-      mark_report_data_lost();
-    }
+  if (is_storage_failure(run_logged(db, sql.c_str(), add, &folders))) {
+    mark_report_data_lost();
   }
 }
 

@@ -105,6 +105,16 @@ bool within(uint64_t limit) {
   return limit == 0 || static_cast<uint64_t>(g_grouping.number) <= limit;
 }
 
+// The group's number, then columns of the query in their order.
+constexpr ReportColumn kColumns[] = {raw_column(0), field_column(0), path_column(1),
+                                     field_column(2), time_column(3)};
+
+auto texts_of(char* const* values) {
+  return [values, number = std::to_string(g_grouping.number)](size_t place) {
+    return place == 0 ? number.c_str() : text_of(values, static_cast<Column>(place - 1));
+  };
+}
+
 void write_data_row(const report_row_ctx& ctx, char* const* values) {
   if (ctx.row_count == 0) {
     std::fprintf(ctx.data_fp,
@@ -113,25 +123,7 @@ void write_data_row(const report_row_ctx& ctx, char* const* values) {
   } else {
     std::fputs(",\n", ctx.data_fp);
   }
-  std::fprintf(ctx.data_fp, "[ '%d'", g_grouping.number);
-  for (const Column column : {kShare, kPath, kSize, kModifyTime}) {
-    std::fputs(", '", ctx.data_fp);
-    write_data_text(ctx.data_fp, column == kPath ? ColumnText::kEscaped : ColumnText::kRaw,
-                    text_of(values, column), kDuplicateModule);
-    std::fputc('\'', ctx.data_fp);
-  }
-  std::fputs(" ]", ctx.data_fp);
-}
-
-void write_csv_row(const report_row_ctx& ctx, char* const* values) {
-  std::fprintf(ctx.csv_fp, "\"%d\"", g_grouping.number);
-  for (const Column column : {kShare, kPath, kSize, kModifyTime}) {
-    std::fputs("\t\"", ctx.csv_fp);
-    write_csv_text(ctx.csv_fp, column == kModifyTime ? ColumnText::kTime : ColumnText::kField,
-                   text_of(values, column), kDuplicateModule);
-    std::fputc('"', ctx.csv_fp);
-  }
-  std::fputc('\n', ctx.csv_fp);
+  write_data_fields(ctx.data_fp, kColumns, texts_of(values), kDuplicateModule);
 }
 
 int duplicate_row_writer(void* context, int /*columns*/, char** values, char** names) noexcept {
@@ -159,7 +151,7 @@ int duplicate_row_writer(void* context, int /*columns*/, char** values, char** n
     ++ctx->shown_count;
   }
   if (within(ctx->csv_limit)) {
-    write_csv_row(*ctx, values);
+    write_csv_fields(ctx->csv_fp, kColumns, texts_of(values), kDuplicateModule);
   }
   ++ctx->row_count;
   return 0;
