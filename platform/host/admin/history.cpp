@@ -5,46 +5,38 @@
 
 #include <cerrno>
 #include <cstring>
-#include <memory>
 
+#include "machine/sqlite_handles.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
 namespace admin {
 namespace {
 
-struct CloseDb {
-  void operator()(sqlite3* db) const { sqlite3_close(db); }
-};
-struct Finalize {
-  void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
-};
-using DbPtr = std::unique_ptr<sqlite3, CloseDb>;
-using StatementPtr = std::unique_ptr<sqlite3_stmt, Finalize>;
-
 // An open database whose statements can fail, if it can't be opened.
-DbPtr open_history() {
+host::Handle open_history() {
   constexpr int kWaitMs = 5000;
   sqlite3* opened = nullptr;
   sqlite3_open_v2(VORN_PATH_HISTORY_DB, &opened, SQLITE_OPEN_READONLY, nullptr);
-  DbPtr db(opened);
+  host::Handle db(opened);
   sqlite3_busy_timeout(db.get(), kWaitMs);
   return db;
 }
 
-StatementPtr prepare(const DbPtr& db, const char* sql) {
+host::Statement prepare(const host::Handle& db, const char* sql) {
   sqlite3_stmt* statement = nullptr;
   sqlite3_prepare_v2(db.get(), sql, -1, &statement, nullptr);
-  return StatementPtr(statement);
+  return host::Statement(statement);
 }
 
 }  // namespace
 
 int samples_since(const std::string& profile, std::time_t start) {
-  const DbPtr db = open_history();
-  const StatementPtr statement = prepare(db,
-                                         "SELECT count(*) FROM VolumeUsage WHERE profile = ?1 AND "
-                                         "CAST(sampleDate AS INTEGER) >= ?2");
+  const host::Handle db = open_history();
+  const host::Statement statement =
+      prepare(db,
+              "SELECT count(*) FROM VolumeUsage WHERE profile = ?1 AND "
+              "CAST(sampleDate AS INTEGER) >= ?2");
   if (!statement) {
     return 0;
   }
@@ -57,8 +49,8 @@ std::string history_problem() {
   if (access(VORN_PATH_HISTORY_DB, F_OK) != 0) {
     return "";
   }
-  const DbPtr db = open_history();
-  const StatementPtr check = prepare(db, "PRAGMA quick_check(1)");
+  const host::Handle db = open_history();
+  const host::Statement check = prepare(db, "PRAGMA quick_check(1)");
   if (!check || sqlite3_step(check.get()) != SQLITE_ROW) {
     return std::string("is broken: ") + sqlite3_errmsg(db.get());
   }
@@ -75,7 +67,7 @@ std::string schema_problem() {
   }
   sqlite3* opened = nullptr;
   sqlite3_open(":memory:", &opened);
-  const DbPtr db(opened);
+  const host::Handle db(opened);
   return sqlite3_exec(db.get(), schema->c_str(), nullptr, nullptr, nullptr) == SQLITE_OK
              ? ""
              : std::string("is broken: ") + sqlite3_errmsg(db.get());

@@ -216,17 +216,6 @@ int execute(const VORNDB& db, const char* sql, std::unique_ptr<VORNDBResult>& re
   return step == SQLITE_DONE ? 0 : fail(db, "can't run a statement");
 }
 
-// Runs `work`, whose success leaves errno alone: SQLite looks for files that needn't exist.
-template <typename Work>
-int keeping_errno(Work work) {
-  const int saved_errno = errno;
-  const int result = work();
-  if (result == 0) {
-    errno = saved_errno;
-  }
-  return result;
-}
-
 }  // namespace
 }  // namespace host
 
@@ -240,6 +229,7 @@ int VornQazDBOpen(VORNDB** db, const char* path, const char* schema_path) try {
   }
   auto made = std::make_unique<VORNDB>();
   made->path = path;
+  // SQLite looks for files that needn't exist.
   if (host::keeping_errno([&] { return host::open_database(*made, schema_path); }) != 0) {
     return -1;
   }

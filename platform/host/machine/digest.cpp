@@ -304,12 +304,7 @@ int VornQazGetFileMd5(const char* path, unsigned long long size, char* digest,
     errno = EINVAL;
     return host::kFailed;
   }
-  const int saved_errno = errno;
-  const host::Outcome outcome = host::digest_file(path, size, digest);
-  if (outcome == host::kDigested) {
-    errno = saved_errno;
-  }
-  return outcome;
+  return host::keeping_errno([&] { return host::digest_file(path, size, digest); });
 } catch (...) {
   errno = ENOMEM;
   return host::kFailed;

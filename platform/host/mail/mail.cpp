@@ -243,12 +243,8 @@ int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* 
     errno = EINVAL;
     return -1;
   }
-  const int saved_errno = errno;
-  const int result = host::send_report(profile, link, *hash, host::MailLimits{});
-  if (result == 0) {
-    errno = saved_errno;
-  }
-  return result;
+  return host::keeping_errno(
+      [&] { return host::send_report(profile, link, *hash, host::MailLimits{}); });
 } catch (...) {
   errno = ENOMEM;
   return -1;

@@ -153,12 +153,7 @@ int VornGetTargetLink(const VLIBCSzHash* hash, const char* target_file, char* li
     return -1;
   }
   *link = '\0';
-  const int saved_errno = errno;
-  const int result = make_link(*hash, target_file, link, size);
-  if (result == 0) {
-    errno = saved_errno;
-  }
-  return result;
+  return host::keeping_errno([&] { return make_link(*hash, target_file, link, size); });
 } catch (...) {
   errno = ENOMEM;
   return -1;

@@ -4,6 +4,7 @@
 
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstddef>
 #include <optional>
 #include <string>
@@ -49,6 +50,17 @@ class ErrnoKeeper {
  private:
   int saved_;
 };
+
+// Runs `work`, whose success (0) leaves errno alone, whatever it met on its way.
+template <typename Work>
+int keeping_errno(Work&& work) {
+  const int saved_errno = errno;
+  const int result = work();
+  if (result == 0) {
+    errno = saved_errno;
+  }
+  return result;
+}
 
 // The content of the regular file `path`, links followed; nothing with errno when it can't be read,
 // is something else than a regular file (EINVAL, EISDIR) or holds more than `limit` bytes (EFBIG).
