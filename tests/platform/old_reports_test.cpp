@@ -35,11 +35,7 @@ class OldReports : public testing::Test {
   }
   // Whether the reports come in the order in which they are named here, on a server in `zone`.
   bool are_ordered(const char* zone, const std::vector<std::string>& expected) const {
-    return support::passes_in_child([&] {
-      setenv("TZ", zone, 1);
-      tzset();
-      EXPECT_EQ(expected, names());
-    });
+    return support::passes_in_zone(zone, [&] { EXPECT_EQ(expected, names()); });
   }
 
   support::TempFolder folder;

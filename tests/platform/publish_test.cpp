@@ -85,8 +85,7 @@ TEST(TargetLink, OpensPageAndFactsToTheGroupOfTheFolder) {
   EXPECT_NE("refused", make_link());
   for (const auto& [name, mode] :
        {std::pair("/report.html", 0640), {"/report.json", 0640}, {"/elsewhere", 0600}}) {
-    struct stat status {};
-    ASSERT_EQ(0, stat((report + name).c_str(), &status));
+    const struct stat status = support::status_of(report + name);
     EXPECT_EQ(static_cast<mode_t>(mode), status.st_mode & 07777U) << name;
     EXPECT_EQ(mode == 0640 ? group : getegid(), status.st_gid) << name;
     EXPECT_EQ(geteuid(), status.st_uid) << name;
@@ -104,7 +103,7 @@ class MailServer {
     if (pipe(ends) != 0) {
       throw std::runtime_error("pipe");
     }
-    const std::string script = std::filesystem::path(__FILE__).parent_path() / "smtp_server.py";
+    const std::string script = VORN_TEST_SOURCE_DIR "/tests/platform/smtp_server.py";
     const std::string command = "exec " + script + " " + mails_.path() + " " + options;
     pid_ = support::fork_child([&] {
       dup2(ends[1], STDOUT_FILENO);
@@ -197,38 +196,6 @@ TEST(SendReport, SendsOneMessageToEachRecipientOnOneConnection) {
     EXPECT_NE(std::string::npos, html.find("<bdi>photos</bdi> with 2=C2=A0KiB")) << html;
   }
   EXPECT_EQ(ports[0], ports[1]);
-}
-
-TEST(SendReport, TakesFactsFromAPlainFileOnly) {
-  const MailServer server;
-  const support::TempFolder folder;
-  support::write_dictionaries(kDictionaries);
-  const std::string facts = folder.path("report.json");
-  const std::function<void()> places[] = {
-      [&] {},  // absent
-      [&] { support::write_file(facts, "{\"format\": 1"); },
-      [&] { support::write_file(facts, R"({"format": 2, "attention": []})"); },
-      [&] {
-        support::write_file(folder.path("elsewhere"), R"({"format": 1})");
-        std::filesystem::create_symlink(folder.path("elsewhere"), facts);
-      },
-      [&] { ASSERT_EQ(0, mkfifo(facts.c_str(), 0600)); },
-      [&] {
-        support::write_file(facts, R"({"format": 1})");
-        std::filesystem::resize_file(facts, report_format::kLargestFacts + 1);
-      },
-      [&] { support::write_file(facts, R"({"format": 1})"); }};
-  int count = 0;
-  for (const auto& place : places) {
-    std::filesystem::remove(facts);
-    place();
-    EXPECT_EQ(0, send({{"real_path_report_final", folder.path("report.html")}}, server.url()));
-    const bool is_good = ++count == std::ssize(places);
-    EXPECT_EQ(is_good, server.mail(count).find("figures are missing") == std::string::npos)
-        << count;
-    EXPECT_NE(std::string::npos, server.mail(count).find("https://h/r.html"));
-  }
-  EXPECT_EQ("", syslog_text());
 }
 
 TEST(SendReport, NeedsNoDictionary) {

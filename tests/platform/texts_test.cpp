@@ -137,16 +137,10 @@ TEST_F(TextsTest, TellIncidentsInTheirOwnWordsAtLeast) {
 
 // As format.js has them.
 TEST_F(TextsTest, WriteSizesAndPercentagesAsThePageDoes) {
-  const std::pair<std::uint64_t, const char*> sizes[] = {{0, "0 B"},
-                                                         {1023, "1023 B"},
-                                                         {1024, "1 KiB"},
-                                                         {1152, "1.13 KiB"},  // 1.125
-                                                         {10 * 1024 - 1, "10 KiB"},
-                                                         {99 * 1024 + 512, "99.5 KiB"},
-                                                         {100 * 1024 + 512, "101 KiB"},
-                                                         {1023 * 1024 + 511, "1023 KiB"},
-                                                         {1023 * 1024 + 512, "1 MiB"},
-                                                         {UINT64_MAX, "16 EiB"}};
+  const std::pair<std::uint64_t, const char*> sizes[] = {
+      {0, "0 B"},         {1023, "1023 B"},      {1024, "1 KiB"},     {1152, "1.13 KiB"},
+      {10239, "10 KiB"},  {101888, "99.5 KiB"},  {102912, "101 KiB"}, {1048063, "1023 KiB"},
+      {1048064, "1 MiB"}, {UINT64_MAX, "16 EiB"}};
   for (const auto& [bytes, expected] : sizes) {
     EXPECT_EQ(std::regex_replace(expected, std::regex(" "), "\u00a0"), texts().size(bytes));
   }

@@ -9,6 +9,7 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -90,6 +91,20 @@ bool exists(const std::string& path) {
   return std::filesystem::symlink_status(path).type() != std::filesystem::file_type::not_found;
 }
 
+struct stat status_of(const std::string& path) {
+  struct stat status {};
+  static_cast<void>(lstat(path.c_str(), &status));  // which leaves it zero when it fails
+  return status;
+}
+
+std::set<std::string> names_in(const std::string& folder) {
+  std::set<std::string> names;
+  for (const auto& entry : std::filesystem::directory_iterator(folder)) {
+    names.insert(entry.path().filename());
+  }
+  return names;
+}
+
 std::vector<std::string> syslog_lines() {
   static std::vector<std::pair<int, std::string>> senders;  // connection, what came through it
   for (int sender = 0; (sender = accept4(log_socket, nullptr, nullptr, SOCK_CLOEXEC)) >= 0;) {
@@ -142,6 +157,14 @@ bool passes_in_child(const std::function<void()>& check) {
            check();
            return testing::Test::HasFailure() ? 1 : 0;
          })) == 0;
+}
+
+bool passes_in_zone(const char* zone, const std::function<void()>& check) {
+  return passes_in_child([&] {
+    setenv("TZ", zone, 1);
+    tzset();
+    check();
+  });
 }
 
 OtherRun::OtherRun(const std::string& profile, const std::function<void()>& work) {

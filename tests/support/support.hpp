@@ -2,10 +2,11 @@
 #ifndef VORN_TESTS_SUPPORT_HPP
 #define VORN_TESTS_SUPPORT_HPP
 
-#include <sys/types.h>
+#include <sys/stat.h>
 
 #include <functional>
 #include <memory>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -33,6 +34,10 @@ void write_file(const std::string& path, std::string_view content);
 std::string read_file(const std::string& path);
 // Whether a name exists, dangling links included.
 bool exists(const std::string& path);
+// What lstat() tells; all zero for a name that doesn't exist.
+struct stat status_of(const std::string& path);
+// The names in a folder.
+std::set<std::string> names_in(const std::string& folder);
 
 // The syslog messages since the last call, without priority, time and tag. The socket is bound
 // before the first test, so a test that only wants its own lines calls this once to begin with.
@@ -46,6 +51,8 @@ pid_t fork_child(const std::function<int()>& work);
 int wait_child(pid_t child);
 // Whether no expectation of `check` fails in a child: for what a process can do only once.
 bool passes_in_child(const std::function<void()>& check);
+// The same on a server in `zone`.
+bool passes_in_zone(const char* zone, const std::function<void()>& check);
 
 // A process that is in the middle of a run of `profile`, having done `work`, until it is killed.
 class OtherRun {

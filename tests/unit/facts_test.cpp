@@ -4,8 +4,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <nlohmann/json.hpp>
-
 #include "facts/assemble.hpp"
 #include "facts/attention.hpp"
 #include "facts/duplicate_tally.hpp"
@@ -14,13 +12,13 @@
 #include "facts/tallies.hpp"
 #include "fixture.hpp"
 #include "report_format/attention.hpp"
+#include "report_format/facts_file.hpp"
 #include "report_format/run_state.hpp"
 #include "vornreport/handles.hpp"
 
 namespace vornreport {
 namespace {
 
-using report_format::AttentionValue;
 using report_format::Facts;
 using report_format::Level;
 
@@ -45,19 +43,17 @@ class FactsTest : public UnitTest {
     uint64_t size;
     uid_t owner = 0;
     const char* type = "image";
-    dev_t device = 1;
-    nlink_t links = 1;
     int64_t mtime = kNow;
   };
-  static void count(const File& file, RowSource source = RowSource::kWalk) {
+  static void count(const File& file) {
     struct stat status {};
     status.st_size = static_cast<off_t>(file.size);
     status.st_uid = file.owner;
-    status.st_dev = file.device;
-    status.st_nlink = file.links;
+    status.st_dev = 1;
+    status.st_nlink = 1;
     status.st_mtime = file.mtime;
     status.st_blocks = static_cast<blkcnt_t>((file.size + 511) / 512);
-    tallies().file({"s", file.path, "", file.type, &status}, source);
+    tallies().file({"s", file.path, "", file.type, &status}, RowSource::kWalk);
   }
   static void share(const char* name, const char* path, const std::vector<File>& files) {
     tallies().begin_share(name, path, kNow);
@@ -74,54 +70,15 @@ class FactsTest : public UnitTest {
     std::string all;
     for (const report_format::Attention& entry : facts().attention) {
       all += std::string(word_of(entry.level)) + " " + entry.code;
-      const AttentionValue& first = entry.values.front().second;
-      all +=
-          " " +
-          (std::holds_alternative<std::string>(first) ? std::get<std::string>(first)
-                                                      : std::to_string(std::get<int64_t>(first))) +
-          "\n";
+      const auto& first = entry.values.front().second;
+      const auto* text = std::get_if<std::string>(&first);
+      all += " " + (text != nullptr ? *text : std::to_string(std::get<int64_t>(first))) + "\n";
     }
     return all;
   }
 
   FactsSource source_;
 };
-
-TEST_F(FactsTest, SumsByShareVolumeOwnerAndType) {
-  platform.volumes_of = {{"/srv/a/nested", "/srv/a/nested"}};
-  share("a", "/srv/a",
-        {{"/srv/a/1", 1000, 1, "image", 1},
-         {"/srv/a/2", 500, 2, "text", 1},
-         {"/srv/a/nested/3", 7, 1, "image", 2},
-         {"/srv/a/link", 4096, 1, "text", 1, 3}});
-  tallies().begin_share("b", "/srv/b", kNow);
-  count({"/srv/b/1", 100'000, 2, "text", 9}, RowSource::kIndex);
-  tallies().share()->folder();
-  tallies().share()->other();
-  tallies().share()->unreadable();
-  tallies().end_share();
-  run_facts().owners = {{1, "anna"}};  // nobody may tell of the other
-
-  const Facts found = facts();
-  ASSERT_EQ(found.shares->size(), 2U);
-  const report_format::ShareFacts& b = found.shares->at(0);
-  EXPECT_EQ(
-      std::tuple(b.name, b.files, b.folders, b.bytes, b.allocated, b.unreadable, b.other, b.whole),
-      std::tuple("b", 1U, 1U, 100'000U, 100'000U, 1U, 1U, false));
-  const report_format::ShareFacts& a = found.shares->at(1);
-  EXPECT_EQ(std::tuple(a.name, a.volume, a.files, a.bytes, a.allocated, a.whole),
-            std::tuple("a", "/", 4U, 5603U, 1024U + 512 + 512 + 4096 / 3, true));
-  ASSERT_EQ(found.owners->size(), 1U);
-  const report_format::OwnerFacts& anna = found.owners->front();
-  EXPECT_EQ(std::tuple(anna.name, anna.files, anna.bytes), std::tuple("anna", 3U, 5103U));
-  ASSERT_EQ(anna.places.size(), 2U);
-  EXPECT_EQ(anna.places[0].volume + " " + anna.places[1].volume, "/ /srv/a/nested");
-  ASSERT_EQ(found.types->size(), 2U);
-  const report_format::TypeFacts& text = found.types->front();
-  EXPECT_EQ(
-      std::tuple(text.type, text.files, text.bytes, text.shares[0].share, text.shares[1].bytes),
-      std::tuple("text", 3U, 104'596U, "b", 4596U));
-}
 
 TEST_F(FactsTest, SumsOfSparseFilesStayAtTheGreatestNumber) {
   share("a", "/srv/a", {{"/srv/a/1", INT64_MAX}, {"/srv/a/2", INT64_MAX}, {"/srv/a/3", 5}});
@@ -131,7 +88,7 @@ TEST_F(FactsTest, SumsOfSparseFilesStayAtTheGreatestNumber) {
 }
 
 TEST_F(FactsTest, TellsOnlyWhatWasAskedFor) {
-  share("a", "/srv/a", {{"/srv/a/1", 1, 1, "image", 1, 1, kNow - 100 * kDay}});
+  share("a", "/srv/a", {{"/srv/a/1", 1, 1, "image", kNow - 100 * kDay}});
   run_facts().owners = {{1, "anna"}};
   source_.report_list = "large_file,volume_usage";
   const Facts found = facts();
@@ -142,17 +99,6 @@ TEST_F(FactsTest, TellsOnlyWhatWasAskedFor) {
   EXPECT_EQ(found.reports[0].name, "volume_usage");
   source_.has_walked = false;
   EXPECT_FALSE(facts().shares);
-}
-
-TEST_F(FactsTest, LimitOfUsers) {
-  HashHandle profile(VLIBCSzHashAlloc(8));
-  with_address(profile,
-               [](VLIBCSzHash** h) { return VLIBCSzHashSetValue(h, "limit_user", "anna,chen"); });
-  begin_facts("p1", profile.get());
-  EXPECT_TRUE(run_facts().may_tell("chen"));
-  EXPECT_FALSE(run_facts().may_tell("bjoern"));
-  run_facts().limit_user.reset();
-  EXPECT_TRUE(run_facts().may_tell("bjoern"));
 }
 
 TEST_F(FactsTest, VolumesStandByUrgency) {
@@ -269,8 +215,8 @@ TEST_F(FactsTest, GrowthIsToldWhereItIsAskedFor) {
 }
 
 TEST_F(FactsTest, NoSuperlativeOfADoubtfulSum) {
-  share("small", "/srv/a", {{"/srv/a/1", 1, 1, "image", 1, 1, kNow - 91 * kDay}});
-  share("large", "/srv/b", {{"/srv/b/old", 5, 1, "image", 1, 1, kNow - 90 * kDay}});
+  share("small", "/srv/a", {{"/srv/a/1", 1, 1, "image", kNow - 91 * kDay}});
+  share("large", "/srv/b", {{"/srv/b/old", 5, 1, "image", kNow - 90 * kDay}});
   run_facts().owners = {{1, "anna"}};
   run_facts().duplicates = {{.by_content = true, .groups = 2, .files = 5, .reclaimable = 77}};
   const std::string rest = "ok duplicates_confirmed 77\nok data_oldest 1692137600\n";
@@ -345,77 +291,18 @@ TEST_F(FactsTest, ProgressIsWrittenTenTimesASecondAtMost) {
 
 // --- The file ---------------------------------------------------------------------------------
 
-Facts full_facts() {
-  Facts facts;
-  facts.host = "files";
-  facts.profile = "p1";
-  facts.started = kNow;
-  facts.complete = false;
-  facts.incidents = {{report_format::IncidentLevel::kError, "share_missing", "</script>", "x"}};
-  report_format::VolumeFacts volume;
-  volume.path =
-      "/srv/b\xc3\xbc"
-      "cher";
-  volume.size = UINT64_MAX;
-  volume.percent = 93.25;
-  volume.level = Level::kCritical;
-  volume.forecast = {report_format::ForecastState::kGrowing, 24, 19, 33, 1 << 30, 30, {}};
-  volume.forecast.jump = {kNow, -5};
-  volume.samples = {{kNow, 7}, {kNow + 1, 8}};
-  volume.grown_by = {{{"owner", "s", "anna", -3, {}}}};
-  facts.volumes = {volume};
-  facts.shares.emplace().push_back({});
-  facts.shares->front().grown.emplace().last = {kNow, -1, -2};
-  facts.owners.emplace().push_back({"anna", 1, 2, {}, {{"s", "/", 1, 2}}});
-  facts.types.emplace().push_back({"t", 1, 2, {}, {{"s", 1, 2}}});
-  facts.ages.emplace().push_back({"0-7", 1, 2});
-  facts.quotas.emplace().push_back({"/", "anna", 1, 2, 50, Level::kWarning, {}});
-  facts.duplicates = {{true, 1, 2, 3}};
-  facts.attention = {{Level::kWarning, "volume_used", {{"volume", "/"}, {"percent", 1.5}}, "x"},
-                     {Level::kOk, "share_largest", {{"bytes", int64_t{5}}}, "y"}};
-  facts.reports = {{"large_file", 300, 200, 200, "csv/large_file.csv", false}};
-  return facts;
-}
-
-TEST(FactsFile, ReadsWhatItWrites) {
-  const std::string line = report_format::to_line(full_facts());
-  EXPECT_EQ(line.find_first_of("<\n\xc3"), std::string::npos);
-  const std::optional<Facts> read = report_format::facts_of(line);
+// Every key is there, in its order, null where nothing is known.
+TEST(FactsFile, IsReadAndWrittenToTheByte) {
+  const std::string text = support::read_file(VORN_TEST_SOURCE_DIR "/tests/fuzz/seeds/facts/full");
+  const std::optional<Facts> read = report_format::facts_of(text);
   ASSERT_TRUE(read);
-  EXPECT_EQ(report_format::to_line(*read), line);
+  EXPECT_EQ(report_format::to_line(*read) + "\n", text);
+  EXPECT_EQ(read->incidents[0].what, "</script>");
   EXPECT_EQ(read->volumes[0].size, UINT64_MAX);
   EXPECT_EQ(read->volumes[0].forecast.jump->bytes, -5);
   EXPECT_EQ(std::get<double>(*read->attention[0].find("percent")), 1.5);
   EXPECT_TRUE(read->duplicates->by_content);
-  EXPECT_EQ(read->incidents[0].what, "</script>");
-  EXPECT_EQ(report_format::started_of(line), kNow);
-}
-
-// Every key is there from the start, null where nothing is known.
-TEST(FactsFile, HasEveryKey) {
-  const auto json = nlohmann::json::parse(report_format::to_line(full_facts()));
-  const auto keys = [](const nlohmann::json& object) {
-    std::string all;
-    for (const auto& [key, value] : object.items()) {
-      all += key + " ";
-    }
-    return all;
-  };
-  EXPECT_EQ(keys(json),
-            "ages attention complete duplicates finished format host incidents language owners "
-            "profile quotas reports shares started time_zone types volumes ");
-  EXPECT_EQ(keys(json["volumes"][0]),
-            "explained filled_by forecast free grown_by id level outside path percent samples size "
-            "used ");
-  EXPECT_EQ(keys(json["volumes"][0]["forecast"]),
-            "days days_high days_low jump per_day state window ");
-  EXPECT_EQ(
-      keys(json["shares"][0]),
-      "allocated bytes files folders grown index name other path samples unreadable volume whole ");
-  EXPECT_EQ(keys(json["quotas"][0]), "forecast level percent quota used user volume ");
-  EXPECT_TRUE(json["volumes"][0]["explained"].is_null());
-  EXPECT_EQ(json["duplicates"]["mode"], "content");
-  EXPECT_EQ(json["volumes"][0]["samples"][1], nlohmann::json({kNow + 1, 8}));
+  EXPECT_EQ(report_format::started_of(text), kNow);
 }
 
 // It may come from elsewhere: whatever stands in it, a reader gets its own defaults or nothing.
@@ -452,13 +339,32 @@ TEST(FactsFile, SurvivesForeignTexts) {
   }
 }
 
+TEST(FactsFile, IsAPlainFileOfNoGreatSize) {
+  const support::TempFolder folder;
+  const std::string file = folder.path("report.json");
+  const std::string good = R"({"format": 1})";
+  support::write_file(folder.path("elsewhere"), good);
+  const std::pair<bool, std::function<void()>> places[] = {
+      {false, [] {}},  // absent
+      {false, [&] { support::write_file(file, "{\"format\": 1"); }},
+      {false, [&] { ASSERT_EQ(symlink(folder.path("elsewhere").c_str(), file.c_str()), 0); }},
+      {false, [&] { ASSERT_EQ(mkfifo(file.c_str(), 0600), 0); }},
+      {false,
+       [&] { support::write_file(file, good + std::string(report_format::kLargestFacts, ' ')); }},
+      {true, [&] { support::write_file(file, good); }}};
+  for (const auto& [is_good, place] : places) {
+    unlink(file.c_str());
+    place();
+    EXPECT_EQ(report_format::read_facts(folder.path()).has_value(), is_good);
+  }
+}
+
 TEST(RunState, ReadsWhatItWrites) {
   using namespace report_format;
   const RunStatus status = status_of(status_text({kSuccess, "2026-11-21_04-00-02", 3}));
   EXPECT_EQ(std::tuple(status.word, status.report, status.incidents),
             std::tuple("success", "2026-11-21_04-00-02", 3));
   EXPECT_EQ(status_text({kFail, "", 0}), "fail\n");
-  EXPECT_EQ(status_of("fail").word, "fail");
   EXPECT_EQ(status_of("success\nnew = 1\nincidents = x\n").incidents, 0);
   Progress progress{Phase::kReporting, "s\"\n\xff", 7, "large_file", 3, 9};
   const auto read = progress_of(progress_text(progress));

@@ -44,33 +44,6 @@ TEST_F(FrameTest, ShareWithoutVolumeIsLeftOut) {
   EXPECT_EQ(log.find("src/rep_share_list:"), 0U);
 }
 
-TEST_F(FrameTest, FailedFormatsKeepTheRow) {
-  add("s", "a", 1);
-  platform.failing = {"EscChar", "FormatCsvString"};
-  EXPECT_EQ(run(large_file_db), 0);
-  EXPECT_NE(data().find("[ 's', '', '1' ]"), std::string::npos);
-  EXPECT_EQ(csv("large_file"), "Share\tFile\tSize(Byte)\n\"s\"\t\"/s/a\"\t\"1\"\n");
-  EXPECT_NE(support::syslog_text().find("escape file failed, file=half\n"), std::string::npos);
-}
-
-TEST_F(FrameTest, MissingPiecesFailTheReport) {
-  add("s", "a", 1);
-  const auto expect_failure = [&](const char* message) {
-    EXPECT_EQ(run(large_file_db), -1);
-    const std::string log = support::syslog_text();
-    EXPECT_NE(log.find(message), std::string::npos) << log;
-  };
-  set_profile("real_path_csv", "");
-  expect_failure(")get csv dir failed\n\n");
-  EXPECT_EQ(data(), "");
-  set_profile("real_path_stat_db", "");
-  expect_failure(")open db failed\n\n");
-  users_.reset();
-  expect_failure("src/rep_large_file:");
-  EXPECT_EQ(output_.find("(src/rep_large_file:"), 0U);
-  EXPECT_FALSE(report_data_lost());
-}
-
 // A page or CSV file that can't be opened or written fails the report; without its part of the page
 // the run never makes one. Lost data is remembered for the process, hence the children.
 TEST_F(FrameTest, AFileThatCannotBeWrittenFailsTheReportOrTheRun) {

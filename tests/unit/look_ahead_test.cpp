@@ -15,9 +15,8 @@
 #include <random>
 
 #include "file_gathering/share_walk.hpp"
-#include "fixture.hpp"
+#include "report_fixture.hpp"
 #include "thread_count.hpp"
-#include "vornreport/statistics_db.hpp"
 
 namespace {
 
@@ -38,54 +37,34 @@ namespace {
 
 using support::write_file;
 
-class LookAheadTest : public UnitTest {
+class LookAheadTest : public StatisticsTest {
  protected:
-  LookAheadTest() {
-    VLIBCSzHash* hash = VLIBCSzHashAlloc(8);
-    VLIBCSzHashSetValue(&hash, "real_path_stat_db", folder_.path("stat.db").c_str());
-    profile_.reset(hash);
-    types_.reset(VLIBCSzHashAlloc(8));
-    db_ = VORNReportDBInit(profile_.get());
-  }
-
   // Everything that a walk leaves: its rows in their order, and what it printed.
   std::string walked(const std::string& top, unsigned threads,
                      std::chrono::milliseconds silence = std::chrono::minutes(2)) {
-    std::string text;
-    sqlite3_exec(db_.get(), "begin", nullptr, nullptr, nullptr);
-    std::string output = printed([&] {
+    rows("begin");
+    const std::string output = printed([&] {
       EXPECT_EQ(ReportShareWalk(db_.get(), "share", top.c_str(), types_.get(), threads, silence),
                 0);
     });
-    const auto add = [](void* out, int, char** values, char**) {
-      *static_cast<std::string*>(out) += std::string(values[0]) + "\n";
-      return 0;
-    };
-    sqlite3_exec(db_.get(), "select path from file_stat order by id", add, &text, nullptr);
-    sqlite3_exec(db_.get(), "rollback", nullptr, nullptr, nullptr);
+    const std::string paths = rows("select path from file_stat order by id");
+    rows("rollback");
     support::syslog_lines();
-    return text + output;
+    return paths + output;
   }
-
-  HashHandle profile_;
-  HashHandle types_;
-  SqliteHandle db_;
 };
 
 // As one thread would list the files of a tree.
 std::string listed(const std::string& folder) {
   std::string text;
-  DIR* dir = opendir(folder.c_str());
-  while (const dirent* entry = dir != nullptr ? readdir(dir) : nullptr) {
+  const DirHandle dir(opendir(folder.c_str()));
+  while (const dirent* entry = dir ? readdir(dir.get()) : nullptr) {
     const std::string name = entry->d_name;
     if (entry->d_type == DT_REG) {
       text += folder + "/" + name + "\n";
     } else if (entry->d_type == DT_DIR && name != "." && name != ".." && name != "@eaDir") {
       text += listed(folder + "/" + name);
     }
-  }
-  if (dir != nullptr) {
-    closedir(dir);
   }
   return text;
 }
@@ -127,7 +106,7 @@ TEST_F(LookAheadTest, TellsWhatItCannotReadInItsPlace) {
   ASSERT_EQ(chmod(folder_.path().c_str(), 0755), 0);
   const uid_t user = geteuid();
   if (user == 0) {
-    sqlite3_exec(db_.get(), "pragma journal_mode=memory", nullptr, nullptr, nullptr);
+    rows("pragma journal_mode=memory");
     ASSERT_EQ(chmod(folder_.path("stat.db").c_str(), 0666), 0);
     ASSERT_EQ(seteuid(65534), 0);
   }

@@ -81,4 +81,29 @@ class ReportTest : public UnitTest {
   HashHandle shares_;
 };
 
+// With the statistics database open.
+class StatisticsTest : public ReportTest {
+ protected:
+  StatisticsTest() : db_(VORNReportDBInit(profile_.get())) {}
+
+  // All rows of a query, columns joined with '|' and rows with a line feed.
+  static std::string rows(sqlite3* db, const std::string& sql) {
+    std::string text;
+    const auto add = [](void* out, int count, char** values, char**) {
+      auto& all = *static_cast<std::string*>(out);
+      for (int i = 0; i < count; ++i) {
+        all += std::string(i == 0 ? "" : "|") + (values[i] != nullptr ? values[i] : "NULL");
+      }
+      all += "\n";
+      return 0;
+    };
+    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), add, &text, nullptr), SQLITE_OK) << sql;
+    return text;
+  }
+  std::string rows(const std::string& sql) const { return rows(db_.get(), sql); }
+
+  SqliteHandle db_;
+  HashHandle types_{VLIBCSzHashAlloc(8)};
+};
+
 }  // namespace vornreport

@@ -30,10 +30,8 @@ unsigned long long open_to_sigterm() {
   return count;
 }
 
-class StatementsAheadTest : public ReportTest {
+class StatementsAheadTest : public StatisticsTest {
  protected:
-  StatementsAheadTest() : db_(VORNReportDBInit(profile_.get())) {}
-
   std::string path() const { return folder_.path("stat.db"); }
 
   // All that a caller sees of a statement; a callback stops it at its row `stop`.
@@ -62,8 +60,6 @@ class StatementsAheadTest : public ReportTest {
     return seen.text + std::to_string(result) + (message != nullptr ? message : "(null)") +
            std::to_string(errno);
   }
-
-  SqliteHandle db_;
 };
 
 // Without a database to run on, all must come from the threads.
