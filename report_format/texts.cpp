@@ -236,7 +236,7 @@ std::string Texts::number(double value, int digits) const {
 }
 
 std::string Texts::size(std::uint64_t bytes) const {
-  constexpr std::array kUnits{"B", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
+  constexpr std::array kUnits{"", "Ki", "Mi", "Gi", "Ti", "Pi", "Ei"};
   constexpr double kUnit = 1024.0;
   constexpr double kNearlyOne = 1023.5;  // which would show as 1024
   auto count = static_cast<double>(bytes);
@@ -245,7 +245,10 @@ std::string Texts::size(std::uint64_t bytes) const {
     count /= kUnit;
     ++unit;
   }
-  return number(count, count < 10 ? 2 : count < 100 ? 1 : 0) + "\u00a0" + kUnits[unit];
+  return number(count, count < 10    ? 2
+                       : count < 100 ? 1
+                                     : 0) +
+         "\u00a0" + kUnits[unit] + (find(kFacts, "unit") == nullptr ? "B" : *find(kFacts, "unit"));
 }
 
 std::string Texts::percent(double value) const {

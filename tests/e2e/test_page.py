@@ -89,9 +89,13 @@ class Page(ProductTest):
         self.m.options += ['--bind', '/bin/false', os.path.realpath('/sbin/repquota')]
         self.assertNotEqual(self.make('broken'), [])
 
-        tests = sorted((ROOT / 'tests/page').glob('*.test.mjs'))
+        # Made-up servers, of every kind.
+        for kind in ('server', 'huge', 'damaged'):
+            subprocess.run([ROOT / 'tools/demo_page.py', self.pages / kind, '--kind', kind, '--build', BUILD],
+                           check=True, stdout=subprocess.DEVNULL)
+
         done = subprocess.run(
-            ['node', '--test', *tests], stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True,
+            ['node', ROOT / 'tests/page/all.mjs'], stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True,
             env=os.environ | {'VORN_PAGES': str(self.pages), 'VORN_FORMAT': str(BUILD / 'report_format.json'),
                               'VORN_NODE_MODULES': str(BUILD / 'reportUI/page/node_modules')})
         self.assertEqual(done.returncode, 0, done.stdout)

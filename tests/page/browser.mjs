@@ -24,7 +24,7 @@ export const dictionary = code => JSON.parse(fs.readFileSync(path.join(SOURCE, `
 export const read = (name, file) => fs.readFileSync(fileOf(name, file), 'utf8');
 
 const folder = fs.mkdtempSync('/var/tmp/vorn-page-');
-let browser, copies = 0;
+let browser, plain, copies = 0;
 before(async () => {
   browser = await chromium.launch({
     executablePath: '/usr/bin/chromium', env: {...process.env, HOME: folder},
@@ -36,6 +36,19 @@ after(async () => {
   fs.rmSync(folder, {recursive: true, force: true});
 });
 
+// The page is filled piece by piece.
+export const isReady = page => page.locator('body[data-ready]').waitFor({state: 'attached'});
+
+// What is folded gets its rows when it opens.
+export async function openAll(page) {
+  for (let deep = 0; deep < 3; ++deep) {
+    await page.evaluate(() => new Promise(resolve => {
+      document.querySelectorAll('details:not([open])').forEach(each => { each.open = true; });
+      setTimeout(resolve, 20);
+    }));
+  }
+}
+
 // Opens a page (its file, or its text, which then stands alone in a folder) and does `work` on it.
 // Whatever the page says on the console or asks of the network fails the test.
 export async function withPage(where, work, {address, silent = true, ...options} = {}) {
@@ -45,23 +58,36 @@ export async function withPage(where, work, {address, silent = true, ...options}
     fs.writeFileSync(file, where);
   }
   const url = address ?? `file://${file}`;
-  const context = await browser.newContext({
+  // A tab costs more than a page: those without wishes share one.
+  const isPlain = Object.keys(options).length === 0;
+  const context = isPlain && plain || await browser.newContext({
     viewport: {width: 1280, height: 800}, reducedMotion: 'reduce', ...options});
+  plain = isPlain ? context : plain;
+  const page = context.pages()[0] ?? await context.newPage();
+  const said = [];
+  const listeners = {
+    console: message => said.push(message.text()), pageerror: error => said.push(error.stack),
+    dialog: dialog => said.push('a dialog') && dialog.dismiss(),
+    request: request => request.url().split('#')[0] === url || said.push(`a request for ${request.url()}`)
+  };
   try {
-    const page = await context.newPage();
-    const said = [];
-    page.on('console', message => said.push(message.text()));
-    page.on('pageerror', error => said.push(error.stack));
-    page.on('dialog', dialog => said.push('a dialog') && dialog.dismiss());
-    page.on('request', request => request.url().split('#')[0] === url ||
-      said.push(`a request for ${request.url()}`));
+    Object.entries(listeners).forEach(([name, listener]) => page.on(name, listener));
     await page.goto(url);
+    if (options.javaScriptEnabled !== false) {
+      await isReady(page);
+    }
     await work(page, said);
     if (silent) {
       assert.deepEqual(said, []);
     }
   } finally {
-    await context.close();
+    Object.entries(listeners).forEach(([name, listener]) => page.off(name, listener));
+    if (isPlain) {
+      await page.evaluate(() => localStorage.clear());
+      await page.emulateMedia({media: null, forcedColors: null});
+    } else {
+      await context.close();
+    }
   }
 }
 
@@ -81,28 +107,21 @@ export function withBlock(page, variable, block) {
 
 export async function choose(page, language) {
   await page.locator('header select').first().selectOption(language);
+  await isReady(page);
 }
 
 export const textOf = (page, selector) => page.locator(selector).allInnerTexts();
 
 // No slip of arithmetic may leave its traces anywhere, attributes and all.
 export async function assertSensible(page) {
-  const found = await page.evaluate(() => {
-    const choice = document.querySelector('header select');
-    return [...choice.options].map(({value}) => {
-      const select = document.querySelector('header select');
-      select.value = value;
-      select.dispatchEvent(new Event('change'));
-      const html = document.querySelector('header').outerHTML + document.querySelector('main').outerHTML;
-      return /.{0,80}(NaN|Infinity|undefined|\bnull\b|(?<![\d.,])1970(?![\d.,])).{0,80}/.exec(html)?.[0];
-    });
-  });
-  assert.deepEqual(found, LANGUAGES.map(() => undefined));
-  await choose(page, 'en');
+  await openAll(page);
+  const html = await page.evaluate(
+    () => document.querySelector('header').outerHTML + document.querySelector('main').outerHTML);
+  assert.equal(/.{0,80}(NaN|Infinity|undefined|\bnull\b|\[object|(?<![\d.,])1970(?![\d.,])).{0,80}/.exec(html)?.[0], undefined);
 }
 
 // What a reader finds in each section: notes, captions of its tables, and their rows of cells.
-export const sections = page => page.evaluate(() => Object.fromEntries(
+export const sections = page => openAll(page).then(() => page.evaluate(() => Object.fromEntries(
   [...document.querySelectorAll('section[data-report]')].map(part => {
     const texts = (root, selector) => [...root.querySelectorAll(selector)].map(
       element => element.textContent.replaceAll('\u00a0', ' '));
@@ -110,7 +129,7 @@ export const sections = page => page.evaluate(() => Object.fromEntries(
       heading: part.querySelector('h2').textContent, notes: texts(part, '.note'),
       captions: texts(part, 'caption'),
       rows: [...part.querySelectorAll('tbody tr')].map(row => texts(row, 'th, td'))}];
-  })));
+  }))));
 export const section = async (page, name) => (await sections(page))[name];
 
 // A server of a page, on loopback.

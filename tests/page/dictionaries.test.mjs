@@ -28,6 +28,7 @@ test('every code and every report has its text', () => {
   known('attention', Object.keys(FORMAT.attention));
   known('incidents', FORMAT.incidents);
   known('reports', [...ALL, 'duplicate_file0', 'duplicate_file1']);
+  known('nav', [...ALL, 'incidents']);
   for (const [code, {values, section}] of Object.entries(FORMAT.attention)) {
     const given = [...Object.keys(values), ...'days' in values ? ['outlook'] : []];
     assert.deepEqual(placeholders(en.attention[code]).filter(name => !given.includes(name)), [], code);
@@ -49,7 +50,7 @@ test('every text is used', () => {
     page: key => script.includes(`'${key}'`), columns: key => script.includes(`['${key}', '`),
     facts: key => script.includes(`'${key}'`), mail: key => program.includes(`"${key}"`),
     types: key => new RegExp(`(reportUI_file_type_|")${key}"`).test(program)};
-  const others = ['attention', 'incidents', 'reports'];  // exactly those of the format, above
+  const others = ['attention', 'incidents', 'reports', 'nav'];  // exactly those of the format, above
   for (const [group, texts] of Object.entries(en)) {
     if (typeof texts === 'object' && !others.includes(group)) {
       assert.deepEqual(Object.keys(texts).filter(key => !uses[group](key)), [], group);

@@ -14,6 +14,7 @@ const withClipboard = (name, work) => serve(read(name), address => withPage(
 test('names are shown exactly and do nothing', () => withPage(fileOf('hostile'), async page => {
   assert.match(await page.title(), /^Storage report – /);
   assert.equal(await page.locator('main img, main script, main iframe, main a[href^="http"]').count(), 0);
+  await page.locator('#large_file .more').click();
   const rows = await page.$$eval('#large_file tbody .path bdi', all => all.map(each => {
     each.querySelectorAll('.chip').forEach(chip => { chip.textContent = `[${chip.textContent}]`; });
     return each.textContent;
@@ -22,7 +23,7 @@ test('names are shown exactly and do nothing', () => withPage(fileOf('hostile'),
   assert.deepEqual(paths.slice(1, 1 + names.length), names.map(([, shown]) => shown));
   // The two shares, by their volume; and accounts that are no names of JavaScript.
   assert.deepEqual((await section(page, 'share_list')).rows.map(row => row[0]), ['big & small', 'docs']);
-  assert.deepEqual((await section(page, 'file_group')).captions, ['All files', 'john-doe', '007']);
+  assert.deepEqual((await section(page, 'file_group')).captions, ['File types', 'All files', 'john-doe', '007']);
   assert.equal((await section(page, 'duplicate_file')).heading, 'Confirmed duplicates (same content)');
 }));
 

@@ -10,7 +10,7 @@
 namespace support {
 
 inline void write_dictionaries(const std::string& folder) {
-  for (const std::string name : {"/en.json", "/de.json"}) {
+  for (const std::string name : {"/en.json", "/de.json", "/fr.json"}) {
     const auto at = [&](const char* lang) {
       return nlohmann::json::parse(read_file(VORN_TEST_SOURCE_DIR + (lang + name)));
     };

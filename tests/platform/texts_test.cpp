@@ -144,6 +144,7 @@ TEST_F(TextsTest, WriteSizesAndPercentagesAsThePageDoes) {
   for (const auto& [bytes, expected] : sizes) {
     EXPECT_EQ(std::regex_replace(expected, std::regex(" "), "\u00a0"), texts().size(bytes));
   }
+  EXPECT_EQ("1,5\u00a0Kio", texts("fr").size(1536));
   const std::pair<double, const char*> percents[] = {{0, "0%"},        {93.44, "93.4%"},
                                                      {99.96, "99.9%"}, {100, "100%"},
                                                      {110.04, "110%"}, {12.25, "12.3%"}};

@@ -9,7 +9,6 @@ const VALUE = /\s*(?:'((?:[^'\\]|\\.)*)'|([^\s',[\]{}]+))\s*(,|$)/y;
 const ROW = /^\[(.*?)\][\]}, ]*;?$/;  // quotes end any value, so the shortest match is the row
 const KEY = /^(?:'(.*)'|(.*?))\s*: \[$/;
 const PUNCTUATION = /^[\][{}, ;]*$/;
-const NAME = /^[\p{ID_Start}$_][\p{ID_Continue}$]*$/u;
 const PLAIN = {n: '\n', t: '\t', r: '\r', b: '\b', f: '\f', v: '\v', 0: '\0'};
 
 export function unescape(text) {
@@ -31,10 +30,6 @@ function valuesOf(inside) {
   return null;
 }
 
-function isOddKey(quoted, bare) {
-  return quoted === undefined && (!NAME.test(bare) || bare === '__proto__');
-}
-
 // The pieces of text that hold one block each.
 export function piecesOf(root) {
   return [...root.querySelectorAll('script')].flatMap(
@@ -52,7 +47,9 @@ function blockOf(pieces, variable) {
   return undefined;
 }
 
-// The rows of a report with `width` columns: {tables: Map of name to rows, whole, oddKeys}, or
+export const hasBlock = (pieces, variable) => blockOf(pieces, variable) !== undefined;
+
+// The rows of a report with `width` columns: {tables: Map of name to rows, whole}, or
 // undefined without a block. A report without named tables has one, named ''. `whole` is false when
 // a line is no row, or the end is missing.
 export function readReport(pieces, variable, width) {
@@ -62,7 +59,7 @@ export function readReport(pieces, variable, width) {
   }
   const {text, open} = block;
   const end = open === '[' ? /(?:^|\n)\]\s*;?\s*$/ : /\}\s*;?\s*$/;  // a row ends in a bracket, too
-  const result = {tables: new Map(), whole: end.test(text), oddKeys: []};
+  const result = {tables: new Map(), whole: end.test(text)};
   let rows;
   for (const line of text.trimEnd().split('\n')) {
     const key = KEY.exec(line);
@@ -70,9 +67,6 @@ export function readReport(pieces, variable, width) {
       const name = key[1] === undefined ? key[2] : unescape(key[1]);
       rows = result.tables.get(name) ?? [];
       result.tables.set(name, rows);
-      if (isOddKey(key[1], key[2])) {
-        result.oddKeys.push(name);
-      }
       continue;
     }
     if (PUNCTUATION.test(line)) {

@@ -23,8 +23,11 @@ const level = oneOf('ok', 'warning', 'critical');
 const forecast = record({
   state: oneOf('short', 'full', 'growing', 'shrinking', 'steady'), window: number,
   days: optional(number), days_low: optional(number), days_high: optional(number),
-  jump: optional(record({date: time, bytes: number}))
+  per_day: optional(number), jump: optional(record({date: time, bytes: number}))
 });
+const cause = record({kind: text, share: text, name: text, bytes: number, since: optional(time)});
+const since = optional(record({since: time, files: number, bytes: number}));
+const grown = optional(record({last: since, week: since, month: since}));
 const sample = value => ({date: time(value?.[0]), used: number(value?.[1])});
 
 const readFields = record({
@@ -34,9 +37,16 @@ const readFields = record({
   volumes: list(record({id: text, path: text, size: number, used: number, free: number,
                         percent: number, level, forecast, samples: list(sample),
                         explained: optional(number), outside: optional(number),
-                        grown_by: optional(list(() => null))})),
-  shares: optional(list(record({volume: text, index: value => value === true}))),
+                        filled_by: list(cause), grown_by: optional(list(cause))})),
+  shares: optional(list(record({name: text, path: text, volume: text, files: number, bytes: number,
+                                index: value => value === true, grown, samples: list(sample)}))),
+  owners: optional(list(record({name: text, files: number, bytes: number, grown, places: list(record({
+    share: text, volume: text, files: number, bytes: number}))}))),
+  types: optional(list(record({type: text, files: number, bytes: number, grown, shares: list(record({
+    share: text, files: number, bytes: number}))}))),
+  ages: optional(list(record({age: text, files: number, bytes: number}))),
   quotas: optional(list(() => null)),
+  duplicates: optional(record({mode: text, groups: number, files: number, reclaimable: number})),
   attention: list(record({level, code: text, section: text, values: value => value ?? {}})),
   reports: list(record({name: text, rows: number, shown: number, limit: optional(number),
                         csv: optional(text), ok: value => value !== false}))
@@ -50,8 +60,8 @@ export function readFacts(pieces) {
     return undefined;
   }
   const facts = readFields(json);
-  for (const volume of facts.volumes) {
-    volume.samples = volume.samples.filter(({date}) => date > 0);
+  for (const each of [...facts.volumes, ...facts.shares ?? []]) {
+    each.samples = each.samples.filter(({date}) => date > 0);
   }
   facts.reports = new Map(facts.reports.map(report => [report.name, report]));
   return facts;

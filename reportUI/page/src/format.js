@@ -1,20 +1,22 @@
 // Texts, numbers, sizes and times in the chosen language and the server's time zone.
 
 export const UNKNOWN = '–';
-const UNITS = ['B', 'KiB', 'MiB', 'GiB', 'TiB', 'PiB', 'EiB'];
+const UNITS = ['', 'Ki', 'Mi', 'Gi', 'Ti', 'Pi', 'Ei'];
 
 const dictionaries = new Map();
 const formatters = new Map();  // making one takes longer than using it a hundred times
 let language = 'en';
 let zone = 'UTC';
 
-function dateFormat(options, code = language) {
-  const key = JSON.stringify([code, options]);
+function formatter(Kind, options, code = language) {
+  const key = JSON.stringify([Kind.name, code, options]);
   if (!formatters.has(key)) {
-    formatters.set(key, new Intl.DateTimeFormat(code, options));
+    formatters.set(key, new Kind(code, options));
   }
   return formatters.get(key);
 }
+const dateFormat = (options, code) => formatter(Intl.DateTimeFormat, options, code);
+const numberFormat = options => formatter(Intl.NumberFormat, options);
 
 // The dictionaries stand in the page as JSON; one that a slip of the pen broke is left out.
 export function loadDictionaries(root) {
@@ -64,15 +66,6 @@ export function sayNodes(key, values, group = 'page') {
 }
 export const nameOf = (group, key) => find(group, key) ?? key.replaceAll('_', ' ');
 
-// A number of a colour for each name, the same in all drawings.
-const series = new Map();
-export function seriesOf(name) {
-  if (!series.has(name)) {
-    series.set(name, series.size % 8);
-  }
-  return series.get(name);
-}
-
 // Volumes are called by the path at which they are mounted; the blocks call some by a shorter name.
 let paths = new Map();
 export function callVolumes(known) {
@@ -84,22 +77,16 @@ export const isNumber = text => /^[0-9]+$/.test(text);
 
 // A count: 12,345.
 export function number(value) {
-  return Number.isFinite(Number(value)) ? Number(value).toLocaleString(language) : UNKNOWN;
+  return Number.isFinite(Number(value)) ? numberFormat({}).format(Number(value)) : UNKNOWN;
 }
 
-// `value` rounded as the mail and the terminal round it: of its exact value, and a tie to the even
-// digit.
-function rounded(value, digits) {
-  const up = Number(value.toFixed(digits));  // where a tie goes up
-  const isTie = value * 2 ** (digits + 1) % 2 === 1;
-  const isOdd = Math.round(up * 10 ** digits) % 2 === 1;
-  return isTie && isOdd ? Number((up - 10 ** -digits).toFixed(digits)) : up;
-}
+// A half goes up, as in the mail and the terminal.
+const rounded = (value, digits) => Number(value.toFixed(digits));
 
 // A figure as mail and terminal write it, too: at most `digits` decimals, no groups.
 export function figure(value, digits = 0) {
-  return Number.isFinite(value) ? rounded(value, digits).toLocaleString(
-    language, {useGrouping: false, maximumFractionDigits: digits}) : UNKNOWN;
+  return Number.isFinite(value) ? numberFormat(
+    {useGrouping: false, maximumFractionDigits: digits}).format(rounded(value, digits)) : UNKNOWN;
 }
 
 export function size(value) {
@@ -112,7 +99,7 @@ export function size(value) {
     count /= 1024;
     ++unit;
   }
-  return `${figure(count, count < 10 ? 2 : count < 100 ? 1 : 0)}\u00a0${UNITS[unit]}`;
+  return `${figure(count, count < 10 ? 2 : count < 100 ? 1 : 0)}\u00a0${UNITS[unit]}${say('unit', {}, 'facts')}`;
 }
 
 // A change: with its sign, and the true minus.
@@ -124,13 +111,22 @@ export const numberChange = value => isSigned(value) ?
 export const sizeChange = value => isSigned(value) ?
   signed(Number(value), size(magnitude(value))) : UNKNOWN;
 
-export const exactSize = value => say('bytes', {n: BigInt(value).toLocaleString(language)});
+export const exactSize = value => say('bytes', {n: numberFormat({}).format(BigInt(value))});
 
 // `value` is a number of hundredths. What is below 100 is never rounded to it: it isn't full yet.
 export function percent(value) {
   return Number.isFinite(value) && value >= 0 ?
-    (rounded(value < 100 ? Math.min(value, 99.9) : value, 1) / 100).toLocaleString(
-      language, {style: 'percent', maximumFractionDigits: 1, useGrouping: false}) : UNKNOWN;
+    numberFormat({style: 'percent', maximumFractionDigits: 1, useGrouping: false}).format(
+      rounded(value < 100 ? Math.min(value, 99.9) : value, 1) / 100) : UNKNOWN;
+}
+
+// A span of days, in years where those are whole: "7–30 days", "1–3 years", "< 7 days".
+export function days(low, high) {
+  const isYears = (low === 0 ? high : low) % 365 === 0;
+  const unit = count => numberFormat({style: 'unit', unit: isYears ? 'year' : 'day', unitDisplay: 'long'})
+    .format(isYears ? count / 365 : count);
+  return low === 0 ? `< ${unit(high)}` : high === undefined ? `≥ ${unit(low)}` :
+    `${isYears && high % 365 === 0 ? low / 365 : low}–${unit(high)}`;
 }
 
 // `seconds` since the epoch; a time of 0 or before stands for none.

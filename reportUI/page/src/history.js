@@ -1,42 +1,26 @@
-// The drawing of the volumes over time, with the forecast and its range.
-import {axisBottom, axisLeft} from 'd3-axis';
+// The volumes over time: a drawing for each, of the same scale and with one axis of time, and what a
+// pointer or the arrow keys point at.
 import {scaleLinear, scaleUtc} from 'd3-scale';
-import {select} from 'd3-selection';
 import {line} from 'd3-shape';
 
-import {h, shownPlain, svg} from './dom.js';
+import {drawnIn} from './charts.js';
+import {h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
-import {jumpText} from './outlook.js';
+import {jumpText, outlookText} from './outlook.js';
 import {table} from './table.js';
 
 const DAY = 86400;
-const WIDTH = 1180, LEAST_HEIGHT = 320, LEFT = 56, RIGHT = 12, TOP = 18, BOTTOM = 28;
-const LABEL_HEIGHT = 17;
-const BELOW = 15;  // of a label beside a line that goes up, so that it covers nothing of it
-const DIAMOND = 'M0-6.5 6.5 0 0 6.5-6.5 0Z';
-
-// Labels beside the newest samples, pushed apart so that none covers another. The last is at
-// `lowest` at most.
-function spread(labels, lowest) {
-  labels.sort((one, two) => one.y - two.y);
-  labels.forEach((label, i) => {
-    label.at = Math.max(label.y, i ? labels[i - 1].at + LABEL_HEIGHT : TOP);
-  });
-  for (let i = labels.length - 1; i >= 0; --i) {
-    labels[i].at = Math.min(labels[i].at, lowest - (labels.length - 1 - i) * LABEL_HEIGHT);
-  }
-  return labels;
-}
-
-const cut = (text, length) => text.length > length ? `…${text.slice(1 - length)}` : text;
+const HEIGHT = 128, LEFT = 40, RIGHT = 8, TOP = 8, BOTTOM = 20;
+const DIAMOND = 'M0-6 6 0 0 6-6 0Z';
+const TICK_WIDTH = 84;
 
 const isGrowing = ({forecast}) => forecast.state === 'growing' && forecast.days !== undefined;
 const percentAt = ({size}, used) => used / size * 100;
 
 // The line of a volume: its samples, and what it holds now.
 function pointsOf(volume, now) {
-  return [...volume.samples.map(({date, used}) => ({date, percent: percentAt(volume, used)})),
-          {date: now, percent: percentAt(volume, volume.used)}];
+  const points = volume.samples.map(({date, used}) => ({date, percent: percentAt(volume, used)}));
+  return points.at(-1)?.date > now - DAY ? points : [...points, {date: now, percent: percentAt(volume, volume.used)}];
 }
 
 // The dashed line and the band around it, as points, up to where the volume is full or to `last`,
@@ -53,86 +37,128 @@ function forecastOf(volume, from, last) {
           band: [from, soonest, {date: latest.date, percent: soonest.percent}, latest]};
 }
 
-function axes({x, y, height, days}) {
-  const dayFormat = days > 300 ? {year: 'numeric', month: 'short'} : {month: 'short', day: 'numeric'};
-  // One at the very edge would be cut.
-  const ticks = x.ticks(Math.min(7, Math.max(2, Math.floor(days)))).filter(
-    date => x(date) < WIDTH - 36);
-  return [
-    [axisBottom(x).tickValues(ticks).tickFormat(date => format.wallDay(+date, dayFormat)),
-     `translate(0,${height - BOTTOM})`],
-    [axisLeft(y).tickValues([0, 25, 50, 75, 100]).tickFormat(format.percent)
-      .tickSize(LEFT + RIGHT - WIDTH), `translate(${LEFT},0)`]].map(([axis, transform]) => {
-    const group = svg('g', {class: 'axis', transform});
-    select(group).call(axis.tickPadding(8)).attr('font-family', null).attr('font-size', null);
-    return group;
-  });
+// The time that all drawings show: what was, and at most half as much of what will be.
+function spanOf(volumes, now) {
+  const first = Math.min(now - DAY, ...volumes.map(({samples}) => samples[0]?.date ?? now));
+  const days = volumes.filter(isGrowing).map(({forecast}) => forecast.days_high ?? forecast.days);
+  const past = now - first;
+  return {first, now, last: now + Math.min(Math.max(past / 20, Math.max(0, ...days) * DAY * 1.05), past / 2)};
 }
 
-function seriesElement(volume, {now, last, x, y}) {
+function axes({x, y, width, first, last}) {
+  const days = (last - first) / DAY;
+  const dayFormat = days > 300 ? {year: 'numeric', month: 'short'} : {month: 'short', day: 'numeric'};
+  // One at the very edge would be cut.
+  const ticks = x.ticks(Math.max(2, Math.min(Math.floor(days), Math.floor(width / TICK_WIDTH)))).filter(
+    date => x(date) < width - 30 && x(date) > LEFT + 10);
+  return svg('g', {class: 'axis'},
+    ...[0, 50, 100].flatMap(percent => [
+      svg('line', {x1: LEFT, x2: width - RIGHT, y1: y(percent), y2: y(percent),
+                   class: percent === 100 ? 'limit' : ''}),
+      svg('text', {x: LEFT - 6, y: y(percent) + 4, 'text-anchor': 'end'}, format.percent(percent))]),
+    ...ticks.map(date => svg('text', {x: x(date), y: HEIGHT - 4, 'text-anchor': 'middle'},
+                             format.wallDay(+date, dayFormat))));
+}
+
+function draw(volume, points, span, width) {
+  const x = scaleUtc([format.wallClock(span.first), format.wallClock(span.last)], [LEFT, width - RIGHT]);
+  const y = scaleLinear([0, 100], [HEIGHT - BOTTOM, TOP]);
   const at = ({date, percent}) => [x(format.wallClock(date)), y(percent)];
-  const path = points => line()(points.map(at));
-  const points = pointsOf(volume, now);
+  const path = list => line()(list.map(at));
   const current = points.at(-1);
-  const group = svg('g', {class: `line series${format.seriesOf(volume.id)}`},
-                    svg('title', {}, shownPlain(volume.path)));
+  const [cx, cy] = at(current);
+  const group = svg('g', {class: `line ${volume.level}`});
   if (isGrowing(volume)) {
-    const {dashed, band} = forecastOf(volume, current, last);
+    const {dashed, band} = forecastOf(volume, current, span.last);
     group.append(svg('path', {class: 'range', d: `${path(band)}Z`}),
                  svg('path', {class: 'forecast', d: path(dashed)}));
   }
-  group.append(svg('path', {d: path(points)}));
+  group.append(svg('path', {class: 'past', d: path(points)}));
   const {jump} = volume.forecast;
   if (jump) {
     const place = at(points.find(({date}) => date >= jump.date) ?? current);
     group.append(svg('path', {class: 'jump', d: DIAMOND, transform: `translate(${place})`},
-                     svg('title', {}, `${shownPlain(volume.path)}: ${jumpText(jump)}`)));
+                     svg('title', {}, jumpText(jump))));
   }
-  const [cx, cy] = at(current);
-  group.append(svg('circle', {r: 3.5, cx, cy}));
-  return {group, from: cy, y: isGrowing(volume) ? cy + BELOW : cy};
+  const cursor = svg('line', {class: 'cursor', x1: cx, x2: cx, y1: TOP, y2: y(0)});
+  const dot = svg('circle', {r: 3.5, cx, cy});
+  group.append(dot);
+  const drawing = svg('svg', {class: 'history', viewBox: `0 0 ${width} ${HEIGHT}`},
+                      axes({x, y, width, ...span}),
+                      svg('line', {class: 'today', x1: cx, x2: cx, y1: TOP, y2: y(0)}), group, cursor);
+  return {drawing, dateAt: left => +x.invert(left), point: to => {
+    const [left, top] = at(to);
+    cursor.setAttribute('x1', left);
+    cursor.setAttribute('x2', left);
+    dot.setAttribute('cx', left);
+    dot.setAttribute('cy', top);
+  }};
 }
 
-function drawHistory(volumes, now, label) {
-  const first = Math.min(now - DAY, ...volumes.map(({samples}) => samples[0]?.date ?? now));
-  const days = volumes.filter(isGrowing).map(
-    ({forecast}) => forecast.days_high ?? forecast.days);
-  // The time to come gets room for the labels, and at most half as much as the time that was.
-  const past = now - first;
-  const last = now + Math.min(Math.max(past / 4, Math.max(0, ...days) * DAY * 1.05), past / 2);
-  const height = Math.max(LEAST_HEIGHT, TOP + BOTTOM + volumes.length * LABEL_HEIGHT);
-  const x = scaleUtc([format.wallClock(first), format.wallClock(last)], [LEFT, WIDTH - RIGHT]);
-  const y = scaleLinear([0, 100], [height - BOTTOM, TOP]);
-  const today = x(format.wallClock(now));
-
-  const drawing = svg('svg', {class: 'history', viewBox: `0 0 ${WIDTH} ${height}`, role: 'img',
-                              'aria-label': label},
-    ...axes({x, y, height, days: (last - first) / DAY}),
-    svg('line', {class: 'limit', x1: LEFT, x2: WIDTH - RIGHT, y1: y(100), y2: y(100)}),
-    svg('line', {class: 'today', x1: today, x2: today, y1: TOP, y2: y(0)}),
-    svg('text', {class: 'mark', x: today - 5, y: y(0) - 6, 'text-anchor': 'end'},
-        format.say('today')));
-  const labels = volumes.map(volume => ({volume, ...seriesElement(volume, {now, last, x, y})}));
-  drawing.append(...labels.map(({group}) => group));
-  for (const {group, volume, from, y: wanted, at} of spread(labels, height - BOTTOM)) {
-    if (at !== wanted) {  // a thin line tells whose label it is
-      group.append(svg('path', {class: 'leader', d: `M${today + 3},${from}l6,${at - from}`}));
-    }
-    drawing.append(svg('text', {class: 'label', x: today + 10, y: at + 4},
-                       svg('title', {}, shownPlain(volume.path)),
-                       cut(shownPlain(volume.path), 24)));
+// The drawing of one volume. `point` shows its sample nearest to a moment, or the newest again.
+class Chart {
+  constructor(volume, span, pointAll) {
+    this.points = pointsOf(volume, span.now);
+    this.said = h('span', {class: 'said-value'});
+    this.path = volume.path;
+    const place = drawnIn(h('div', {class: 'place'}), width => {
+      this.drawn = draw(volume, this.points, span, width);
+      place.replaceChildren(this.drawn.drawing);
+    });
+    place.addEventListener('pointermove', ({clientX}) => pointAll(
+      this.drawn?.dateAt(clientX - place.getBoundingClientRect().left)));
+    this.element = h('div', {class: `chart ${volume.level}`, title: shownPlain(volume.path)},
+                     h('div', {class: 'head'}, h('b', {}, shown(volume.path)), this.said,
+                       h('span', {class: 'ahead'}, outlookText(volume))), place);
+    this.point();
   }
-  return drawing;
+
+  // `wall`: milliseconds of the server's clock. The words for the point.
+  point(wall) {
+    const found = wall === undefined ? this.points.at(-1) : this.points.reduce((best, each) =>
+      Math.abs(format.wallClock(each.date) - wall) < Math.abs(format.wallClock(best.date) - wall) ? each : best);
+    this.said.textContent = `${wall === undefined ? '' : `${format.day(found.date)}: `}${format.percent(found.percent)}`;
+    this.drawn?.point(found);
+    return `${shownPlain(this.path)} ${format.percent(found.percent)}`;
+  }
 }
 
 function historyTable(volumes) {
   const rows = volumes.flatMap(volume => volume.samples.map(({date, used}) => [
     volume.path, String(date), String(percentAt(volume, used))]));
   return table([['volume', 'name'], ['time', 'time'], ['percent', 'percent']], rows.reverse(),
-               {caption: format.say('history')});
+               {key: 'volume_usage.samples', caption: format.say('history')});
 }
 
-// The drawing with its data as a table; a note when there is nothing to draw.
+// All drawings. Pointed at one, all say what they held then; arrow keys do the same.
+function drawings(volumes, span) {
+  const days = Math.round((span.now - span.first) / DAY);
+  const figure = h('div', {class: 'charts', role: 'slider', tabindex: 0, 'aria-label': format.say('history'),
+                           'aria-valuemin': -days, 'aria-valuemax': 0});
+  const point = (wall, ago) => {
+    const words = charts.map(chart => chart.point(wall));
+    figure.setAttribute('aria-valuenow', -ago);
+    figure.setAttribute('aria-valuetext', `${format.day(span.now - ago * DAY)}: ${words.join(', ')}`);
+  };
+  const charts = volumes.map(volume => new Chart(volume, span, wall => wall !== undefined && point(
+    wall, Math.max(0, Math.round((format.wallClock(span.now) - wall) / DAY / 1000)))));
+  let ago = 0;
+  figure.addEventListener('pointerleave', () => point(undefined, 0));
+  figure.addEventListener('keydown', event => {
+    const step = {ArrowLeft: 1, ArrowDown: 1, ArrowRight: -1, ArrowUp: -1, PageDown: 7, PageUp: -7,
+                  Home: days, End: -days}[event.key];
+    if (step) {
+      event.preventDefault();
+      ago = Math.max(0, Math.min(days, ago + step));
+      point(ago ? format.wallClock(span.now - ago * DAY) : undefined, ago);
+    }
+  });
+  figure.append(...charts.map(({element}) => element));
+  point(undefined, 0);
+  return figure;
+}
+
+// The drawings with their data as a table; a note when there is nothing to draw.
 export function history(volumes, finished) {
   const drawn = volumes.filter(({size}) => size > 0);
   if (drawn.every(({samples}) => samples.length < 2)) {
@@ -144,7 +170,5 @@ export function history(volumes, finished) {
     ([, isThere]) => isThere).map(([key]) => format.say(key)).join(' ');
   const details = h('details', {}, h('summary', {}, format.say('chartData')));
   details.addEventListener('toggle', () => details.append(historyTable(drawn)), {once: true});
-  return [h('p', {class: 'lead'}, text),
-          h('div', {class: 'scroll', role: 'group', tabindex: 0,
-                    'aria-label': format.say('history')}, drawHistory(drawn, now, text)), details];
+  return [h('p', {class: 'lead'}, text), drawings(drawn, spanOf(drawn, now)), details];
 }

@@ -1,14 +1,17 @@
 // Builds the page from the data blocks that stand in it. See data.js for what those are.
 import {copyOriginals, h, shown, shownPlain} from './dom.js';
-import {piecesOf, readReport, readVariable} from './data.js';
+import {forgetDrawings} from './charts.js';
+import {hasBlock, piecesOf, readReport, readVariable} from './data.js';
 import {readFacts} from './facts.js';
 import * as format from './format.js';
 import {fillSection, REPORTS} from './sections.js';
-import {attention, incidents, marksOf} from './summary.js';
-import {card, levelElement} from './volumes.js';
+import {followAnchor, keep, readAddress, stateOf} from './state.js';
+import {attention, glance, incidents, marksOf, next} from './summary.js';
+import {forgetTables, foundIn, isSought, seek} from './table.js';
+import {cards, levelElement} from './volumes.js';
 
 const THEMES = {system: 'themeSystem', light: 'themeLight', dark: 'themeDark'};
-const MOST_BESIDE = 8;  // cards of volumes beside what needs attention
+const MOST_BESIDE = 6;  // cards of volumes that stand beside what needs attention
 const main = document.querySelector('main');
 const header = document.querySelector('header');
 const blocks = document.getElementById('data').content;
@@ -16,19 +19,22 @@ const pieces = piecesOf(blocks);
 const written = new Map([...main.querySelectorAll('section[data-report]')].map(
   section => [section.dataset.report, section]));
 
-function read() {
-  const data = new Map();
-  for (const [name, {variable, columns, mode}] of Object.entries(REPORTS)) {
-    const report = written.has(name) && readReport(pieces, variable, columns);
+// Each block is read when its section is filled.
+const data = new Map();
+function read(name) {
+  if (!data.has(name) && written.has(name) && REPORTS[name]) {
+    const {variable, columns, mode} = REPORTS[name];
+    const report = readReport(pieces, variable, columns);
     if (report) {
       report.mode = mode && readVariable(pieces, mode);
       report.heading = name + (report.mode ?? '');
-      data.set(name, report);
     }
+    data.set(name, report);
   }
-  return data;
+  return data.get(name);
 }
-const data = read();
+const has = name => written.has(name) && hasBlock(pieces, REPORTS[name].variable);
+const others = {has, shareRows: () => [...read('share_list')?.tables.values() ?? []].flat()};
 const facts = readFacts(pieces);
 const marks = marksOf(facts, written);
 // What the frame says serves only where the facts are missing.
@@ -39,7 +45,7 @@ const made = facts?.finished || main.dataset.time;
 // Which of the reports without a block have just found nothing: the head knows their number.
 function emptyReports() {
   const without = [...written.keys()].filter(
-    name => !data.has(name) && REPORTS[name] && !REPORTS[name].always).length;
+    name => REPORTS[name] && !REPORTS[name].always && !has(name)).length;
   const {empty} = document.body.dataset;
   return Number(empty) >= without ? 'all' : Number(empty) === 0 ? 'none' : 'some';
 }
@@ -54,12 +60,57 @@ function choice(label, options, chosen, change) {
 }
 
 const remember = {
-  get: () => { try { return localStorage.getItem('vorn-theme'); } catch { return null; } },
-  set: theme => { try { localStorage.setItem('vorn-theme', theme); } catch { /* not kept then */ } }
+  get: key => { try { return localStorage.getItem(`vorn-${key}`); } catch { return null; } },
+  set: (key, value) => { try { localStorage.setItem(`vorn-${key}`, value); } catch { /* not kept then */ } }
 };
 
 function setTheme(theme) {
   document.documentElement.dataset.theme = theme in THEMES ? theme : 'system';
+}
+
+// Looks in all tables, folded ones too: sections without a find step aside.
+function search(text) {
+  if (text) {
+    main.querySelectorAll('section[data-report] details:not([open])').forEach(each => {
+      each.open = true;
+      each.dataset.opened = '';
+    });
+  } else {
+    main.querySelectorAll('details[data-opened]').forEach(each => {
+      each.open = false;
+      delete each.dataset.opened;
+    });
+  }
+  // Folded tables are made when they open, which a browser tells in a task of its own.
+  setTimeout(() => {
+    seek(text);
+    let all = 0;
+    for (const [name, section] of written) {
+      const found = isSought() ? foundIn(section) : 0;
+      all += found;
+      section.hidden = isSought() && !found;
+      const hits = main.querySelector(`nav a[href="#${name}"] .hits`);
+      if (hits) {
+        hits.textContent = found ? format.number(found) : '';
+      }
+    }
+    main.classList.toggle('searched', isSought());
+    header.querySelector('.hits').textContent = isSought() ? format.say('found', {n: format.number(all)}) : '';
+  });
+}
+
+function searchBox() {
+  const input = h('input', {type: 'search', value: stateOf('find'), placeholder: format.say('search'),
+                            'aria-label': format.say('search')});
+  let waiting;
+  input.addEventListener('input', () => {
+    clearTimeout(waiting);
+    waiting = setTimeout(() => {
+      keep('find', input.value.trim());
+      search(input.value.trim());
+    }, 150);
+  });
+  return h('span', {class: 'search'}, input, h('span', {class: 'hits', role: 'status'}));
 }
 
 function fillHeader() {
@@ -73,14 +124,15 @@ function fillHeader() {
         h('time', {datetime: format.isoTime(made)}, format.time(made)), ' ',
         h('span', {class: 'zone'}, format.zoneName(made)))),
     h('div', {class: 'controls'},
+      searchBox(),
       choice(format.say('language'), format.languages(), format.currentLanguage(), code => {
         format.chooseLanguage(code);
-        render();
-        header.querySelector('select').focus();
+        remember.set('language', code);
+        translate();
       }),
       choice(format.say('theme'), Object.entries(THEMES).map(
         ([theme, key]) => [theme, format.say(key)]), document.documentElement.dataset.theme,
-             theme => { setTheme(theme); remember.set(theme); }),
+             theme => { setTheme(theme); remember.set('theme', theme); }),
       print));
 }
 
@@ -96,56 +148,127 @@ function firstLook() {
     return [h('section', {id: 'no-facts'}, h('p', {}, levelElement('warning'), ' ',
                                              format.say('noFacts')))];
   }
-  const {volumes} = facts;
-  const cards = part('volumes', format.say('volumes'), volumes.length ?
-    h('div', {class: 'cards'}, ...volumes.map(card)) : null);
-  const notices = part('attention', format.say('attention'), attention(facts, written));
-  // Many cards take the whole width, and would push the rest out of sight.
-  const many = volumes.length > MOST_BESIDE;
+  const {volumes, finished} = facts;
   return [part('incidents', format.say(facts.complete ? 'incidents' : 'incomplete'),
                incidents(facts, written)),
-          cards || notices ? h('div', {class: many ? 'first many' : 'first'},
-                               ...many ? [notices, cards] : [cards, notices]) : null];
+          h('div', {class: volumes.length > MOST_BESIDE ? 'first many' : 'first'},
+            part('attention', format.say('attention'), attention(facts, written)),
+            part('volumes', format.say('volumes'), volumes.length ? cards(volumes, finished) : null),
+            part('next', format.say('next'), next(facts, written)),
+            part('glance', format.say('glance'), glance(facts, written)))];
 }
 
 function navigation(names) {
-  return h('nav', {'aria-label': format.say('sections')}, ...names.map(name => h(
-    'a', {href: `#${name}`}, name === 'volume_usage' ? format.say('history') :
-      format.nameOf('reports', name), marks.has(name) ? levelElement(marks.get(name), false) :
-      null)));
+  const links = names.map(name => h(
+    'a', {href: `#${name}`}, format.nameOf('nav', name), marks.has(name) ?
+      levelElement(marks.get(name), false) : null, h('span', {class: 'hits'})));
+  const all = [...facts?.incidents.length ? [h('a', {href: '#incidents', class: 'marked'}, format.nameOf(
+    'nav', 'incidents'), levelElement(facts.complete ? 'warning' : 'error', false))] : [], ...links];
+  return h('nav', {'aria-label': format.say('sections')}, ...all);
 }
 
-function render() {
+// Marks where the reader is.
+let seen;
+function watchPlaces() {
+  seen?.disconnect();
+  const inView = new Set();
+  const links = new Map([...main.querySelectorAll('nav a')].map(link => [link.hash.slice(1), link]));
+  seen = new IntersectionObserver(entries => {
+    entries.forEach(({target, isIntersecting}) => inView[isIntersecting ? 'add' : 'delete'](target.id));
+    const here = [...links.keys()].find(id => inView.has(id));
+    links.forEach((link, id) => id === here ? link.setAttribute('aria-current', 'true') :
+      link.removeAttribute('aria-current'));
+  }, {rootMargin: '-15% 0px -70% 0px'});
+  main.querySelectorAll('section').forEach(section => seen.observe(section));
+}
+
+const pause = () => new Promise(resolve => setTimeout(resolve));
+let turn = 0;
+
+// The first look at once, then a section in a task of its own, so that the page answers meanwhile.
+async function render() {
+  const mine = ++turn;
   document.documentElement.lang = format.currentLanguage();
   document.title = `${format.say('title')} – ${shownPlain(host)}`;
   document.querySelector('.skip').textContent = format.say('skip');
+  document.body.removeAttribute('data-ready');
+  forgetTables();
+  forgetDrawings();
   fillHeader();
   const names = [...Object.keys(REPORTS).filter(name => written.has(name)),
                  ...[...written.keys()].filter(name => !REPORTS[name])];
-  const empty = emptyReports();
   for (const name of names) {
     const section = written.get(name);
     section.id = name;
     section.setAttribute('aria-labelledby', `${name}-heading`);
-    fillSection(section, name, {data: data.get(name), facts, emptyReports: empty,
-                                mark: marks.get(name)});
   }
+  const everything = h('button', {type: 'button', class: 'everything'}, format.say('printAll'));
+  everything.addEventListener('click', printAll);
   main.replaceChildren(
     navigation(names), ...firstLook().filter(Boolean), ...names.map(name => written.get(name)),
-    h('footer', {}, h('p', {}, format.say('units', {zone: format.currentZone()}))));
-  // Where the drawing is wider than the screen, the time to come is what matters.
-  main.querySelector('.history')?.parentElement.scrollTo({left: 1e6});
+    h('footer', {}, h('p', {}, format.say('units', {zone: format.currentZone()})), everything));
+  const empty = emptyReports();
+  for (const name of names) {
+    await pause();
+    if (mine !== turn) {
+      return;
+    }
+    fillSection(written.get(name), name, {data: read(name), facts, emptyReports: empty,
+                                          mark: marks.get(name), others});
+  }
+  watchPlaces();
+  document.body.dataset.ready = '';
+  if (stateOf('find')) {
+    search(stateOf('find'));
+  }
+}
+
+// Another language, with the page where it is and what was open still open.
+async function translate() {
+  const open = [...main.querySelectorAll('details, .opener')].map(
+    each => each.open ?? each.getAttribute('aria-expanded') === 'true');
+  const parts = [...main.querySelectorAll('section')];
+  const here = parts.find(each => each.getBoundingClientRect().bottom > 0);
+  const before = here?.getBoundingClientRect().top;
+  const {scrollY} = window;
+  main.style.minBlockSize = `${main.offsetHeight}px`;
+  await render();
+  header.querySelector('select').focus({preventScroll: true});
+  [...main.querySelectorAll('details, .opener')].forEach((each, i) => {
+    if (open[i]) {
+      'open' in each ? each.open = true : each.click();
+    }
+  });
+  main.style.minBlockSize = '';
+  const now = here?.id && document.getElementById(here.id);
+  window.scrollTo({top: now ? window.scrollY + now.getBoundingClientRect().top - before : scrollY,
+                   behavior: 'instant'});
+}
+
+// A print holds what is shown; this one all there is.
+async function printAll() {
+  main.querySelectorAll('details:not([open])').forEach(each => { each.open = true; });
+  await pause();
+  main.querySelectorAll('button.more:not([hidden], .less)').forEach(each => each.click());
+  await new Promise(resolve => setTimeout(resolve, 500));
+  window.print();
 }
 
 format.loadDictionaries(document);
-format.chooseLanguage(readVariable(pieces, 'vornLang') ?? 'en');
+format.chooseLanguage(remember.get('language') ?? readVariable(pieces, 'vornLang') ?? 'en');
 format.chooseZone(facts?.time_zone || main.dataset.zone);
 format.callVolumes(facts?.volumes ?? []);
-// The same colours everywhere, and for the most pressing ones those that differ the most.
-facts?.volumes.forEach(({id}) => format.seriesOf(id));
-setTheme(remember.get() ?? 'system');
+setTheme(remember.get('theme') ?? 'system');
 document.addEventListener('copy', copyOriginals);
-render();
-if (location.hash) {
-  document.getElementById(decodeURIComponent(location.hash.slice(1)))?.scrollIntoView();
-}
+document.addEventListener('click', ({target}) => target.closest('.long')?.classList.toggle('open'));
+const place = readAddress();
+window.addEventListener('hashchange', () => {
+  if (followAnchor()) {
+    render();
+  }
+});
+render().then(() => {
+  if (place) {
+    document.getElementById(place)?.scrollIntoView();
+  }
+});

@@ -5,10 +5,12 @@ import {attention as FORMATS} from 'report_format';
 import {h, shown} from './dom.js';
 import * as format from './format.js';
 import {fillsText} from './outlook.js';
-import {sizeElement} from './table.js';
+import {ageOrder, sizeElement} from './table.js';
 import {levelElement} from './volumes.js';
 
-const MOST_INCIDENTS = 8;  // that stand open
+// Lines that stand open.
+const MOST_INCIDENTS = 5, MOST_WORRIES = 6, MOST_CALM = 5;
+const FEW_MORE = 2;  // that are shown rather than asked for
 
 // How a value is shown, by the kind that the program gives it.
 const KINDS = {
@@ -38,26 +40,70 @@ const linkTo = (report, sections, text) => sections.has(report) ?
 
 function attentionLine(entry, sections) {
   const {level, code, section} = entry;
-  return line(level, level === 'ok' ? h('span', {class: 'level', 'aria-hidden': 'true'}, '›') :
-    levelElement(level, false),
+  return line(level, level === 'ok' ? null : levelElement(level, false),
               linkTo(section, sections, format.sayNodes(code, valuesOf(entry), 'attention')));
 }
+
+// A list of which a long one's rest is folded, and says how many there are.
+function cutList(lines, most) {
+  const list = part => h('ul', {class: 'notices'}, ...part);
+  const shown = lines.length <= most + FEW_MORE ? lines.length : most;
+  return [list(lines.slice(0, shown)), lines.length > shown ? h('details', {},
+    h('summary', {}, format.say('andMore', {n: format.number(lines.length - shown)})),
+    list(lines.slice(shown))) : null];
+}
+
+const isWorry = ({level}) => level !== 'ok';
+const isGain = ({code}) => code.startsWith('duplicates_');  // what can be done about it, see next()
 
 // What needs attention, each line with a link to its section. `sections`: names of those that the
 // page has. Null when the run has looked at nothing that may need some.
 export function attention({attention: found, volumes, quotas}, sections) {
-  const isCalm = found.every(({level}) => level === 'ok') && (volumes.length || quotas);
-  const content = [
-    isCalm ? h('p', {}, format.say('nothing')) : null,
-    found.length ? h('ul', {class: 'notices'}, ...found.map(
-      entry => attentionLine(entry, sections))) : null].filter(Boolean);
-  return content.length ? h('div', {}, ...content) : null;
+  const worries = found.filter(isWorry);
+  if (!worries.length) {
+    return volumes.length || quotas ? h('p', {class: 'calm'}, format.say('nothing')) : null;
+  }
+  return h('div', {}, ...cutList(worries.map(entry => attentionLine(entry, sections)), MOST_WORRIES)
+    .filter(Boolean));
 }
 
-// The report that an incident concerns, if any: a share may be called like one.
-function reportOf({kind, what}, sections) {
-  return sections.has(what) && !/^(share|index)_/.test(kind) ? what : undefined;
+// What the run found besides, for which there is nothing to do. Null without any.
+export function glance({attention: found}, sections) {
+  const calm = found.filter(entry => !isWorry(entry) && !isGain(entry));
+  return calm.length ? h('div', {}, ...cutList(calm.map(entry => attentionLine(entry, sections)),
+                                               MOST_CALM).filter(Boolean)) : null;
 }
+
+const sumOf = (list, isMeant) => (list ?? []).filter(isMeant).reduce((sum, {bytes}) => sum + bytes, 0);
+const OLD = 1095;  // days
+const PASSING = ['temporary', 'log'].map(name => `reportUI_file_type_${name}`);
+
+// What could give space back, the most first: the sums are the facts', each for itself, since a file
+// may be in more than one.
+export function next({duplicates, ages, types, volumes}, sections) {
+  const [outside] = volumes.toSorted((one, two) => (two.outside ?? 0) - (one.outside ?? 0));
+  const steps = [
+    [duplicates?.reclaimable ?? 0, 'duplicate_file',
+     duplicates?.mode === 'content' ? 'nextConfirmed' : 'nextPossible'],
+    [sumOf(ages, ({age}) => ageOrder(age) >= OLD && ageOrder(age) < Infinity), 'file_age', 'nextOld'],
+    [sumOf(types, ({type}) => PASSING.includes(type)), 'file_group', 'nextPassing'],
+    [outside?.outside ?? 0, 'coverage', 'nextOutside', {name: outside && shown(outside.path)}]
+  ].filter(([bytes]) => bytes > 0).sort(([one], [two]) => two - one);
+  return steps.length ? h('ul', {class: 'steps'}, ...steps.map(([bytes, section, key, values]) => h(
+    'li', {}, h('b', {}, sizeElement(bytes, null)), ' ',
+    linkTo(section, sections, format.sayNodes(key, values ?? {}))))) : null;
+}
+
+// Where more of an incident's kind is to be seen, the first that the page has; others name their
+// report.
+const PLACES = {
+  share_missing: ['coverage', 'share_list'], share_part: ['coverage', 'share_list'],
+  share_overlap: ['coverage', 'share_list'], index_refused: ['coverage', 'share_list'],
+  volume_unknown: ['volume_usage'], history_lost: ['volume_usage', 'growth'], quota_failed: ['quota_usage'],
+  users_unknown: ['file_owner'], compare_stopped: ['duplicate_file']
+};
+const reportOf = ({kind, what}, sections) => Object.hasOwn(PLACES, kind) ?
+  PLACES[kind].find(name => sections.has(name)) : sections.has(what) ? what : undefined;
 
 function incidentLine(incident, sections) {
   const {level, kind, what, text} = incident;
@@ -67,7 +113,7 @@ function incidentLine(incident, sections) {
     return line(level, levelElement(level, false), detail);
   }
   const sentence = format.sayNodes(
-    kind, {what: report ? format.nameOf('reports', report) : shown(what)}, 'incidents');
+    kind, {what: what === report ? format.nameOf('reports', report) : shown(what)}, 'incidents');
   return line(level, levelElement(level, false), linkTo(report, sections, sentence),
               h('p', {class: 'detail'}, detail));
 }
@@ -79,12 +125,8 @@ export function incidents({incidents: all}, sections) {
   }
   const sorted = [...all.filter(({level}) => level === 'error'),
                   ...all.filter(({level}) => level !== 'error')];
-  const list = part => h('ul', {class: 'notices'}, ...part.map(
-    incident => incidentLine(incident, sections)));
-  return h('div', {}, list(sorted.slice(0, MOST_INCIDENTS)), sorted.length > MOST_INCIDENTS ?
-    h('details', {},
-      h('summary', {}, format.say('showAll', {n: format.number(sorted.length)})),
-      list(sorted.slice(MOST_INCIDENTS))) : null);
+  return h('div', {}, ...cutList(sorted.map(incident => incidentLine(incident, sections)),
+                                 MOST_INCIDENTS).filter(Boolean));
 }
 
 // The worst level of the incidents that concern each report.

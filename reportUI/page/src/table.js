@@ -1,35 +1,41 @@
-// Tables: sorted, filtered, cut to their first rows, with the CSV file and the paths to copy.
+// Tables: sorted, filtered, cut to their first rows, with totals, the CSV file and the paths to copy.
+// Rows become elements when they are shown.
 import {copyText, copyable, h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
+import {keep, stateOf} from './state.js';
 
 const FIRST_ROWS = 10;
+const FEW_MORE = 4;  // rows that are shown rather than asked for
+const AT_ONCE = 100;  // rows that become elements in one go
 const FILTER_FROM = 6;  // fewer rows are taken in at a glance
 
-// `text` is what is shown and filtered by, `exact` the number of bytes.
-export function sizeElement(bytes, tabindex = 0) {
-  if (!format.isNumber(String(bytes))) {
+// Number, decimals and unit in boxes of their own, so that they stand below each other.
+function aligned(text) {
+  const [, whole, decimals, unit] = /^(.*?\d)(\D\d+)?(\u00a0.*)?$/.exec(text) ?? [null, text];
+  return unit === undefined ? [text] : [whole, h('span', {class: 'decimals'}, decimals ?? ''),
+                                        h('span', {class: 'unit'}, unit)];
+}
+
+// `text` is what is shown, `exact` the number of bytes.
+export function sizeElement(bytes, tabindex = 0, content = format.size(bytes)) {
+  if (!format.isNumber(String(bytes).replace(/^-/, ''))) {
     return h('span', {}, format.UNKNOWN);
   }
   const exact = format.exactSize(bytes);
   return h('span', {class: 'bytes', tabindex, title: exact, 'data-exact': exact},
-           format.size(bytes));
+           ...[content].flat());
 }
 
-function changeElement(bytes) {
-  const exact = format.isSigned(bytes) ? format.exactSize(bytes) : undefined;
-  return exact === undefined ? h('span', {}, format.UNKNOWN) :
-    h('span', {class: 'bytes', tabindex: -1, title: exact, 'data-exact': exact},
-      format.sizeChange(bytes));
-}
+const cellOfSize = bytes => sizeElement(bytes, -1, aligned(format.size(bytes)));
+const cellOfChange = bytes => sizeElement(bytes, -1, aligned(format.sizeChange(bytes)));
 
-function barElement(share, content) {
+export function barElement(share, content) {
   const bar = h('span', {class: 'bar', 'aria-hidden': 'true'});
   bar.style.inlineSize = `${Math.max(0, Math.min(100, share || 0))}%`;
-  return h('span', {class: 'barred'}, bar, content);
+  return h('span', {class: 'barred'}, bar, h('span', {}, ...[content].flat()));
 }
 
-function pathElement(path) {
-  const slash = path.lastIndexOf('/') + 1;
+export function copyButton(path) {
   const button = h('button', {class: 'copy', type: 'button', title: format.say('copy'),
                               'aria-label': format.say('copyOf', {path: shownPlain(path)})},
                    svg('svg', {viewBox: '0 0 16 16', 'aria-hidden': 'true'}, svg('path', {
@@ -41,114 +47,179 @@ function pathElement(path) {
     button.focus();
     setTimeout(() => said.remove(), 1500);
   });
+  return button;
+}
+
+function pathElement(path) {
+  const slash = path.lastIndexOf('/') + 1;
   return h('span', {class: 'path'},
-           h('span', {},
+           h('span', {class: 'long'},
              h('span', {class: 'folder'}, shown(path.slice(0, slash))),
              h('span', {class: 'name'}, shown(path.slice(slash)))),
-           button);
+           copyButton(path));
 }
 
 // A number to compare, or NaN for what is shown as unknown.
 const known = text => format.isNumber(text) ? Number(text) : NaN;
 const signed = text => format.isSigned(text) ? Number(text) : NaN;
 
-// How each kind of column is written, compared and looked for.
+// How each kind of column is written, compared, looked for (`text`) and summed up (`sum`).
 const KINDS = {
-  text: {cell: value => shown(value)},
-  path: {cell: pathElement, header: true},
-  name: {cell: value => shown(value), header: true},
+  text: {cell: value => shown(value), text: String},
+  path: {cell: pathElement, header: true, text: String},
+  name: {cell: value => h('span', {class: 'long'}, shown(value)), header: true, text: String},
+  // A share and a folder in it.
+  place: {
+    cell: ([share, folder]) => h('span', {class: 'long'}, folder === '.' ? null : h('span', {class: 'in'}, shown(share), ' / '),
+                                 shown(folder === '.' ? share : folder)),
+    text: ([share, folder]) => folder === '.' ? share : `${share}/${folder}`, header: true
+  },
   type: {cell: value => typeName(value), text: value => typeName(value), header: true},
-  size: {number: true, key: known, cell: value => sizeElement(value, -1), text: format.size},
+  age: {cell: value => ageName(value), key: value => ageOrder(value), header: true},
+  size: {number: true, key: known, cell: cellOfSize, sum: cellOfSize},
   quota: {
     number: true,
     // A quota of 0 is none, and so the greatest.
     key: value => Number(value) || Infinity,
-    cell: value => value === '0' ? format.say('noLimit') : sizeElement(value, -1),
-    text: value => value === '0' ? format.say('noLimit') : format.size(value)
+    cell: value => value === '0' ? format.say('noLimit') : cellOfSize(value)
   },
-  count: {number: true, key: known, cell: format.number, text: format.number},
-  change: {
-    number: true, key: signed, cell: value => changeElement(value), text: format.sizeChange
-  },
-  countChange: {number: true, key: signed, cell: format.numberChange, text: format.numberChange},
+  count: {number: true, key: known, cell: format.number, sum: format.number},
+  change: {number: true, key: signed, cell: cellOfChange, sum: cellOfChange},
+  countChange: {number: true, key: signed, cell: format.numberChange, sum: format.numberChange},
+  part: {number: true, key: Number, cell: value => format.percent(Number(value))},
   percent: {
     number: true,
     key: value => parseFloat(value),
-    cell: value => barElement(parseFloat(value), format.percent(parseFloat(value))),
-    text: value => format.percent(parseFloat(value))
+    cell: value => barElement(parseFloat(value), format.percent(parseFloat(value)))
   },
   outlook: {key: value => value.order, cell: value => value.text, text: value => value.text},
-  time: {number: true, key: value => known(value) || NaN, cell: format.time, text: format.time}
+  element: {key: value => value.order, cell: value => value.make()},
+  time: {number: true, key: value => known(value) || NaN, cell: format.time}
 };
 
 export function typeName(label) {
   return format.nameOf('types', label.replace('reportUI_file_type_', ''));
 }
 
-function comparison(kind, index, direction) {
+export const ageOrder = age => Number.isNaN(parseInt(age, 10)) ? Infinity : parseInt(age, 10);
+export function ageName(age) {
+  const [, low, high] = /^(\d+)-(\d*)$/.exec(age) ?? [];
+  return low === undefined ? age === 'future' ? format.say('future') : age :
+    format.days(Number(low), high === '' ? undefined : Number(high));
+}
+
+function comparison({key, number, text}, index, direction) {
   const texts = format.compareTexts();
-  const key = kind.key ?? (kind.number ? Number : undefined);
+  const order = key ?? (number ? Number : undefined);
   return ({values: first}, {values: second}) => {
-    if (!key) {
-      const text = kind.text ?? String;
+    if (!order) {
       return direction * texts(text(first[index]), text(second[index]));
     }
-    const [one, two] = [key(first[index]), key(second[index])];
+    const [one, two] = [order(first[index]), order(second[index])];
     // What is unknown comes last either way.
     return Number.isNaN(one) - Number.isNaN(two) || direction * (one === two ? 0 : one - two) || 0;
   };
 }
 
+const wordsOf = text => text.toLocaleLowerCase().split(/\s+/).filter(Boolean);
+
+// What is looked for in all tables, and the tables that are there.
+let sought = [];
+const tables = new Set();
+export const forgetTables = () => tables.clear();
+export function seek(text) {
+  sought = wordsOf(text);
+  tables.forEach(each => each.update());
+}
+export const isSought = () => sought.length > 0;
+// Rows found in a part of the page.
+export const foundIn = part => [...tables].filter(({element}) => part.contains(element)).reduce(
+  (sum, {found}) => sum + found.length, 0);
+
 class Table {
   // See table().
-  constructor(columns, rows, {caption, csv, sorted}) {
-    this.columns = columns.map(([name, kind]) => ({name, kind: KINDS[kind]}));
-    this.rows = rows.map(values => ({values, line: this.line(values)}));
-    this.caption = caption;
-    this.all = false;
-    this.body = h('tbody', {}, ...this.rows.map(({line}) => line));
+  constructor(columns, rows, {key, caption, csv, sorted, beyond = 0, detail}) {
+    this.columns = columns.map(([name, kind, options]) => ({name, kind: KINDS[kind], ...options}));
+    this.rows = rows.map((values, at) => ({values, at}));
+    Object.assign(this, {key, caption, beyond, detail, found: [], sorted: [sorted, 0]});
+    this.columns.forEach((column, index) => {
+      const sizes = column.bar ? rows.map(values => Math.abs(column.kind.key(values[index])) || 0) : [];
+      column.most = sizes.reduce((most, size) => Math.max(most, size), 0);
+    });
+    const [sort, all, filter] = stateOf(key).split('!');
+    this.all = all === 'all';
+    this.body = h('tbody');
+    this.foot = h('tr');
     this.headers = this.columns.map((column, index) => this.header(column, index));
-    if (sorted !== undefined) {
-      this.headers[sorted].setAttribute('aria-sort',
-                                        this.columns[sorted].kind.number ? 'descending' : 'ascending');
-    }
     this.count = h('span', {class: 'count', role: 'status'});
     this.more = h('button', {type: 'button', class: 'more'});
-    this.more.addEventListener('click', () => {
-      this.all = !this.all;
-      this.update();
-    });
-    this.element = h('div', {class: 'table'}, this.tools(csv), h(
+    this.more.addEventListener('click', () => this.toggle());
+    this.hasTotal = this.rows.length > 1 && this.columns.some(({sum}) => sum);
+    this.element = h('div', {class: 'table'}, this.tools(csv, filter), h(
       'div', {class: 'scroll', role: 'group', tabindex: 0, 'aria-label': caption},
       h('table', {}, h('caption', {class: 'unseen'}, caption), h('thead', {}, h('tr', {}, ...this.headers)),
-        this.body)), this.more);
+        this.body, this.hasTotal ? h('tfoot', {}, this.foot) : null)), this.more);
     this.body.addEventListener('keydown', event => this.move(event));
+    const [, sign, index] = /^(-?)(\d+)$/.exec(sort) ?? [];
+    if (this.columns[index]) {
+      this.order(Number(index), sign ? -1 : 1);
+    } else if (sorted !== undefined) {
+      this.mark(sorted, this.columns[sorted].kind.number ? -1 : 1);
+    }
+    tables.add(this);
     this.update();
   }
 
-  header({name, kind}, index) {
+  header({name, kind, low}, index) {
     const text = format.nameOf('columns', name);
     const button = h('button', {type: 'button'}, text);
     button.addEventListener('click', () => this.sort(index));
     // A head that holds a button isn't repeated on the pages of a print: it gets the text then.
-    return h('th', {scope: 'col', class: kind.number && 'number', 'data-text': text}, button);
+    return h('th', {scope: 'col', class: `${kind.number ? 'number' : ''}${low ? ' low' : ''}`,
+                    'data-text': text}, button);
   }
 
-  line(values) {
-    return h('tr', {}, ...this.columns.map(({name, kind}, index) => h(
-      kind.header ? 'th' : 'td',
-      {scope: kind.header && 'row', class: `${name}${kind.number ? ' number' : ''}`},
-      kind.cell(values[index]))));
+  line(row) {
+    const cells = this.columns.map(({name, kind, bar, low, most}, index) => {
+      const value = row.values[index];
+      const cell = kind.cell(value);
+      return h(kind.header ? 'th' : 'td', {
+        scope: kind.header && 'row',
+        class: `${name}${kind.number ? ' number' : ''}${low ? ' low' : ''}`},
+               bar && most ? barElement(Math.abs(kind.key(value)) / most * 100, cell) : cell);
+    });
+    const line = h('tr', {}, ...cells);
+    if (this.detail) {
+      cells[0].prepend(this.opener(row, line));
+    }
+    return line;
   }
 
-  tools(csv) {
+  // A button that opens what belongs to a row below it.
+  opener({values}, line) {
+    const button = h('button', {type: 'button', class: 'opener', 'aria-expanded': 'false',
+                                'aria-label': format.say('open')});
+    let below;
+    button.addEventListener('click', () => {
+      const isOpen = button.getAttribute('aria-expanded') === 'true';
+      button.setAttribute('aria-expanded', String(!isOpen));
+      below ??= h('tr', {class: 'below'}, h('td', {colspan: this.columns.length}, this.detail(values)));
+      isOpen ? below.remove() : line.after(below);
+    });
+    return button;
+  }
+
+  tools(csv, filter = '') {
     const tools = h('div', {class: 'tools'},
                     h('span', {class: 'title', 'aria-hidden': 'true'}, this.caption));
     if (this.rows.length >= FILTER_FROM) {
-      this.filter = h('input', {type: 'search', placeholder: format.say('filter'),
+      this.filter = h('input', {type: 'search', placeholder: format.say('filter'), value: filter,
                                 'aria-label': format.say('filterLabel', {name: this.caption})});
-      this.filter.addEventListener('input', () => this.update());
-      tools.append(this.filter, this.count);
+      this.filter.addEventListener('input', () => this.changed());
+      tools.append(this.filter);
+    }
+    if (this.filter || this.beyond > 0) {
+      tools.append(this.count);
     }
     if (csv) {
       tools.append(h('a', {class: 'csv', href: csv}, format.say('csv')));
@@ -156,45 +227,106 @@ class Table {
     return tools;
   }
 
-  sort(index) {
-    const header = this.headers[index];
-    const {kind} = this.columns[index];
-    const before = header.getAttribute('aria-sort');
-    // Numbers begin with the greatest, texts with the first.
-    const direction = before ? (before === 'ascending' ? -1 : 1) : kind.number ? -1 : 1;
-    this.headers.forEach(other => other.removeAttribute('aria-sort'));
-    header.setAttribute('aria-sort', direction > 0 ? 'ascending' : 'descending');
-    this.rows.sort(comparison(kind, index, direction));
-    this.body.append(...this.rows.map(({line}) => line));
+  changed() {
     this.update();
+    const [index, direction] = this.sorted;
+    this.keep(direction ? `${direction < 0 ? '-' : ''}${index}` : '');
   }
 
-  // Rows beyond the first have a class and not the attribute: a print has them all.
-  update() {
-    const wanted = (this.filter?.value ?? '').trim().toLocaleLowerCase();
-    let found = 0;
-    for (const {values, line} of this.rows) {
-      const fits = wanted === '' || this.columns.some(({kind}, index) =>
-        [String(values[index]), kind.text?.(values[index])].some(
-          text => text?.toLocaleLowerCase().includes(wanted)));
-      line.hidden = !fits;
-      line.classList.toggle('later', fits && !this.all && found >= FIRST_ROWS);
-      found += fits;
+  keep(sort) {
+    const all = this.all ? 'all' : '';
+    const filter = this.filter?.value ?? '';
+    keep(this.key, sort || all || filter ? [sort, all, filter].join('!') : '',
+         this.key.replace(/\..*/, ''));
+  }
+
+  mark(index, direction) {
+    this.headers.forEach(other => other.removeAttribute('aria-sort'));
+    this.headers[index].setAttribute('aria-sort', direction > 0 ? 'ascending' : 'descending');
+  }
+
+  order(index, direction) {
+    this.sorted = [index, direction];
+    this.mark(index, direction);
+    this.rows.sort(comparison(this.columns[index].kind, index, direction));
+  }
+
+  sort(index) {
+    const before = this.headers[index].getAttribute('aria-sort');
+    // Numbers begin with the greatest, texts with the first.
+    const first = this.columns[index].kind.number ? -1 : 1;
+    this.order(index, before ? (before === 'ascending' ? -1 : 1) : first);
+    this.changed();
+  }
+
+  // "Fewer" keeps the button where the reader has it.
+  toggle() {
+    const before = this.more.getBoundingClientRect().top;
+    this.all = !this.all;
+    this.changed();
+    if (!this.all) {
+      window.scrollBy({top: this.more.getBoundingClientRect().top - before, behavior: 'instant'});
     }
-    this.count.textContent = format.say(
-      'rowCount', {n: format.number(found), m: format.number(this.rows.length)});
+  }
+
+  // All words, in whatever order, in whatever columns.
+  fits(row, words) {
+    row.text ??= this.columns.map(({kind}, index) => kind.text?.(row.values[index]) ?? '').join('\n')
+      .toLocaleLowerCase();
+    return words.every(word => row.text.includes(word));
+  }
+
+  update() {
+    const words = [...wordsOf(this.filter?.value ?? ''), ...sought];
+    this.found = words.length ? this.rows.filter(row => this.fits(row, words)) : this.rows;
+    const {length} = this.found;
+    const few = length <= FIRST_ROWS + FEW_MORE;
+    this.fill(this.all || few ? length : FIRST_ROWS);
+    const numbers = {n: format.number(length), m: format.number(this.rows.length)};
+    this.count.textContent = [format.say('rowCount', numbers), this.beyond > 0 &&
+      format.say('moreInCsv', {n: format.number(this.beyond)})].filter(Boolean).join(' ');
+    this.more.hidden = few;
+    this.more.classList.toggle('less', this.all);
+    this.more.textContent = this.all ? format.say('showLess') : format.say('showAll', {n: numbers.n});
+    this.total();
+  }
+
+  // The first rows at once, the others when the browser has time for them.
+  fill(count) {
+    clearTimeout(this.waiting);
+    const add = from => {
+      const lines = this.found.slice(from, Math.min(count, from + AT_ONCE)).map(
+        row => row.line ??= this.line(row));
+      from ? this.body.append(...lines) : this.body.replaceChildren(...lines);
+      if (from + AT_ONCE < count) {
+        this.waiting = setTimeout(() => add(from + AT_ONCE));
+      }
+    };
+    add(0);
     this.setStop(this.sizes()[0]);
-    this.more.hidden = found <= FIRST_ROWS;
-    this.more.textContent = this.all ? format.say('showLess') :
-      format.say('showAll', {n: format.number(found)});
+  }
+
+  total() {
+    if (!this.hasTotal) {
+      return;
+    }
+    this.foot.replaceChildren(...this.columns.map(({name, kind, sum, low}, index) => {
+      const cell = content => h('td', {class: `${name}${kind.number ? ' number' : ''}${low ? ' low' : ''}`},
+                                content);
+      if (!index) {
+        return h('th', {scope: 'row'}, format.say('total', {n: format.number(this.found.length)}));
+      }
+      return sum ? cell(kind.sum(String(this.found.reduce(
+        (all, {values}) => all + (kind.key(values[index]) || 0), 0)))) : cell(null);
+    }));
   }
 
   sizes() {
-    return [...this.body.querySelectorAll('tr:not([hidden]):not(.later) .bytes')];
+    return [...this.body.querySelectorAll('.bytes')];
   }
 
   setStop(size) {
-    this.body.querySelector('.bytes[tabindex="0"]')?.setAttribute('tabindex', -1);
+    this.body.querySelectorAll('.bytes[tabindex="0"]').forEach(each => each.setAttribute('tabindex', -1));
     size?.setAttribute('tabindex', 0);
   }
 
@@ -214,9 +346,22 @@ class Table {
   }
 }
 
-// The element of a table. `columns`: [name, kind] each, the name a key of the dictionary;
-// `rows`: a value for each column; `options`: caption, address of the CSV file, and the index of
-// the column that the rows are sorted by (numbers from the greatest, texts from the first).
+// The element of a table.
+//   columns   [name, kind, {bar, sum, low}] each: the name a key of the dictionary, `bar` for one
+//             behind the value, `sum` for a total, `low` for what a phone leaves out
+//   rows      a value for each column
+//   options   key: of its state, begins with the section's name; caption; csv: address of the file;
+//             sorted: index of the column that the rows come sorted by (numbers from the greatest,
+//             texts from the first); beyond: rows that only the file has; detail: makes, of a row's
+//             values, what a button opens below it
 export function table(columns, rows, options) {
   return new Table(columns, rows, options).element;
+}
+
+// With a column behind column `index` that says how much of all each row's size is.
+export function withParts(columns, rows, index) {
+  const total = rows.reduce((sum, values) => sum + (Number(values[index]) || 0), 0);
+  const insert = (list, value) => list.toSpliced(index + 1, 0, value);
+  return [insert(columns, ['part', 'part', {low: true}]), rows.map(
+    values => insert(values, String(total > 0 ? Number(values[index]) / total * 100 : NaN)))];
 }

@@ -1,0 +1,40 @@
+// What a reader has done to the page: filters, sorting, the folder that is open. It outlives a change
+// of the language, and stands in the address, so that a link leads to just what was seen:
+// #SECTION?KEY=VALUE&…
+const state = new Map();
+let anchor = '';
+
+export function readAddress() {
+  const [name, words = ''] = location.hash.slice(1).split(/\?(.*)/s);
+  anchor = decodeURIComponent(name);
+  for (const [key, value] of new URLSearchParams(words)) {
+    state.set(key, value);
+  }
+  return anchor;
+}
+
+function writeAddress() {
+  const words = new URLSearchParams([...state].filter(([, value]) => value)).toString();
+  history.replaceState(null, '', `#${encodeURIComponent(anchor)}${words && `?${words}`}`);
+}
+
+export const stateOf = key => state.get(key) ?? '';
+
+// `section`: where the reader is, for the address.
+export function keep(key, value, section = anchor) {
+  if (stateOf(key) !== value) {
+    state.set(key, value);
+    anchor = section;
+    writeAddress();
+  }
+}
+
+// A link within the page brings its own anchor, and loses the rest.
+export function followAnchor() {
+  const hasWords = location.hash.includes('?');
+  readAddress();
+  if (!hasWords) {
+    writeAddress();
+  }
+  return hasWords;
+}
