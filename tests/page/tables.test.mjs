@@ -72,6 +72,8 @@ test('another language, and the address, keep what a reader has done', () => wit
   await page.reload();
   await isReady(page);
   assert.deepEqual(await state(page), [...before.slice(0, 5), false], 'the address leads to what was seen');
+  await page.locator('#duplicate_file .here').nth(3).click();
+  await page.waitForFunction(() => document.querySelectorAll('#duplicate_file tbody tr').length === 1);
 }));
 
 test('one search looks in all tables', () => withPage(fileOf('server'), async page => {

@@ -261,14 +261,11 @@ format.callVolumes(facts?.volumes ?? []);
 setTheme(remember.get('theme') ?? 'system');
 document.addEventListener('copy', copyOriginals);
 document.addEventListener('click', ({target}) => target.closest('.long')?.classList.toggle('open'));
+const renderAt = id => render().then(() => id && document.getElementById(id)?.scrollIntoView());
 const place = readAddress();
 window.addEventListener('hashchange', () => {
   if (followAnchor()) {
-    render();
+    renderAt(decodeURIComponent(location.hash.slice(1).replace(/\?.*/s, '')));
   }
 });
-render().then(() => {
-  if (place) {
-    document.getElementById(place)?.scrollIntoView();
-  }
-});
+renderAt(place);

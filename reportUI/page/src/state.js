@@ -7,6 +7,9 @@ let anchor = '';
 export function readAddress() {
   const [name, words = ''] = location.hash.slice(1).split(/\?(.*)/s);
   anchor = decodeURIComponent(name);
+  if (words) {
+    state.clear();
+  }
   for (const [key, value] of new URLSearchParams(words)) {
     state.set(key, value);
   }

@@ -146,7 +146,7 @@ class Table {
       const sizes = column.bar ? rows.map(values => Math.abs(column.kind.key(values[index])) || 0) : [];
       column.most = sizes.reduce((most, size) => Math.max(most, size), 0);
     });
-    const [sort, all, filter] = stateOf(key).split('!');
+    const [sort, all, ...filter] = stateOf(key).split('!');
     this.all = all === 'all';
     this.body = h('tbody');
     this.foot = h('tr');
@@ -155,7 +155,7 @@ class Table {
     this.more = h('button', {type: 'button', class: 'more'});
     this.more.addEventListener('click', () => this.toggle());
     this.hasTotal = this.rows.length > 1 && this.columns.some(({sum}) => sum);
-    this.element = h('div', {class: 'table'}, this.tools(csv, filter), h(
+    this.element = h('div', {class: 'table'}, this.tools(csv, filter.join('!')), h(
       'div', {class: 'scroll', role: 'group', tabindex: 0, 'aria-label': caption},
       h('table', {}, h('caption', {class: 'unseen'}, caption), h('thead', {}, h('tr', {}, ...this.headers)),
         this.body, this.hasTotal ? h('tfoot', {}, this.foot) : null)), this.more);
@@ -189,10 +189,21 @@ class Table {
                bar && most ? barElement(Math.abs(kind.key(value)) / most * 100, cell) : cell);
     });
     const line = h('tr', {}, ...cells);
+    const named = this.columns.findIndex(({kind}) => kind.header && kind.text);
+    if (this.filter && named >= 0) {
+      cells[named].append(this.linkTo(this.columns[named].kind.text(row.values[named])));
+    }
     if (this.detail) {
       cells[0].prepend(this.opener(row, line));
     }
     return line;
+  }
+
+  // The address of the table with this row alone.
+  linkTo(text) {
+    const words = new URLSearchParams({[this.key]: `!!${text}`});
+    return h('a', {class: 'here', tabindex: -1, 'aria-label': format.say('rowLink'),
+                   href: `#${this.key.replace(/\..*/, '')}?${words}`});
   }
 
   // A button that opens what belongs to a row below it.
