@@ -1,11 +1,11 @@
 #!/usr/bin/python3
-"""Measures all nine reports, and duplicates by content, against what does the same work.
+"""Measures all reports, and duplicates by content, against what does the same work.
 
     bench/reports.py FOLDER [--files N] [--rounds N] [--build DIR] [--only PART,...] [--cold]
 
 Makes trees in FOLDER once (and uses them again later) and prints a table. The parts:
 
-    all      nine reports in one run on a tree of N files, against find (its list kept in a file)
+    all      all reports in one run on a tree of N files, against find (its list kept in a file)
              and against pipelines.sh, which makes the same file reports
     peers    the same run against tools that look at every file of a tree: those installed of gdu,
              ncdu, bfs, agedu and duc
@@ -214,7 +214,7 @@ class Bench:
         yield f'find, {self.files} files', find, ''
         yield 'pipelines.sh', shell, f'{shell / find:.2f} x find'
         yield 'pipelines.sh, one list for all', once, f'{once / find:.2f} x find'
-        yield ('all nine reports', report,
+        yield ('all reports', report,
                f'{report / find:.2f} x find, {report / shell:.2f} and {report / once:.2f} x '
                'pipelines.sh')
 
@@ -232,7 +232,7 @@ class Bench:
             *(lambda tool=tool: self.timed(*tool) for tool in
               ([name, *words] for name, words in tools.items())))
         yield f'find, {self.files} files', find, ''
-        yield 'all nine reports', report, f'{report / find:.2f} x find'
+        yield 'all reports', report, f'{report / find:.2f} x find'
         for name, other in zip(tools, others):
             yield name, other, f'{other / find:.2f} x find'
 
@@ -245,7 +245,7 @@ class Bench:
             runs.append(lambda folder=folder: self.report(
                 [('rows', folder, folder / 'index.db')], self.every_report))
         one, ten = self.compare(*runs)
-        yield f'all nine reports, {self.files} rows', one, ''
+        yield f'all reports, {self.files} rows', one, ''
         yield ('ten times the rows', ten,
                f'{ten / one:.1f} x the time, {ten.cpu / one.cpu:.1f} x the CPU time')
 
