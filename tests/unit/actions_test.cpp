@@ -68,8 +68,6 @@ TEST_F(ActionsTest, ReportRunsItsStepsInOrder) {
                        "StatusUpdate p1 collect_data",
                        std::string("GetSection ") + kConfig + " p1",
                        "InitRealPath p1 1",
-                       "CsvFile " + folder_.path("csv/share_list.csv"),
-                       "CsvFile " + folder_.path("csv/large_file.csv"),
                        "GetTargetLink " + folder_.path("it's final/report.html"),
                        "SendReport p1 " + platform.link,
                        "StatusUpdate p1 success"};

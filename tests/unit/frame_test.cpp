@@ -24,8 +24,8 @@ TEST_F(FrameTest, LimitsCutThePageAndTheCsv) {
   }
   EXPECT_EQ(run(large_file_db), 0);
   const std::string page = data();
-  EXPECT_NE(page.find("(/s/f199)"), std::string::npos);
-  EXPECT_EQ(page.find("(/s/f200)"), std::string::npos);
+  EXPECT_NE(page.find("'/s/f199'"), std::string::npos);
+  EXPECT_EQ(page.find("'/s/f200'"), std::string::npos);
   const std::string table = csv("large_file");
   EXPECT_EQ(std::count(table.begin(), table.end(), '\n'), 10001);
 }

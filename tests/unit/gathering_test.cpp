@@ -267,35 +267,6 @@ TEST_F(GatheringTest, ImportCopiesTheFilesOfTheIndex) {
   EXPECT_NE(sqlite3_get_autocommit(db_.get()), 0);
 }
 
-// The rows read before an unknown owner stay in the open transaction, and the walk that follows
-// commits them with its own: they are there twice.
-TEST_F(GatheringTest, FailedImportIsWalkedAndItsRowsStandTwice) {
-  const std::string top = folder_.path("photo");
-  write_file(top + "/x", "1");
-  write_file(top + "/y", "1");
-  const std::string index = folder_.path("index.db");
-  make_index(index, "('ann','1','1','x','x','',0),('ghost','1','1','y','y','',0)");
-  platform.users = {{"ann", 1001}};
-  platform.shares = {{"photo", top}, {"nowhere", ""}, {"left", top}};
-  platform.unselected = {"left"};
-  platform.indexes["photo"] = index;
-  db_.reset();
-  int result = 0;
-  const std::string output = printed([&] { result = file_gathering("p1", profile_.get()); });
-  EXPECT_EQ(result, 1);
-  db_ = VORNReportDBInit(profile_.get());
-  EXPECT_EQ(paths_below(top), "x\nx\ny\n");
-  std::string texts;  // the order of what was told, without positions
-  for (const char* text : {"stat start\n\n", "use file index db, share=photo\n", "cannot get uid",
-                           "Exec sql:[", "stat share=photo\n", "begin TRANSACTION failed, msg=",
-                           "cannot get share path, share=nowhere", "stat complete\n\n"}) {
-    const size_t found = output.find(text, texts.size());
-    ASSERT_NE(found, std::string::npos) << text << output;
-    texts.assign(found, ' ');
-  }
-  EXPECT_EQ(output.find("share=left"), std::string::npos);
-}
-
 // A clean of all profiles removes databases of running reports too.
 TEST_F(GatheringTest, ADatabaseRemovedInTheRunIsLostData) {
   platform.shares = {{"s", folder_.path("none")}};

@@ -271,17 +271,6 @@ void VornQazProgressEnd(const char* profile) {
   platform.progress.push_back(std::string("end ") + profile);
 }
 
-void VornQazSetIncidentSink(VornIncidentSink /*sink*/) {}
-
-int VornQazGetTimeSecond(char* out, size_t size) {
-  return copied("1700000000", out, size);
-}
-
-int VornQazTimeConvert(const char* seconds, char* out, size_t size) {
-  return platform.fails("TimeConvert") ? -1
-                                       : copied("time(" + std::string(seconds) + ")", out, size);
-}
-
 int VornQazGetFileMd5(const char* path, unsigned long long /*size*/, char* digest,
                       size_t digest_size) {
   const std::string file = std::filesystem::read_symlink(path);  // the caller's handle
@@ -308,28 +297,6 @@ void VornQazSetDigestDeadline(unsigned long long seconds) {
 
 int VornQazDigestDeadlinePassed(void) {
   return platform.is_past_deadline && platform.is_past_deadline() ? 1 : 0;
-}
-
-// Marks what it did, so that a test sees which texts went through it.
-int VornQazEscChar(const char* text, char* out, size_t size, char quote) {
-  const bool fails = platform.fails("EscChar");
-  const int length = copied(fails ? "half" : "esc(" + std::string(text) + ")" + quote, out, size);
-  return fails ? -1 : length;
-}
-
-int VornQazFormatCsvString(const char* text, char* out, size_t size) {
-  return platform.fails("FormatCsvString") ? -1
-                                           : copied("csv(" + std::string(text) + ")", out, size);
-}
-
-int VornQazCsvFile(const char* path) {
-  record("CsvFile", path);
-  return 0;
-}
-
-int VornQazImportSharePathHash(const VLIBCSzHash* /*share_path_hash*/, FILE* data) {
-  std::fputs("<import>", data);
-  return 0;
 }
 
 int VornGetTargetLink(const VLIBCSzHash* /*hash*/, const char* target_file, char* link,

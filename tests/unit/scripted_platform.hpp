@@ -1,5 +1,5 @@
 // A platform that does what a test tells it, linked in place of the host: every call is recorded,
-// any call can be made to fail. The text containers are the real ones.
+// any call can be made to fail. Its base, text containers and formats, is the real one.
 #pragma once
 
 #include <functional>

@@ -147,7 +147,7 @@ TEST_F(StatementsAheadTest, ChangeNoReport) {
     });
   };
   const std::string expected = all_reports(false);
-  EXPECT_GT(expected.size(), 1'000'000U);
+  EXPECT_GT(expected.size(), 500'000U);
   EXPECT_TRUE(all_reports(true) == expected);
   set_profile("duplicate_compare", "true");
   sqlite3_exec(db_.get(), "delete from file_stat where id > 9", nullptr, nullptr, nullptr);

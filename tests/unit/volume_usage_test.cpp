@@ -73,9 +73,9 @@ TEST_F(VolumeUsageTest, ACsvLineNamesNoPathThatWouldBreakIt) {
   const auto profile = support::make_hash({{"real_path_csv", folder_.path()}});
   printed([&] { EXPECT_EQ(VolumeUsageWriteCsv("p", profile.get(), list_), 0); });
   const std::string rest = "\", \"100\" ,\"50.0000%\", \"0\"\n";
-  EXPECT_EQ(
-      support::read_file(folder_.path("volume_usage.csv")),
-      "Volume, Size, Used, Daty to Full\n\"/a b, c" + rest + "\"_a_b" + rest + "\"_a__b" + rest);
+  EXPECT_EQ(support::read_file(folder_.path("volume_usage.csv")),
+            "\xEF\xBB\xBFVolume, Size, Used, Daty to Full\n\"/a b, c" + rest + "\"_a_b" + rest +
+                "\"_a__b" + rest);
 }
 
 }  // namespace
