@@ -9,6 +9,12 @@
 namespace report_format {
 namespace {
 
+constexpr std::pair<const char*, std::int64_t RunStatus::*> kTimes[] = {
+    {"started", &RunStatus::started},
+    {"ended", &RunStatus::ended},
+    {"report_started", &RunStatus::report_started},
+    {"succeeded", &RunStatus::succeeded}};
+
 constexpr std::array kPhases{"starting", "gathering", "reporting", "assembling", "publishing"};
 
 // The value of a line "key = value", or nothing.
@@ -31,6 +37,9 @@ std::string status_text(const RunStatus& status) {
   if (status.mail_failed) {
     text += "mail = failed\n";
   }
+  for (const auto& [key, time] : kTimes) {
+    text += status.*time > 0 ? key + (" = " + std::to_string(status.*time) + "\n") : "";
+  }
   return text;
 }
 
@@ -47,6 +56,11 @@ RunStatus status_of(std::string_view text) {
       std::from_chars(count->data(), count->data() + count->size(), status.incidents);
     } else if (value_in(line, "mail") == "failed") {
       status.mail_failed = true;
+    }
+    for (const auto& [key, time] : kTimes) {
+      if (const auto value = is_first ? std::nullopt : value_in(line, key)) {
+        std::from_chars(value->data(), value->data() + value->size(), status.*time);
+      }
     }
   }
   return status;

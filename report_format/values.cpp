@@ -11,12 +11,20 @@ constexpr char lower(char c) {
   return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
 }
 
+// `word` is in lower case.
+bool is_word(std::string_view value, std::string_view word) {
+  return std::equal(value.begin(), value.end(), word.begin(), word.end(),
+                    [](char a, char b) { return lower(a) == b; });
+}
+
 }  // namespace
 
 bool is_true(std::string_view value) {
-  constexpr std::string_view kTrue = "true";
-  return std::equal(value.begin(), value.end(), kTrue.begin(), kTrue.end(),
-                    [](char a, char b) { return lower(a) == b; });
+  return is_word(value, "true");
+}
+
+bool is_false(std::string_view value) {
+  return is_word(value, "false");
 }
 
 std::optional<int> whole_number(std::string_view digits) {

@@ -9,6 +9,7 @@
 #include <cstring>
 #include <string>
 
+#include "vorn/report.h"
 #include "vorn/text.h"
 
 namespace vornreport {
@@ -142,6 +143,9 @@ void write_channels(const char* module, int line, const std::string& message) {
     syslog(LOG_ERR, "%s:%d %s", module, line, message.c_str());
     std::printf("(%s:%d)%s", module, line, message.c_str());
   }
+  const std::string reason = error != 0 ? "(" + std::string(std::strerror(error)) + ")" : "";
+  VornQazNoteLogLine(
+      (std::string(module) + ":" + std::to_string(line) + " " + reason + message).c_str());
   errno = error;
 }
 

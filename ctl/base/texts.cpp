@@ -41,6 +41,15 @@ std::string unsent_mail(const std::string& profile) {
   return "the mail of the last report reached nobody; run vornctl profile test-mail " + profile;
 }
 
+std::string overdue_text(std::time_t begun, std::time_t due) {
+  constexpr std::time_t kDay = 86400;
+  const std::time_t days = (std::time(nullptr) - begun) / kDay;
+  const std::string since =
+      begun == 0 ? "no run yet"
+                 : "no run for " + std::to_string(days) + (days == 1 ? " day" : " days");
+  return since + ", though one was due at " + time_text(due);
+}
+
 const report_format::Texts& english() {
   static const report_format::Texts texts(VORN_PATH_TEMPLATE "/lang", "en");
   return texts;

@@ -14,6 +14,9 @@ namespace ctl {
 const char* word_for(admin::RunState state);
 // What is said of a profile whose last report's mail reached nobody.
 std::string unsent_mail(const std::string& profile);
+// What is said of a profile whose report was due at `due`; `begun`: the last run, 0 when there was
+// none.
+std::string overdue_text(std::time_t begun, std::time_t due);
 // What reports say, as it stands in their dictionaries.
 const report_format::Texts& english();
 std::string size_text(std::uint64_t bytes);  // "1.5 GiB", as in them

@@ -1,7 +1,6 @@
 #include "config/checks.hpp"
 
 #include <pwd.h>
-#include <strings.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -93,8 +92,9 @@ std::string users_problem(const std::string& value) {
 
 std::string truth_problem(const std::string& value) {
   // All but true is false to a run; only this word says that it is meant.
-  const bool is_false = strcasecmp(value.c_str(), "false") == 0;
-  return report_format::is_true(value) || is_false ? "" : "is neither true nor false";
+  return report_format::is_true(value) || report_format::is_false(value)
+             ? ""
+             : "is neither true nor false";
 }
 
 std::string report_dir_problem(const std::string& value) {
@@ -185,6 +185,12 @@ constexpr ProfileKey kKeys[] = {
      truth_problem},
     {"keep_reports", "--keep-reports", "N", "Number of reports to keep (default: all)", false,
      admin::keep_reports_problem},
+    {"mail_on_failure", nullptr, "true|false", "false sends no mail of a failed run", false,
+     truth_problem},
+    {"metrics_file", "--metrics-file", "FILE", "File for Prometheus' node exporter, .../NAME.prom",
+     false, admin::metrics_file_problem},
+    {"metrics_users", nullptr, "true|false", "true tells users' quotas there", false,
+     truth_problem},
     {"schedule_collect_id", nullptr, "", "Identifier of the schedule", false, schedule_problem},
 };
 

@@ -13,8 +13,10 @@
 #include "config/commands.hpp"
 #include "report_format/reports.hpp"
 #include "schedule/jobs.hpp"
+#include "schedule/timers.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/paths.h"
+#include "vorn/volume.h"
 
 namespace ctl {
 namespace {
@@ -30,6 +32,17 @@ void check_together(const Section& profile) {
   }
   if (!profile.value("smtp_user").empty() && profile.value("smtp_password_file").empty()) {
     throw Failure("smtp_user needs smtp_password_file, the file with the password");
+  }
+}
+
+// Each run puts its own metrics in the place of all that is there.
+void check_metrics_file(const Section& profile) {
+  const std::string file = profile.value("metrics_file");
+  for (const Section& other : file.empty() ? std::vector<Section>{} : read_profiles()) {
+    if (other.name != profile.name && other.value("metrics_file") == file) {
+      throw Failure("metrics_file " + file + " is that of profile " + other.name +
+                    " already; give each profile a file of its own");
+    }
   }
 }
 
@@ -53,15 +66,35 @@ struct NewProfile {
   bool no_history = false;
 };
 
+bool any_quotas() {
+  VORNMountVolInfo* volumes = VORNMountVolAllEnum(nullptr, VORN_VOLUMES_OF_QUOTA);
+  bool found = false;
+  for (const VORNMountVolInfo* volume = volumes; volume != nullptr; volume = volume->next) {
+    found = found || VORNVolumeHasQuotas(volume->path) != 0;
+  }
+  VORNMountVolInfoFree(volumes);
+  return found;
+}
+
+// All reports that have something to tell: without quotas one would only log an error each time.
+std::string default_reports() {
+  std::string list;
+  for (const std::string& name : report_names()) {
+    if (name != report_format::kQuotaUsage.name || any_quotas()) {
+      list += (list.empty() ? "" : ",") + name;
+    }
+  }
+  return list;
+}
+
 void add_profile(NewProfile profile) {
   check_profile_name(profile.name);
   if (profile_exists(profile.name)) {
     throw Failure(titled(profile.name) + " is there already; change it with vornctl profile set");
   }
-  if (profile.values["report_list"].empty()) {
-    for (const std::string& name : report_names()) {
-      profile.values["report_list"] += (name == report_names().front() ? "" : ",") + name;
-    }
+  const bool has_default = profile.values["report_list"].empty();
+  if (has_default) {
+    profile.values["report_list"] = default_reports();
   }
   profile.values["duplicate_compare"] = profile.duplicates == "content" ? "true" : "";
   profile.values["volume_history"] = profile.no_history ? "" : "true";
@@ -72,7 +105,11 @@ void add_profile(NewProfile profile) {
     }
   }
   check_together(changed({profile.name, {}}, entries));
+  check_metrics_file(changed({profile.name, {}}, entries));
   add_section(VORN_PATH_CONFIG, profile.name, entries);
+  if (has_default && !any_quotas()) {
+    warn("no volume has quotas, so the report quota_usage is left out");
+  }
 }
 
 void describe_add(CLI::App& group) {
@@ -166,8 +203,11 @@ void set_keys(const std::string& name, const std::vector<std::string>& words) {
     const std::string value = checked_value(key, words[i + 1]);
     changes.emplace_back(key.name, value.empty() ? std::nullopt : std::optional(value));
   }
-  check_together(changed(read_profile(name), changes));
+  const Section profile = changed(read_profile(name), changes);
+  check_together(profile);
+  check_metrics_file(profile);
   change_section(VORN_PATH_CONFIG, name, changes);
+  refresh_services(profile);
 }
 
 void describe_set(CLI::App& group) {
@@ -208,6 +248,7 @@ void remove_profile(const std::string& name, bool reports_too) {
   const std::string folder = folder_of_reports(profile);
   hold(name);
   remove_cron_file(profile);
+  remove_timers(name);
   admin::forget_runs(profile);  // what can't be removed has a message
   if (reports_too && !admin::remove_all_reports(folder)) {
     throw host_failure(folder + " can't be emptied");

@@ -10,9 +10,10 @@
 #include "base/stored_reports.hpp"
 #include "base/texts.hpp"
 #include "doctor/doctor.hpp"
-#include "schedule/cron_times.hpp"
 #include "schedule/jobs.hpp"
+#include "schedule/timers.hpp"
 #include "vorn/admin/runs.hpp"
+#include "vorn/base/cron_times.hpp"
 
 namespace ctl {
 namespace {
@@ -31,6 +32,21 @@ bool cron_is_running() {
   return false;
 }
 
+void check_timer(Findings& findings, const Job& job, const std::string& subject) {
+  const std::string timer = admin::timer_of(job.kind, job.profile);
+  const auto next = next_run(job, std::time(nullptr));
+  if (!systemd_runs()) {
+    findings.add(Level::error, subject, "systemd doesn't run this machine, so nothing is started",
+                 "use cron: vornctl schedule " + job.profile + " --cron");
+  } else if (!is_active(timer)) {
+    findings.add(Level::error, subject, "it is enabled but not started",
+                 "run systemctl start " + timer);
+  } else {
+    findings.ok(subject, std::string(option_of(job.kind)) + " " + job.profile +
+                             (next ? ", next at " + time_text(*next) : ""));
+  }
+}
+
 void check_job(Findings& findings, const Job& job, const Configuration& configuration) {
   const std::string subject = "schedule " + job.file;
   const auto& profiles = configuration.profiles;
@@ -40,11 +56,17 @@ void check_job(Findings& findings, const Job& job, const Configuration& configur
                      });
   if (!known) {
     findings.add(Level::warning, subject, "profile " + job.profile + " doesn't exist",
-                 "remove the line");
+                 job.by == Scheduler::cron
+                     ? "remove the line"
+                     : "run systemctl disable --now " + admin::timer_of(job.kind, job.profile));
+    return;
+  }
+  if (job.by == Scheduler::timer) {
+    check_timer(findings, job, subject);
     return;
   }
   try {
-    const auto next = CronTimes(job.times).next(std::time(nullptr));
+    const auto next = host::CronTimes(job.times).next(std::time(nullptr));
     findings.ok(subject, std::string(option_of(job.kind)) + " " + job.profile + ", next at " +
                              (next ? time_text(*next) : "the machine's start"));
   } catch (const std::exception& wrong) {
@@ -76,10 +98,15 @@ void check_leftovers(Findings& findings, const Section& profile) {
 }  // namespace
 
 void check_schedules(Findings& findings, const Configuration& configuration) {
-  const std::vector<Job> jobs = scheduled_jobs();
+  const std::vector<Job> jobs = admin::scheduled_jobs();
   std::string checked;
+  const bool uses_cron = std::any_of(jobs.begin(), jobs.end(),
+                                     [](const Job& job) { return job.by == Scheduler::cron; });
   for (const Job& job : jobs) {
     check_job(findings, job, configuration);
+    if (job.by == Scheduler::timer) {
+      continue;
+    }
     if (const std::string problem = cron_file_problem(job.file);
         !problem.empty() && checked != job.file) {
       findings.add(Level::error, "schedule " + job.file,
@@ -95,9 +122,15 @@ void check_schedules(Findings& findings, const Configuration& configuration) {
                    "run vornctl schedule " + profile.name + " with its times, or with --clean");
     }
   }
-  if (!jobs.empty() && cron_is_running()) {
+  for (const Section& profile : configuration.profiles) {
+    for (const std::string& problem : service_problems(profile)) {
+      findings.add(Level::error, "service " + admin::service_of(JobKind::report, profile.name),
+                   problem);
+    }
+  }
+  if (uses_cron && cron_is_running()) {
     findings.ok("cron", "it runs");
-  } else if (!jobs.empty()) {
+  } else if (uses_cron) {
     findings.add(Level::error, "cron", "it does not run, so nothing is started",
                  "install the package cron or start it: systemctl enable --now cron");
   }
@@ -128,6 +161,14 @@ void check_last_runs(Findings& findings, const Configuration& configuration) {
     const RunState state = last.state;
     if (last.status.mail_failed) {
       findings.add(Level::warning, subject, unsent_mail(profile.name));
+    }
+    const bool is_cut = state == RunState::ended_early;
+    const std::time_t begun =
+        std::max(last.status.report_started, is_cut ? last.status.started : 0);
+    if (const auto due = admin::overdue_since(profile.name, begun, std::time(nullptr));
+        due && state != RunState::running) {
+      findings.add(Level::warning, "reports of " + profile.name, overdue_text(begun, *due),
+                   "see that cron or the timer runs, and look into the system log");
     }
     if (state == RunState::failed || state == RunState::ended_early) {
       findings.add(Level::warning, subject, word_for(state),

@@ -1,5 +1,6 @@
 // vornctl status: how the profiles are doing.
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
 
@@ -30,6 +31,9 @@ struct ProfileStatus {
   std::string name;
   admin::RunState state = admin::RunState::unknown;
   bool mail_failed = false;
+  std::time_t started = 0;             // the last run, 0 when that isn't known
+  std::time_t begun = 0;               // the last run that was to make a report, likewise
+  std::optional<std::time_t> overdue;  // since when a report is
   std::optional<admin::StoredReport> last;
   std::optional<report_format::Facts> facts;  // of that report
   std::optional<NextRun> next;
@@ -63,6 +67,12 @@ ProfileStatus status_of(const Section& profile, const std::vector<Job>& jobs, st
   const admin::LastRun last = admin::last_run(profile.name);
   status.state = last.state;
   status.mail_failed = last.status.mail_failed;
+  status.started = last.status.started;
+  const bool is_cut = status.state == admin::RunState::ended_early;
+  status.begun = std::max(last.status.report_started, is_cut ? status.started : 0);
+  if (status.state != admin::RunState::running) {
+    status.overdue = admin::overdue_since(profile.name, status.begun, now);
+  }
   status.next = next_of(profile.name, jobs, now);
   add_report(profile, status);
   return status;
@@ -90,12 +100,20 @@ void print_as_json(const std::vector<ProfileStatus>& all) {
     Json entry{{"profile", status.name},
                {"status", word_for(status.state)},
                {"mail_failed", status.mail_failed},
+               {"started", nullptr},
+               {"overdue_since", nullptr},
                {"last_report", nullptr},
                {"next_run", nullptr},
                {"complete", nullptr},
                {"volume", nullptr},
                {"incidents", Json(nullptr)},
                {"attention", Json(nullptr)}};
+    if (status.started > 0) {
+      entry["started"] = json_time(status.started);
+    }
+    if (status.overdue) {
+      entry["overdue_since"] = json_time(*status.overdue);
+    }
     if (status.last) {
       entry["last_report"] = {{"path", status.last->page},
                               {"made", json_time(status.last->made)},
@@ -129,8 +147,16 @@ std::string outlook_text(const std::optional<report_format::Facts>& facts) {
              : "-";
 }
 
-// What the last reports have to tell, a line each: what they lack, then what needs attention.
+// What the last reports have to tell, a line each: that they didn't come, what they lack, then what
+// needs attention.
 void print_remarks(const ProfileStatus& status) {
+  if (status.state == admin::RunState::ended_early && status.started > 0) {
+    print_line(status.name + ": the run of " + time_text(status.started) + " didn't finish");
+  }
+  if (status.overdue) {
+    print_line(status.name + ": " + overdue_text(status.begun, *status.overdue) +
+               "; run vornctl doctor");
+  }
   if (status.mail_failed) {
     print_line(status.name + ": " + unsent_mail(status.name));
   }
@@ -176,7 +202,7 @@ void print_as_table(const std::vector<ProfileStatus>& all) {
 void status(const Options& options) {
   std::vector<Section> profiles =
       options.profile.empty() ? read_profiles() : std::vector{read_profile(options.profile)};
-  const std::vector<Job> jobs = scheduled_jobs();
+  const std::vector<Job> jobs = admin::scheduled_jobs();
   const std::time_t now = std::time(nullptr);
   // What is collected for the whole server is of interest once it has times of its own.
   if (options.profile.empty() && next_of("global", jobs, now) && profile_exists("global")) {

@@ -5,62 +5,20 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
 #include <cstring>
 #include <exception>
-#include <filesystem>
-#include <set>
 
+#include "base/ask_program.hpp"
 #include "base/ctl.hpp"
-#include "schedule/cron_times.hpp"
 #include "vorn/admin/runs.hpp"
+#include "vorn/base/cron_times.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {
 namespace {
-
-// Takes the first word off `text`.
-std::string_view take_word(std::string_view& text) {
-  text = host::trimmed(text);
-  const std::string_view word = text.substr(0, text.find_first_of(" \t"));
-  text.remove_prefix(word.size());
-  return word;
-}
-
-// What stands before the user and the command: five fields, or one that begins with '@'.
-std::string take_times(std::string_view& line) {
-  constexpr int kFields = 5;
-  std::string times(take_word(line));
-  for (int i = 1; i < kFields && !times.starts_with('@'); ++i) {
-    times.append(" ").append(take_word(line));
-  }
-  return times;
-}
-
-bool is_comment(std::string_view line) {
-  return line.empty() || line.front() == '#';
-}
-
-std::optional<Job> job_in(const std::string& file, std::string_view line) {
-  line = host::trimmed(line);
-  if (is_comment(line)) {
-    return std::nullopt;
-  }
-  Job job{file, JobKind::report, {}, take_times(line)};
-  take_word(line);  // the user
-  // The program may stand behind others: a test that it is there, nice, ionice, flock...
-  for (std::string_view before; !line.empty();) {
-    const std::string_view word = take_word(line);
-    if (before == kProgram && (word == "--report" || word == "--data")) {
-      job.kind = word == "--data" ? JobKind::data : JobKind::report;
-      job.profile = take_word(line);
-      break;
-    }
-    before = word;
-  }
-  return job.profile.empty() ? std::nullopt : std::optional(std::move(job));
-}
 
 template <typename Visit>
 void each_line(std::string_view text, Visit visit) {
@@ -71,21 +29,22 @@ void each_line(std::string_view text, Visit visit) {
   }
 }
 
-// Debian's cron leaves out every other name, so that editors' copies and packages' leftovers don't
-// run.
-bool is_cron_name(std::string_view name) {
-  return std::all_of(name.begin(), name.end(), [](char c) {
-    return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '_' ||
-           c == '-';
-  });
-}
-
-void append_jobs(const std::string& file, std::vector<Job>& jobs) {
-  if (const auto text = host::read_file(file, kLargestCronFile)) {
-    for (Job& job : jobs_in(file, *text)) {
-      jobs.push_back(std::move(job));
-    }
+// What systemd says of a timer's next run.
+std::optional<std::time_t> asked_of_systemd(const Job& job) try {
+  constexpr std::chrono::seconds kLimit{5};
+  const auto answer =
+      ask_program({"/usr/bin/systemctl", "show", "--timestamp=unix", "--value",
+                   "--property=NextElapseUSecRealtime", admin::timer_of(job.kind, job.profile)},
+                  kLimit);
+  std::time_t time = 0;
+  if (!answer || !answer->out.starts_with('@')) {
+    return std::nullopt;
   }
+  const char* end = answer->out.data() + answer->out.size();
+  return std::from_chars(answer->out.data() + 1, end, time).ec == std::errc{} ? std::optional(time)
+                                                                              : std::nullopt;
+} catch (const Failure&) {
+  return std::nullopt;
 }
 
 }  // namespace
@@ -94,21 +53,21 @@ const char* option_of(JobKind kind) {
   return kind == JobKind::report ? "--report" : "--data";
 }
 
-std::vector<Job> jobs_in(const std::string& file, std::string_view text) {
-  std::vector<Job> jobs;
-  each_line(text, [&](std::string_view line) {
-    if (auto job = job_in(file, line)) {
-      jobs.push_back(std::move(*job));
-    }
-  });
-  return jobs;
+const char* word_for(Scheduler scheduler) {
+  return scheduler == Scheduler::cron ? "cron" : "timer";
+}
+
+std::string times_text(const Job& job) {
+  return job.times.empty() ? "as its unit says" : job.times;
 }
 
 void check_runs_only(const std::string& profile, const std::string& file, std::string_view text) {
   bool only = true;
   each_line(text, [&](std::string_view line) {
-    const auto job = job_in({}, line);
-    only = only && (is_comment(host::trimmed(line)) || (job && job->profile == profile));
+    const std::string_view text_of_line = host::trimmed(line);
+    const auto jobs = admin::jobs_in({}, line);
+    only = only && (text_of_line.empty() || text_of_line.front() == '#' ||
+                    (!jobs.empty() && jobs.front().profile == profile));
   });
   if (!only) {
     throw Failure(file + " holds other jobs than those of profile " + profile +
@@ -116,24 +75,9 @@ void check_runs_only(const std::string& profile, const std::string& file, std::s
   }
 }
 
-std::vector<Job> scheduled_jobs() {
-  std::vector<Job> jobs;
-  append_jobs("/etc/crontab", jobs);
-  std::error_code error;
-  std::set<std::string> names;
-  for (const auto& entry : std::filesystem::directory_iterator(VORN_PATH_CRON, error)) {
-    names.insert(entry.path().filename().string());
-  }
-  for (const std::string& name : names) {
-    if (is_cron_name(name)) {
-      append_jobs(VORN_PATH_CRON "/" + name, jobs);
-    }
-  }
-  return jobs;
-}
-
 std::optional<std::time_t> next_run(const Job& job, std::time_t now) try {
-  return CronTimes(job.times).next(now);
+  return job.times.empty() && job.by == Scheduler::timer ? asked_of_systemd(job)
+                                                         : host::CronTimes(job.times).next(now);
 } catch (const std::exception&) {
   return std::nullopt;
 }

@@ -1,4 +1,4 @@
-// vornctl schedule: the cron file of a profile.
+// vornctl schedule: the cron file or the timers of a profile.
 //
 // The file and the profile's key are two things, so their order matters: the key is written first
 // and removed last. Whatever ends this in between, no job is left that the profile doesn't name,
@@ -14,13 +14,15 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
+#include <nlohmann/json.hpp>
 
 #include "base/ctl.hpp"
 #include "base/texts.hpp"
 #include "schedule/commands.hpp"
-#include "schedule/cron_times.hpp"
 #include "schedule/jobs.hpp"
+#include "schedule/timers.hpp"
 #include "vorn/admin/runs.hpp"
+#include "vorn/base/cron_times.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/paths.h"
 
@@ -32,6 +34,9 @@ struct Options {
   std::string report;
   std::string data;
   bool clean = false;
+  bool timer = false;
+  bool cron = false;
+  bool json = false;
 };
 
 // An identifier that no other profile name gives. Cron leaves out files with a dot in their name,
@@ -67,9 +72,9 @@ std::string schedule_id(const Section& profile) {
   return kept;
 }
 
-CronTimes parse_times(const std::string& option, const std::string& text) {
+host::CronTimes parse_times(const std::string& option, const std::string& text) {
   try {
-    return CronTimes(text);
+    return host::CronTimes(text);
   } catch (const std::runtime_error& error) {
     throw Failure(option + ": " + error.what(), kWrongUsage);
   }
@@ -105,6 +110,67 @@ host::Fd lock_schedules() {
   return lock;
 }
 
+// A kind of run that isn't named keeps its times, whoever starts it now.
+void keep_times(const std::string& profile, const std::vector<Job>& jobs, std::string& report_times,
+                std::string& data_times) {
+  for (const Job& job : jobs) {
+    std::string& times = job.kind == JobKind::report ? report_times : data_times;
+    if (job.profile == profile && times.empty()) {
+      times = job.times;
+    }
+  }
+}
+
+std::vector<Job> timers_of(const std::string& profile) {
+  std::vector<Job> jobs = admin::scheduled_jobs();
+  std::erase_if(
+      jobs, [&](const Job& job) { return job.by != Scheduler::timer || job.profile != profile; });
+  return jobs;
+}
+
+void tell_next(JobKind kind, const std::string& profile, const std::string& times,
+               const std::string& by) {
+  const auto next = host::CronTimes(times).next(std::time(nullptr));
+  print_line(std::string(option_of(kind)) + " " + profile + ": " + times +
+             (next ? ", next at " + time_text(*next) : "") + by);
+}
+
+void remove_cron_schedule(const Section& profile) {
+  if (!remove_cron_file(profile).empty()) {
+    change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, std::nullopt}});
+  }
+}
+
+struct Times {
+  JobKind kind;
+  std::string times;  // empty: none
+};
+
+void set_timers(const Section& profile, const std::array<Times, 2>& all) {
+  for (const auto& [kind, times] : all) {
+    if (!times.empty()) {
+      set_timer(profile, kind, times);
+      tell_next(kind, profile.name, times, ", by " + admin::timer_of(kind, profile.name));
+    }
+  }
+  remove_cron_schedule(profile);
+}
+
+void set_cron(const Section& profile, const std::string& path, const std::array<Times, 2>& all) {
+  std::string text = "# Written by vornctl; change it with vornctl schedule.\n";
+  for (const auto& [kind, times] : all) {
+    text += times.empty() ? "" : job_line(profile.name, kind, times);
+  }
+  change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, schedule_id(profile)}});
+  write_cron_file(path, text);
+  remove_timers(profile.name);
+  for (const auto& [kind, times] : all) {
+    if (!times.empty()) {
+      tell_next(kind, profile.name, times, "");
+    }
+  }
+}
+
 void set_schedule(const Options& options) {
   if (options.profile == "global" && !options.report.empty()) {
     throw Failure("\"global\" stands for the whole server and has no report; give --data only",
@@ -121,27 +187,25 @@ void set_schedule(const Options& options) {
   }
   const host::Fd lock = lock_schedules();
   const Section profile = read_profile(options.profile);
-  const std::string id = schedule_id(profile);
-  const std::string path = admin::schedule_file(id);
+  const std::string path = admin::schedule_file(schedule_id(profile));
   const auto read = host::read_file(path, kLargestCronFile);
   if (!read && access(path.c_str(), F_OK) == 0) {
     throw Failure(path + " can't be read, so it is left as it is; look into it and move it away");
   }
   const std::string before = read.value_or("");
   check_runs_only(profile.name, path, before);
-  for (const Job& job : jobs_in(path, before)) {  // a kind that isn't named keeps its times
-    std::string& times = job.kind == JobKind::report ? report_times : data_times;
-    times = times.empty() ? job.times : times;
+  const std::vector<Job> timers = timers_of(profile.name);
+  keep_times(profile.name, admin::jobs_in(path, before), report_times, data_times);
+  keep_times(profile.name, timers, report_times, data_times);
+  if (report_times.empty() && data_times.empty()) {
+    throw Failure("say when: --report or --data with five cron fields; see vornctl(8)",
+                  kWrongUsage);
   }
-  std::string text = "# Written by vornctl; change it with vornctl schedule.\n";
-  text += report_times.empty() ? "" : job_line(profile.name, JobKind::report, report_times);
-  text += data_times.empty() ? "" : job_line(profile.name, JobKind::data, data_times);
-  change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, id}});
-  write_cron_file(path, text);
-  for (const Job& job : jobs_in(path, text)) {
-    const auto next = next_run(job, std::time(nullptr));
-    print_line(std::string(option_of(job.kind)) + " " + job.profile + ": " + job.times +
-               (next ? ", next at " + time_text(*next) : ""));
+  const std::array<Times, 2> all{{{JobKind::report, report_times}, {JobKind::data, data_times}}};
+  if (options.timer || (!options.cron && !timers.empty())) {
+    set_timers(profile, all);
+  } else {
+    set_cron(profile, path, all);
   }
 }
 
@@ -149,22 +213,70 @@ void clean_schedule(const Options& options) {
   const host::Fd lock = lock_schedules();
   const Section profile = read_profile(options.profile);
   const std::string path = remove_cron_file(profile);
-  if (path.empty()) {
+  const std::vector<std::string> timers = remove_timers(profile.name);
+  if (path.empty() && timers.empty()) {
     print_line("profile " + profile.name + " has no schedule");
-    return;
   }
-  change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, std::nullopt}});
-  print_line("removed " + path);
+  if (!path.empty()) {
+    change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, std::nullopt}});
+    print_line("removed " + path);
+  }
+  for (const std::string& timer : timers) {
+    print_line("removed " + timer);
+  }
+}
+
+// All jobs, or those of one profile.
+void show_schedules(const Options& options) {
+  if (!options.profile.empty()) {
+    read_profile(options.profile);  // which tells of a wrong name
+  }
+  auto list = nlohmann::ordered_json::array();
+  Table table({{"PROFILE"}, {"RUN"}, {"TIMES"}, {"NEXT RUN"}, {"BY"}});
+  for (const Job& job : admin::scheduled_jobs()) {
+    if (!options.profile.empty() && job.profile != options.profile) {
+      continue;
+    }
+    const auto next = next_run(job, std::time(nullptr));
+    const char* kind = job.kind == JobKind::report ? "report" : "data";
+    const bool is_timer = job.by == Scheduler::timer;
+    table.add({job.profile, kind, times_text(job), next ? time_text(*next) : "-",
+               is_timer ? admin::timer_of(job.kind, job.profile) : job.file});
+    list.push_back({{"profile", job.profile},
+                    {"kind", kind},
+                    {"times", nullptr},
+                    {"next_run", nullptr},
+                    {"scheduler", word_for(job.by)},
+                    {"file", job.file}});
+    if (!job.times.empty()) {
+      list.back()["times"] = job.times;
+    }
+    if (next) {
+      list.back()["next_run"] = json_time(*next);
+    }
+  }
+  if (options.json) {
+    print_json(list);
+  } else if (table.empty()) {
+    print_line(options.profile.empty() ? "no runs are scheduled; see vornctl schedule --help"
+                                       : "profile " + options.profile + " has no schedule");
+  } else {
+    table.print();
+  }
 }
 
 void schedule(const Options& options) {
+  const bool sets =
+      !options.report.empty() || !options.data.empty() || options.timer || options.cron;
+  if ((options.clean || sets) && options.profile.empty()) {
+    throw Failure("name the profile; vornctl schedule alone shows what is scheduled", kWrongUsage);
+  }
   if (options.clean) {
     clean_schedule(options);
-  } else if (options.report.empty() && options.data.empty()) {
-    throw Failure("say when: --report or --data with five cron fields, or --clean; see vornctl(8)",
-                  kWrongUsage);
-  } else {
+  } else if (sets) {
     set_schedule(options);
+  } else {
+    show_schedules(options);
   }
 }
 
@@ -172,8 +284,9 @@ void schedule(const Options& options) {
 
 void add_schedule_command(CLI::App& app) {
   auto options = std::make_shared<Options>();
-  CLI::App* command = app.add_subcommand("schedule", "Run a profile from cron");
-  add_profile_argument(*command, options->profile);
+  CLI::App* command =
+      app.add_subcommand("schedule", "Show schedules, or have a profile run by the clock");
+  add_profile_argument(*command, options->profile)->required(false);
   command
       ->add_option("--report", options->report, "When to make a report: five cron fields or @daily")
       ->type_name("TIMES");
@@ -181,6 +294,12 @@ void add_schedule_command(CLI::App& app) {
   command->add_flag("--clean", options->clean, "Remove the schedule")
       ->excludes("--report")
       ->excludes("--data");
+  command->add_flag("--timer", options->timer, "Let a systemd timer start it, in place of cron")
+      ->excludes("--clean");
+  command->add_flag("--cron", options->cron, "Let cron start it, in place of a timer")
+      ->excludes("--clean")
+      ->excludes("--timer");
+  add_json_flag(*command, options->json);
   command->callback([options] { schedule(*options); });
 }
 

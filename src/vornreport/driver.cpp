@@ -42,7 +42,10 @@ int run(int argc, char** argv) {
       break;
     case kData:
       setup_signal(SIGTERM);
-      collect_action(argv);
+      // A sample that couldn't be stored is an incident, and here there is no report to tell it.
+      if (collect_action(argv) < 0 || !run_facts().incidents.empty()) {
+        VornQazDataFailed(*argv);
+      }
       break;
     case kClean:
       clean_action(argv);

@@ -252,9 +252,10 @@ class ProductTest(unittest.TestCase):
         self.addCleanup(base.cleanup)
         return Machine(base.name, self._stage.name)
 
-    def assertSucceeded(self, run, profile):
-        self.assertEqual((run.status, run.err, run.log_lines, self.m.status(profile)),
-                         (0, '', [], 'success'), run.out)
+    def assertSucceeded(self, run, profile, err=''):
+        self.assertRegex(run.err, f'^{err}$')
+        self.assertEqual((run.status, run.log_lines, self.m.status(profile)), (0, [], 'success'),
+                         run.out)
         self.assertEqual(self.m.leftovers(), [])
         folders = self.m.report_folders(profile)
         self.assertRegex(folders[-1].name, r'^\d{4}-\d\d-\d\d_\d\d-\d\d-\d\d')

@@ -177,7 +177,7 @@ class Profiles(ControlTest):
         made = before + '\n[n]\nreport_list = '
         add, put = ('profile', 'add', 'n'), ('profile', 'set', 'p')
         self.check_table(self.m.config, before, (
-            (add, f'{made}{ALL}\nvolume_history = true\n', ''),
+            (add, f'{made}{ALL.replace("quota_usage,", "")}\nvolume_history = true\n', 'no volume has quotas'),
             ((*add, '--reports', 'large_file, share_list', '--shares', 'my docs,photos', '--language',
               'de-AT', '--mail-to', 'a@b.c ,d@e.f', '--mail-from', 'v@b.c', '--smtp-url',
               'smtps://m:465', '--smtp-user', 'u', '--smtp-password-file', '/tmp/secret',

@@ -176,7 +176,7 @@ class Schedules(WeeklyTest):
                 (['own', '--report', '@daily'], 1, {}, 'vornreport-job1 holds other jobs '),
                 (['weekly', '--clean'], 0, {weekly: None}, ''),
                 (['weekly', '--clean'], 0, {}, ''),
-                (['weekly'], 2, {}, 'say when'),
+                (['weekly'], 0, {}, ''),
                 (['global', '--report', '@daily'], 2, {}, '"global" stands for '),
                 (['nobody', '--clean'], 1, {}, 'profile "nobody" is not in '),
                 *((['weekly', '--data', times], 2, {}, wrong) for times, wrong in (

@@ -73,8 +73,12 @@ ROOMS = {
     'ctl-base': (r'ctl/base/.*', CONTRACTS),
 
     'admin': (r'platform/host/admin/(?!include/).*',
-              'host-mail host-run host-machine host-config host-base ' + CONTRACTS),
+              'host-outcome host-schedule host-mail host-run host-machine host-config host-base ' +
+              CONTRACTS),
     'admin-contract': (r'platform/host/admin/include/.*', 'format'),
+    'host-outcome': (r'platform/host/outcome/.*', 'host-schedule host-mail host-run host-config '
+                     'host-base format base-contract api'),
+    'host-schedule': (r'platform/host/schedule/.*', 'base-contract api'),
     'host-mail': (r'platform/host/mail/.*', 'host-config host-base format base-contract api'),
     'host-run': (r'platform/host/run/.*', 'host-config host-base format base-contract api'),
     'host-machine': (r'platform/host/machine/.*', 'host-config host-base format base-contract api'),

@@ -28,8 +28,10 @@ constexpr const char* kWhole =
     "</template>\n<body data-empty=\"0\">\n<main id=\"report\">\n"
     "<section data-report=\"share_list\">\n</section>\n</main>\n<script></script>\n</html>\n";
 
+// Without the times.
 std::string status_of(const std::string& profile) {
-  return read_file(VORN_PATH_STATUS "/" + profile);
+  const std::string text = read_file(VORN_PATH_STATUS "/" + profile);
+  return text.substr(0, text.find("started = "));
 }
 
 std::string temporary(const char* kind, pid_t pid) {

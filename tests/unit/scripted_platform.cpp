@@ -267,6 +267,8 @@ int VornQazProgressUpdate(const char* /*profile*/, const char* text) {
 
 void VornQazStatusMailFailed(void) {}
 
+void VornQazDataFailed(const char* /*profile*/) {}
+
 void VornQazProgressEnd(const char* profile) {
   platform.progress.push_back(std::string("end ") + profile);
 }

@@ -8,6 +8,7 @@
 
 #include "admin/section_hash.hpp"
 #include "config/profile.hpp"
+#include "outcome/metrics.hpp"
 #include "run/run_lock.hpp"
 #include "run/run_paths.hpp"
 #include "vorn/admin/history.hpp"
@@ -33,11 +34,11 @@ pid_t holder_of(const std::string& profile) {
   return pid;
 }
 
-RunState state_of(const std::string& profile, const std::string& word) {
-  if (word == report_format::kSuccess) {
+RunState state_of(const std::string& profile, const report_format::RunStatus& status) {
+  if (status.word == report_format::kSuccess) {
     return RunState::succeeded;
   }
-  if (word != report_format::kCollecting) {
+  if (!report_format::was_cut(status)) {
     return RunState::failed;
   }
   // "global" keeps this word when all went well.
@@ -71,11 +72,20 @@ LastRun last_run(const std::string& profile) {
     run.state = RunState::running;
     run.process = holder_of(profile);
   } else if (text) {
-    run.state = state_of(profile, run.status.word);
+    run.state = state_of(profile, run.status);
   } else if (is_missing) {
     run.state = RunState::never_ran;
   }
   return run;
+}
+
+std::string metrics_file_problem(const std::string& value) {
+  const char* error = host::metrics_file_error(value);
+  if (error != nullptr) {
+    return error;
+  }
+  const std::string problem = host::metrics_file_problem(value);
+  return problem.empty() ? "" : "can't be written: " + problem;
 }
 
 std::optional<report_format::Progress> read_progress(const std::string& profile) {

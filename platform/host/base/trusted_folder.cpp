@@ -55,7 +55,8 @@ std::deque<std::string> components(std::string_view path) {
 // A path looked up name by name.
 class LookUp {
  public:
-  LookUp(const std::string& path, Missing missing) : left_(components(path)), missing_(missing) {}
+  LookUp(const std::string& path, Missing missing, Strangers strangers)
+      : left_(components(path)), missing_(missing), strangers_(strangers) {}
 
   TrustedFolder open() {
     if (!enter(Fd(::open("/", O_PATH | O_DIRECTORY | O_CLOEXEC)), "/")) {
@@ -96,7 +97,7 @@ class LookUp {
       errno = length < 0 ? errno : ELOOP;
       return refuse(shown + " can't be followed", "remove the link");
     }
-    if (left_.empty() || !is_roots(status)) {
+    if (left_.empty() || !is_roots(status) || has_strangers_) {
       errno = left_.empty() ? ELOOP : EPERM;
       return refuse(shown + " is a link", "move it away");
     }
@@ -115,14 +116,16 @@ class LookUp {
       errno = ENOTDIR;
       return refuse(shown + " is no folder", "move it away");
     }
-    if (!is_roots(status)) {
+    const bool is_sticky = (status.st_mode & S_ISVTX) != 0 && !left_.empty();
+    const bool is_shared = (status.st_mode & (S_IWGRP | S_IWOTH)) != 0 && !is_sticky;
+    if (strangers_ == Strangers::not_followed) {
+      has_strangers_ = has_strangers_ || !is_roots(status) || is_shared;
+    } else if (!is_roots(status)) {
       errno = EPERM;
       return refuse(shown + " belongs to another user (number " + std::to_string(status.st_uid) +
                         "), who could lead root astray",
                     "run chown root '" + shown + "', or choose another folder");
-    }
-    const bool is_sticky = (status.st_mode & S_ISVTX) != 0 && !left_.empty();
-    if ((status.st_mode & (S_IWGRP | S_IWOTH)) != 0 && !is_sticky) {
+    } else if (is_shared) {
       errno = EPERM;
       return refuse(shown + " is writable by others, who could lead root astray",
                     "run chmod go-w '" + shown + "', or choose another folder");
@@ -145,6 +148,8 @@ class LookUp {
 
   std::deque<std::string> left_;
   Missing missing_;
+  Strangers strangers_;
+  bool has_strangers_ = false;  // on the way so far
   Fd at_;
   std::string shown_;
   int links_ = 0;
@@ -153,8 +158,8 @@ class LookUp {
 
 }  // namespace
 
-TrustedFolder open_trusted(const std::string& path, Missing missing) {
-  return LookUp(path, missing).open();
+TrustedFolder open_trusted(const std::string& path, Missing missing, Strangers strangers) {
+  return LookUp(path, missing, strangers).open();
 }
 
 }  // namespace host

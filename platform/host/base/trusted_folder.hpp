@@ -14,6 +14,14 @@ enum class Missing {
   made      // for this user alone and the readers of its group (mode 0750)
 };
 
+// What becomes of a folder on the way, or the last one, in which others have a say.
+enum class Strangers {
+  refused,
+  // It is entered, and from there on no link is followed: whatever they do, the way ends in a
+  // folder that they could have written to themselves. For a file that is theirs to read.
+  not_followed
+};
+
 struct TrustedFolder {
   Fd folder;            // open for reading; none when it isn't there or can't be trusted
   std::string problem;  // then, as a sentence with a remedy; empty when it is only missing
@@ -27,7 +35,8 @@ struct TrustedFolder {
 // so the mode tells for both.) Links are followed where root made them, but not in the last place.
 // errno says why there is no folder: ENOENT when it is only missing, EPERM when it isn't to be
 // trusted.
-TrustedFolder open_trusted(const std::string& path, Missing missing);
+TrustedFolder open_trusted(const std::string& path, Missing missing,
+                           Strangers strangers = Strangers::refused);
 
 }  // namespace host
 

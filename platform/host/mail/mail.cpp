@@ -122,10 +122,16 @@ std::string readable_time(std::time_t time) {
 
 // What every mail of a profile needs before it has a content.
 struct Posting {
-  Posting(const char* profile, const VLIBCSzHash& hash)
+  Posting(const char* profile, const VLIBCSzHash& hash, const EarlierRuns& earlier)
       : from(value_of(hash, "mail_from")),
         texts(VORN_PATH_TEMPLATE "/lang", value_of(hash, "language")),
-        topic{profile, host_name(), readable_time(time), {}, value_of(hash, "report_list")} {
+        topic{profile,
+              host_name(),
+              readable_time(time),
+              {},
+              value_of(hash, "report_list"),
+              earlier.unfinished == 0 ? "" : readable_time(earlier.unfinished),
+              earlier.missed == 0 ? "" : readable_time(earlier.missed)} {
     from = from.empty() ? "vornreport@" + topic.host : from;
   }
 
@@ -138,8 +144,9 @@ struct Posting {
 };
 
 // Nothing, after a log line, when the profile's settings can't send a mail to anybody.
-std::optional<Posting> prepare(const char* profile, const VLIBCSzHash& hash) {
-  Posting posting(profile, hash);
+std::optional<Posting> prepare(const char* profile, const VLIBCSzHash& hash,
+                               const EarlierRuns& earlier = {}) {
+  Posting posting(profile, hash, earlier);
   errno = EINVAL;
   if (!valid_address(posting.from)) {
     log_line(
@@ -160,13 +167,13 @@ std::optional<Posting> prepare(const char* profile, const VLIBCSzHash& hash) {
 // Those who were served.
 std::vector<std::string> send(const char* profile, const Posting& posting,
                               const MailContent& content, const MailLimits& limits) {
-  const std::string message =
-      mail_message({.from = posting.from,
-                    .to = posting.to,
-                    .time = posting.time,
-                    .message_id = new_message_id(posting.time, posting.topic.host),
-                    .content = content});
-  return deliver(profile, posting.server, posting.from, posting.to, message, limits);
+  return deliver(profile, posting.server,
+                 {.from = posting.from,
+                  .to = posting.to,
+                  .time = posting.time,
+                  .message_id = new_message_id(posting.time, posting.topic.host),
+                  .content = content},
+                 limits);
 }
 
 }  // namespace
@@ -206,12 +213,16 @@ const char* password_problem(const std::string& path, std::string& password) {
   return password.empty() ? "holds no password in its first line" : nullptr;
 }
 
+bool wants_mail(const VLIBCSzHash& hash) {
+  return !comma_words(value_of(hash, "mail_to")).empty();
+}
+
 int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
-                const MailLimits& limits) {
-  if (comma_words(value_of(hash, "mail_to")).empty()) {
+                const EarlierRuns& earlier, const MailLimits& limits) {
+  if (!wants_mail(hash)) {
     return 0;
   }
-  const std::optional<Posting> posting = prepare(profile, hash);
+  const std::optional<Posting> posting = prepare(profile, hash, earlier);
   if (!posting) {
     return -1;
   }
@@ -223,9 +234,19 @@ int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
   return send(profile, *posting, content, limits).empty() ? -1 : 0;
 }
 
+std::vector<std::string> send_failure(const char* profile, const VLIBCSzHash& hash,
+                                      const EarlierRuns& earlier,
+                                      const std::vector<std::string>& log,
+                                      const MailLimits& limits) {
+  const auto posting = wants_mail(hash) ? prepare(profile, hash, earlier) : std::nullopt;
+  return posting
+             ? send(profile, *posting, failure_mail(posting->texts, posting->topic, log), limits)
+             : std::vector<std::string>{};
+}
+
 std::vector<std::string> send_test_mail(const char* profile, const VLIBCSzHash& hash,
                                         const MailLimits& limits) {
-  if (comma_words(value_of(hash, "mail_to")).empty()) {
+  if (!wants_mail(hash)) {
     log_line("profile \"%s\" has no recipients; write mail_to = name@domain in %s", profile,
              VORN_PATH_CONFIG);
     errno = EINVAL;
@@ -237,15 +258,3 @@ std::vector<std::string> send_test_mail(const char* profile, const VLIBCSzHash& 
 }
 
 }  // namespace host
-
-int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* hash) try {
-  if (link == nullptr || hash == nullptr || !host::valid_profile(profile)) {
-    errno = EINVAL;
-    return -1;
-  }
-  return host::keeping_errno(
-      [&] { return host::send_report(profile, link, *hash, host::MailLimits{}); });
-} catch (...) {
-  errno = ENOMEM;
-  return -1;
-}

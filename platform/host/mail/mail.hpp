@@ -42,20 +42,26 @@ std::string mail_host(const std::string& smtp_url);
 // `password` filled.
 const char* password_problem(const std::string& path, std::string& password);
 
-// The message: header and the content in both forms, lines ended by CR LF, nothing but ASCII.
-std::string mail_message(const MailText& text);
+// What became of the runs of a profile before the one that a mail is about, as times; 0 is nothing.
+struct EarlierRuns {
+  std::time_t unfinished = 0;  // the last one began then and didn't finish
+  std::time_t missed = 0;      // one was due then and never began
+};
 
-// A text in quoted-printable, so that any bytes travel and no line is too long.
-std::string quoted_printable(std::string_view text);
-
-// `text` for an unstructured header field: as it is when it is printable ASCII, otherwise as
-// encoded words on folded lines. Line ends and other control characters become blanks.
-std::string header_text(std::string_view text);
+// Whether a mail of the profile has somebody to go to.
+bool wants_mail(const VLIBCSzHash& hash);
 
 // As VornQazSendReport. The mail tells the facts beside the finished page, whose path is in `hash`
 // (real_path_report_final).
 int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
-                const MailLimits& limits);
+                const EarlierRuns& earlier, const MailLimits& limits);
+
+// Sends the mail of a run that failed, with what it has said to the log, as send_report sends one.
+// Those who were served.
+std::vector<std::string> send_failure(const char* profile, const VLIBCSzHash& hash,
+                                      const EarlierRuns& earlier,
+                                      const std::vector<std::string>& log,
+                                      const MailLimits& limits);
 
 // Sends a mail that says it is a test as send_report sends one. Those who were served; one log line
 // for everything that kept others from it.

@@ -10,6 +10,7 @@
 #include <string_view>
 
 #include "base/host_log.hpp"
+#include "mail/mail_message.hpp"
 #include "vorn/paths.h"
 
 namespace host {
@@ -21,27 +22,22 @@ using std::chrono::milliseconds;
 struct CurlCleanup {
   void operator()(CURL* curl) const { curl_easy_cleanup(curl); }
 };
-struct SlistFree {
-  void operator()(curl_slist* list) const { curl_slist_free_all(list); }
-};
 using CurlPtr = std::unique_ptr<CURL, CurlCleanup>;
-using SlistPtr = std::unique_ptr<curl_slist, SlistFree>;
 
 // One SMTP transaction per recipient, so that each refusal has a name; over one connection as long
 // as the server keeps it.
 class Delivery {
  public:
-  Delivery(const MailServer& server, const std::string& from, const std::string& message,
-           const MailLimits& limits)
-      : message_(message), limits_(limits), deadline_(Clock::now() + limits.total) {
+  Delivery(const MailServer& server, const MailText& mail, const MailLimits& limits)
+      : limits_(limits), deadline_(Clock::now() + limits.total), header_(mail_header(mail)) {
     if (curl_ == nullptr) {
       return;
     }
     set_transport(server);
-    set(CURLOPT_MAIL_FROM, from.c_str());
-    set(CURLOPT_UPLOAD, 1L);
-    set(CURLOPT_READFUNCTION, &Delivery::on_read);
-    set(CURLOPT_READDATA, this);
+    body_ = mail_body(curl_.get(), mail.content);
+    set(CURLOPT_MAIL_FROM, mail.from.c_str());
+    set(CURLOPT_HTTPHEADER, header_.get());
+    set(CURLOPT_MIMEPOST, body_.get());
     set(CURLOPT_HEADERFUNCTION, &Delivery::on_reply);
     set(CURLOPT_HEADERDATA, this);
     set(CURLOPT_ERRORBUFFER, static_cast<char*>(error_));
@@ -65,9 +61,8 @@ class Delivery {
     const auto left = std::chrono::duration_cast<milliseconds>(deadline_ - Clock::now());
     const SlistPtr recipients(curl_slist_append(nullptr, recipient.c_str()));
     reply_.clear();
-    read_ = 0;
     error_[0] = '\0';
-    if (curl_ == nullptr || recipients == nullptr || left.count() <= 0) {
+    if (header_ == nullptr || body_ == nullptr || recipients == nullptr || left.count() <= 0) {
       std::snprintf(error_, sizeof error_, "no time or memory left");
       errno = ETIMEDOUT;
       return Result::unreachable;
@@ -142,14 +137,6 @@ class Delivery {
     return Result::unreachable;
   }
 
-  static size_t on_read(char* buffer, size_t size, size_t count, void* self) {
-    auto& delivery = *static_cast<Delivery*>(self);
-    const std::size_t wanted = std::min(size * count, delivery.message_.size() - delivery.read_);
-    delivery.message_.copy(buffer, wanted, delivery.read_);
-    delivery.read_ += wanted;
-    return wanted;
-  }
-
   // Keeps the last reply line. 221 answers QUIT, after a refusal has already been decided.
   static size_t on_reply(char* line, size_t size, size_t count, void* self) {
     std::string_view text(line, size * count);
@@ -160,21 +147,21 @@ class Delivery {
     return size * count;
   }
 
-  const std::string& message_;
   const MailLimits limits_;
   const Clock::time_point deadline_;
-  std::size_t read_ = 0;
   std::string reply_;
   char error_[CURL_ERROR_SIZE] = "";
-  const CurlPtr curl_{curl_easy_init()};  // last, since its cleanup still calls back
+  const SlistPtr header_;
+  const CurlPtr curl_{curl_easy_init()};  // behind what its cleanup still calls back for
+  MimePtr body_;                          // goes before its transfer
 };
 
 }  // namespace
 
 std::vector<std::string> deliver(const char* profile, const MailServer& server,
-                                 const std::string& from, const std::vector<std::string>& to,
-                                 const std::string& message, const MailLimits& limits) {
-  auto delivery = std::make_unique<Delivery>(server, from, message, limits);
+                                 const MailText& mail, const MailLimits& limits) {
+  auto delivery = std::make_unique<Delivery>(server, mail, limits);
+  const std::vector<std::string>& to = mail.to;
   std::vector<std::string> served;
   int error = 0;
   for (std::size_t i = 0; i < to.size(); ++i) {

@@ -16,11 +16,10 @@ struct MailServer {
   std::string password;
 };
 
-// Sends `message` to each of `to`, within `limits`. Those that the server took it for; one log line
-// for each other one, or for the server when it can't be used, and errno says why.
+// Sends `mail` to each of its recipients, within `limits`. Those that the server took it for; one
+// log line for each other one, or for the server when it can't be used, and errno says why.
 std::vector<std::string> deliver(const char* profile, const MailServer& server,
-                                 const std::string& from, const std::vector<std::string>& to,
-                                 const std::string& message, const MailLimits& limits);
+                                 const MailText& mail, const MailLimits& limits);
 
 }  // namespace host
 

@@ -1,9 +1,11 @@
+#include "mail/mail_message.hpp"
+
 #include <openssl/evp.h>
 
 #include <algorithm>
 #include <array>
+#include <utility>
 
-#include "mail/mail.hpp"
 #include "vorn/base/utf8.hpp"
 
 namespace host {
@@ -41,34 +43,6 @@ bool valid_address(std::string_view address) {
          });
 }
 
-std::string quoted_printable(std::string_view text) {
-  constexpr std::size_t kLongestLine = 76;
-  constexpr std::string_view kHex = "0123456789ABCDEF";
-  std::string out;
-  std::size_t column = 0;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    const char c = text[i];
-    if (c == '\n') {
-      out += "\r\n";
-      column = 0;
-      continue;
-    }
-    const bool ends_line = i + 1 == text.size() || text[i + 1] == '\n';
-    std::string word(1, c);
-    if (c < ' ' || c >= 0x7F || c == '=' || (c == ' ' && ends_line)) {
-      const auto byte = static_cast<unsigned char>(c);
-      word = {'=', kHex[byte >> 4U], kHex[byte & 15U]};
-    }
-    if (column + word.size() >= kLongestLine) {  // room for the soft break's own sign
-      out += "=\r\n";
-      column = 0;
-    }
-    out += word;
-    column += word.size();
-  }
-  return out;
-}
-
 std::string header_text(std::string_view text) {
   constexpr std::size_t kMostBytes = 39;  // 52 in base64: with frame and name of the field a line
   std::string line(text);
@@ -98,28 +72,45 @@ std::string header_text(std::string_view text) {
   return words;
 }
 
-std::string mail_message(const MailText& text) {
-  // Quoted-printable text can't hold it: after an equals sign stand digits or a line end.
-  constexpr std::string_view kBoundary = "=_vornreport";
-  const std::string delimiter = "\r\n--" + std::string(kBoundary);
-  const auto part = [&](std::string_view type, std::string_view body) {
-    return delimiter + "\r\nContent-Type: " + std::string(type) +
-           "; charset=UTF-8\r\nContent-Transfer-Encoding: quoted-printable\r\n\r\n" +
-           quoted_printable(body);
-  };
+SlistPtr mail_header(const MailText& text) {
   std::tm local{};
   localtime_r(&text.time, &local);
   // The process keeps the C locale, so the names of days and months are those of RFC 5322.
   std::array<char, 64> date{};
-  std::strftime(date.data(), date.size(), "%a, %d %b %Y %H:%M:%S %z", &local);
-  return std::string("Date: ") + date.data() + "\r\nFrom: " + text.from +
-         "\r\nTo: " + joined(text.to, ",\r\n ") + "\r\nMessage-ID: <" + text.message_id +
-         ">\r\nSubject: " + header_text(text.content.subject) +
-         "\r\nAuto-Submitted: auto-generated"
-         "\r\nMIME-Version: 1.0"
-         "\r\nContent-Type: multipart/alternative; boundary=\"" +
-         std::string(kBoundary) + "\"\r\n" + part("text/plain", text.content.plain) +
-         part("text/html", text.content.html) + delimiter + "--\r\n";
+  std::strftime(date.data(), date.size(), "Date: %a, %d %b %Y %H:%M:%S %z", &local);
+  SlistPtr header;
+  for (const std::string& field :
+       {std::string(date.data()), "From: " + text.from, "To: " + joined(text.to, ",\r\n "),
+        "Message-ID: <" + text.message_id + ">", "Subject: " + header_text(text.content.subject),
+        std::string("Auto-Submitted: auto-generated"),
+        std::string("Content-Type: multipart/alternative")}) {
+    curl_slist* longer = curl_slist_append(header.get(), field.c_str());
+    if (longer == nullptr) {
+      return nullptr;
+    }
+    static_cast<void>(header.release());
+    header.reset(longer);
+  }
+  return header;
+}
+
+// libcurl takes a lone line feed for a byte like others.
+MimePtr mail_body(CURL* curl, const MailContent& content) {
+  MimePtr body(curl_mime_init(curl));
+  for (const auto& [type, text] : {std::pair("text/plain; charset=UTF-8", &content.plain),
+                                   std::pair("text/html; charset=UTF-8", &content.html)}) {
+    std::string lines;
+    for (const char c : *text) {
+      lines += c == '\n' ? "\r\n" : std::string(1, c);
+    }
+    curl_mimepart* part = curl_mime_addpart(body.get());
+    if (curl_mime_data(part, lines.data(), lines.size()) != CURLE_OK ||
+        curl_mime_type(part, type) != CURLE_OK ||
+        curl_mime_encoder(part, "quoted-printable") != CURLE_OK) {
+      return nullptr;
+    }
+  }
+  return body;
 }
 
 }  // namespace host

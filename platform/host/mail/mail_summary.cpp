@@ -130,6 +130,18 @@ class Summary {
     return cut(std::move(lines));
   }
 
+  // What became of the runs before this one.
+  std::vector<std::string> earlier(const MailTopic& topic) const {
+    std::vector<std::string> told;
+    if (!topic.unfinished.empty()) {
+      told.push_back(say("unfinished", {{"time", topic.unfinished}}));
+    }
+    if (!topic.missed.empty()) {
+      told.push_back(say("missed", {{"time", topic.missed}}));
+    }
+    return told;
+  }
+
   // All the rest, but for the headline.
   std::vector<Line> lines(const MailTopic& topic, const std::optional<Facts>& facts) const {
     std::vector<Line> all;
@@ -222,13 +234,21 @@ std::string subject_of(const Summary& plain, const MailTopic& topic,
                            : plain.say("incidents", {{"subject", subject}, {"n", count}});
 }
 
+std::string paragraphs(const std::vector<std::string>& texts, const char* begin, const char* end) {
+  std::string all;
+  for (const std::string& text : texts) {
+    all += begin + text + end;
+  }
+  return all;
+}
+
 // --- Plain --------------------------------------------------------------------------------------
 
 std::string plain_body(const Summary& plain, const MailTopic& topic,
                        const std::optional<Facts>& facts) {
   const std::string headline = facts ? plain.headline(*facts) : "";
   std::string text = headline.empty() ? "" : headline + "\n\n";
-  text += plain.ready(topic, facts) + "\n\n";
+  text += plain.ready(topic, facts) + "\n\n" + paragraphs(plain.earlier(topic), "", "\n\n");
   if (facts && !facts->incidents.empty()) {
     for (const auto& [label, sentence, details] : plain.incidents(*facts)) {
       text += sentence + "\n" + (details.empty() ? "" : "    " + details + "\n");
@@ -297,7 +317,8 @@ std::string html_body(const Summary& html, const MailTopic& topic,
                       const std::optional<Facts>& facts) {
   const std::string headline = facts ? html.headline(*facts) : "";
   std::string body = headline.empty() ? "" : "<p><strong>" + headline + "</strong></p>\n";
-  body += "<p>" + html.ready(topic, facts) + "</p>\n";
+  body += "<p>" + html.ready(topic, facts) + "</p>\n" +
+          paragraphs(html.earlier(topic), "<p>", "</p>\n");
   if (facts && !facts->incidents.empty()) {
     body += html_incidents(html.incidents(*facts));
   }
@@ -314,6 +335,31 @@ MailContent report_mail(const Texts& texts, const MailTopic& topic,
   mail.plain = plain_body(plain, topic, facts);
   mail.html =
       html_page(texts, mail.subject, html_body(Summary(texts, TextForm::html), topic, facts));
+  return mail;
+}
+
+MailContent failure_mail(const Texts& texts, const MailTopic& topic,
+                         const std::vector<std::string>& log) {
+  const Summary plain(texts, TextForm::plain);
+  const Summary html(texts, TextForm::html);
+  MailContent mail;
+  mail.subject = plain.about("failedSubject", topic);
+  mail.plain = plain.about("failed", topic) + "\n\n" +
+               paragraphs(plain.earlier(topic), "", "\n\n") + plain.about("failedRemedy", topic) +
+               "\n";
+  std::string body = "<p>" + html.about("failed", topic) + "</p>\n" +
+                     paragraphs(html.earlier(topic), "<p>", "</p>\n") + "<p>" +
+                     html.about("failedRemedy", topic) + "</p>\n";
+  if (!log.empty()) {
+    mail.plain += "\n" + plain.say("failedLog") + "\n\n";
+    body += "<p>" + html.say("failedLog") + "</p>\n<pre style=\"white-space: pre-wrap\">";
+    for (const std::string& line : log) {
+      mail.plain += "    " + name_in(TextForm::plain, line) + "\n";
+      body += name_in(TextForm::html, line) + "\n";
+    }
+    body += "</pre>\n";
+  }
+  mail.html = html_page(texts, mail.subject, body);
   return mail;
 }
 

@@ -4,6 +4,7 @@
 
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "report_format/facts.hpp"
 #include "report_format/texts.hpp"
@@ -14,9 +15,11 @@ namespace host {
 struct MailTopic {
   std::string profile;
   std::string host;
-  std::string time;         // of the mail, for readers
-  std::string link;         // to the report
-  std::string report_list;  // as the profile has it
+  std::string time;          // of the mail, for readers
+  std::string link;          // to the report
+  std::string report_list;   // as the profile has it
+  std::string unfinished{};  // when the run before began, which didn't finish; else empty
+  std::string missed{};      // when a run was due that never began; else empty
 };
 
 // A mail's subject (one line of any characters) and its body in both forms. The HTML stands alone:
@@ -31,6 +34,9 @@ struct MailContent {
 // lacks. Without facts the mail says that they are missing.
 MailContent report_mail(const report_format::Texts& texts, const MailTopic& topic,
                         const std::optional<report_format::Facts>& facts);
+// Of a run that failed: what it said to the log, and what to do.
+MailContent failure_mail(const report_format::Texts& texts, const MailTopic& topic,
+                         const std::vector<std::string>& log);
 // Only the profile, the host and the time of `topic` count.
 MailContent test_mail(const report_format::Texts& texts, const MailTopic& topic);
 

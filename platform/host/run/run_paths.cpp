@@ -206,6 +206,7 @@ std::optional<ReportRun> begin_report_run(const char* profile, const VLIBCSzHash
   const char* report_list = hash.find("report_list");
   run.report_list = report_list == nullptr ? "" : report_list;
   run.keep = reports_to_keep(profile, hash);
+  run.settings = hash;
   return run;
 }
 

@@ -7,6 +7,7 @@
 #include <string_view>
 #include <vector>
 
+#include "base/text_containers.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/text.h"
 
@@ -51,6 +52,7 @@ struct ReportRun {
   std::string report_list{};  // of the profile
   std::size_t keep = 0;       // reports that the profile keeps; 0: all
   bool mail_failed = false;
+  VLIBCSzHash settings{0};  // the profile's section
 };
 
 std::optional<ReportRun>& report_run();

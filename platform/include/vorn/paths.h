@@ -13,9 +13,14 @@
 #define VORN_PATH_PROGRESS "/usr/vorn/var/progress"
 #define VORN_PATH_REPORTS "/usr/vorn/var/reports"
 #define VORN_PATH_CRON "/etc/cron.d"
+#define VORN_PATH_UNITS "/etc/systemd/system"
+#define VORN_PATH_SHIPPED_UNITS "/usr/lib/systemd/system"
 
 // The name beside a run's statistics database of what it took over from a share's file index.
 #define VORN_INDEX_COPY "index.db"
+
+// The line of a timer that says its times as cron's fields; systemd leaves it aside.
+#define VORN_TIMER_TIMES "X-VornTimes"
 
 // Temporary files of a run; the argument is the process id.
 #define VORN_TMP_DATA_FORMAT "/tmp/vornreport_data.%u"

@@ -40,10 +40,20 @@ int VornQazProfileRunning(const char* profile);
 // "success" is stored only when the finished report, page and facts, is complete and on the disk;
 // otherwise "fail" is stored, one syslog line says why, and what looked like a report is removed.
 // Behind the word the status file tells more (report_format/run_state.hpp).
+// That end is told (see vornreport(8), "Who is told"): a failure by mail and on standard error, what
+// no mail has told on standard error, everything in the profile's metrics_file.
 // 0 when the word was stored; 1 when "fail" was, in place of "success"; -1 when nothing could be.
 // After a success the oldest finished reports beyond the profile's key `keep_reports` (a number
 // from 1 on; unset: all are kept) are removed, never the one just made.
 int VornQazStatusUpdate(const char* profile, const char* status);
+
+// A run of `profile` that was only to collect data has failed: stores, beside its word, that it has
+// ended, and tells of it as VornQazStatusUpdate does of a report run. Only for the process that has
+// taken the profile.
+void VornQazDataFailed(const char* profile);
+
+// Notes a line that the program has written to the system log: a run that fails is told with them.
+void VornQazNoteLogLine(const char* line);
 
 // Notes that the mail of the report run in progress reached nobody; its status will tell it.
 void VornQazStatusMailFailed(void);
@@ -179,7 +189,8 @@ int VornQazImportSharePathHash(const VLIBCSzHash* share_path_hash, FILE* data);
 // `report_dir`) and the rest of the path, percent-encoded. Only for a complete page. 0 or -1.
 int VornGetTargetLink(const VLIBCSzHash* hash, const char* target_file, char* link, size_t size);
 
-// Sends the profile's mail with `link` to the recipients in `mail_to` through `smtp_url`. Waits are
+// Sends the profile's mail with `link` to the recipients in `mail_to` through `smtp_url`; it tells
+// of a run before this one that didn't finish or never began, too. Waits are
 // bounded. 0 when no mail is wanted or at least one recipient was served (each refused one is a
 // syslog line); -1, with one syslog line, when nobody was.
 int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* hash);

@@ -23,7 +23,17 @@ struct RunStatus {
   std::string report{};      // folder name of the finished report; only of kSuccess
   int incidents = 0;         // that the report tells
   bool mail_failed = false;  // its mail reached nobody
+  // Seconds since the epoch, 0 where there is none: of this run, then of runs before it, too.
+  std::int64_t started = 0;
+  std::int64_t ended = 0;
+  std::int64_t report_started = 0;  // when the last run began that was to make a report
+  std::int64_t succeeded = 0;       // when the last one ended that made one
 };
+// Whether the status is that of a run that goes on or was killed. ("global" keeps it when all went
+// well.)
+inline bool was_cut(const RunStatus& status) {
+  return status.word == kCollecting && status.ended == 0;
+}
 std::string status_text(const RunStatus& status);
 RunStatus status_of(std::string_view text);
 

@@ -9,6 +9,8 @@ namespace report_format {
 
 // "true" in any mix of case; nothing else is.
 bool is_true(std::string_view value);
+// "false" likewise, for keys that are true without a value.
+bool is_false(std::string_view value);
 
 // The number that `digits` are: decimal digits and nothing else. Nothing for another text, and for
 // a number that is too large.

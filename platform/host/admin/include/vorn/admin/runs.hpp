@@ -31,6 +31,10 @@ struct LastRun {
 };
 LastRun last_run(const std::string& profile);
 
+// What is wrong with a value of the profile's key metrics_file, as the end of a sentence that
+// begins with it, or nothing.
+std::string metrics_file_problem(const std::string& value);
+
 // How far the run that is going on has come; nothing when there is none or it doesn't tell.
 std::optional<report_format::Progress> read_progress(const std::string& profile);
 

@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -10,12 +11,16 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "base/host_log.hpp"
 #include "base/scratch.hpp"
 #include "base/text_containers.hpp"
 #include "config/profile.hpp"
+#include "outcome/course.hpp"
+#include "outcome/metrics.hpp"
+#include "outcome/tell.hpp"
 #include "report_format/facts_file.hpp"
 #include "report_format/reports.hpp"
 #include "report_format/run_state.hpp"
@@ -95,15 +100,20 @@ bool is_durable(const ReportRun& run) {
   return true;
 }
 
+struct Outcome {
+  RunStatus status;                           // without times
+  std::optional<report_format::Facts> facts;  // of the report, if there is one
+};
+
 // What is to be stored of a report run that ends as `word` says. The page with its facts is its
 // product: without them there is no success, and no report.
-RunStatus outcome_of(const ReportRun& run, std::string_view word) {
+Outcome outcome_of(const ReportRun& run, std::string_view word) {
   const ErrnoKeeper keeper;
   const bool is_whole = page_is_whole(run.page.c_str(), run.report_list);
-  const auto facts = is_whole ? report_format::read_facts(run.finished) : std::nullopt;
+  auto facts = is_whole ? report_format::read_facts(run.finished) : std::nullopt;
   if (word == report_format::kSuccess && facts && is_durable(run)) {
-    return {std::string(word), name_of(run), static_cast<int>(facts->incidents.size()),
-            run.mail_failed};
+    const int incidents = static_cast<int>(facts->incidents.size());
+    return {{std::string(word), name_of(run), incidents, run.mail_failed}, std::move(facts)};
   }
   if (word == report_format::kSuccess && !facts) {
     log_line(
@@ -114,7 +124,54 @@ RunStatus outcome_of(const ReportRun& run, std::string_view word) {
   if (!is_whole || word == report_format::kSuccess) {
     take_back(run);
   }
-  return {.word = report_format::kFail};
+  return {{.word = report_format::kFail}, std::nullopt};
+}
+
+// The times of a run that has come to `status`, with those of the runs before it.
+void add_times(const std::string& profile, bool is_report, RunStatus& status) {
+  const RunStatus stored = stored_status(profile);
+  const bool is_first = status.word == report_format::kCollecting;
+  const auto& own = course();
+  const bool is_own = own && own->profile == profile;
+  status.started = is_own ? own->started : stored.started;
+  status.ended = is_first ? 0 : std::time(nullptr);
+  status.report_started = is_report ? status.started : stored.report_started;
+  status.succeeded = status.report.empty() ? stored.succeeded : status.ended;
+}
+
+// The facts of the newest report that is whole, for a run that made none.
+std::optional<report_format::Facts> newest_facts(const std::string& profile,
+                                                 const VLIBCSzHash& settings) {
+  const auto dir = report_dir(profile.c_str(), settings);
+  const std::string folder = dir ? *dir + "/" + profile : "";
+  const auto reports = dir ? stored_reports(folder, ReportSize::left_out) : std::nullopt;
+  if (!reports) {
+    return std::nullopt;
+  }
+  const auto newest = std::find_if(reports->rbegin(), reports->rend(),
+                                   [](const StoredReport& report) { return report.is_whole; });
+  return newest == reports->rend() ? std::nullopt
+                                   : report_format::read_facts(folder + "/" + newest->name);
+}
+
+// Once in the life of the process, and only by the one that has made the run.
+void tell_end(const std::string& profile, const Outcome& outcome,
+              const std::optional<ReportRun>& ended) {
+  if (!course() || course()->profile != profile || std::exchange(course()->is_told, true)) {
+    return;
+  }
+  const ErrnoKeeper keeper;
+  const VLIBCSzHash settings = ended ? ended->settings : readable_settings(profile);
+  const bool has_failed = outcome.status.word == report_format::kFail;
+  if ((ended || has_failed) && settings.find("metrics_file") != nullptr) {
+    write_metrics(profile, settings, outcome.status,
+                  outcome.facts ? outcome.facts : newest_facts(profile, settings));
+  }
+  if (has_failed) {
+    tell_failure(*course(), settings);
+  } else if (outcome.facts) {
+    tell_report(*course(), *outcome.facts, settings, outcome.status.mail_failed);
+  }
 }
 
 // The database beside it is the program's to remove, which may have it open still.
@@ -136,6 +193,9 @@ int update_status(const std::string& profile, std::string_view word) {
     return -1;
   }
   if (!holds_profile(profile)) {
+    if (word == report_format::kFail) {
+      tell_end(profile, {{.word = std::string(word)}, {}}, {});
+    }
     errno = ENOLCK;  // taking it has failed, and said so
     return -1;
   }
@@ -144,9 +204,15 @@ int update_status(const std::string& profile, std::string_view word) {
     ended.swap(report_run());
     forget_index_copy();
   }
-  const RunStatus status = ended ? outcome_of(*ended, word) : RunStatus{.word = std::string(word)};
-  const bool is_first = word == kCollecting;
-  if (!(is_first ? store_first_status(profile, status) : store_status(profile, status))) {
+  Outcome outcome = ended ? outcome_of(*ended, word) : Outcome{{.word = std::string(word)}, {}};
+  RunStatus& status = outcome.status;
+  add_times(profile, ended || word == report_format::kFail, status);
+  if (word == kCollecting) {
+    return store_first_status(profile, status) ? 0 : -1;
+  }
+  const bool is_stored = store_status(profile, status);
+  tell_end(profile, outcome, ended);
+  if (!is_stored) {
     return -1;
   }
   if (!status.report.empty() && ended->keep > 0) {
@@ -191,6 +257,9 @@ int VornQazProfileRunning(const char* profile) {
   }
   try {
     const host::TakeResult taken = host::take_profile(profile);
+    if (taken != host::TakeResult::busy) {
+      host::begin_course(profile);
+    }
     if (taken == host::TakeResult::failed) {
       const host::ErrnoKeeper keeper;
       host::store_first_status(profile, {.word = report_format::kFail});  // it comes to nothing
@@ -210,6 +279,20 @@ int VornQazStatusUpdate(const char* profile, const char* status) {
   } catch (const std::exception&) {
     return -1;
   }
+}
+
+void VornQazDataFailed(const char* profile) try {
+  if (profile == nullptr || !host::course() || host::course()->profile != profile) {
+    return;
+  }
+  if (host::course()->profile != "global" && host::holds_profile(profile)) {
+    host::RunStatus status = host::stored_status(profile);
+    status.ended = std::time(nullptr);
+    host::store_status(profile, status);
+  }
+  host::tell_failure(*host::course(), host::readable_settings(profile));
+} catch (const std::exception&) {
+  // The log has what failed.
 }
 
 void VornQazStatusMailFailed(void) {

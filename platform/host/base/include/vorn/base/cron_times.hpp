@@ -1,6 +1,6 @@
 // The time fields of a cron line, read as Debian's cron reads them.
-#ifndef VORN_CTL_CRON_TIMES_HPP
-#define VORN_CTL_CRON_TIMES_HPP
+#ifndef VORN_HOST_CRON_TIMES_HPP
+#define VORN_HOST_CRON_TIMES_HPP
 
 #include <array>
 #include <bitset>
@@ -8,8 +8,9 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
-namespace ctl {
+namespace host {
 
 class CronTimes {
  public:
@@ -23,6 +24,9 @@ class CronTimes {
   // The fields as they go into a cron file: names of months and days as numbers, since cron takes
   // names neither in lists nor in ranges.
   const std::string& text() const { return text_; }
+
+  // The same times as values of systemd's OnCalendar=, to be taken together. None for @reboot.
+  std::vector<std::string> calendar() const;
 
   // The first time after `now`, in the time zone of this process. Nothing for @reboot.
   std::optional<std::time_t> next(std::time_t now) const;
@@ -38,6 +42,6 @@ class CronTimes {
   bool any_day_of_week_ = false;
 };
 
-}  // namespace ctl
+}  // namespace host
 
 #endif

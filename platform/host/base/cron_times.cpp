@@ -1,4 +1,4 @@
-#include "schedule/cron_times.hpp"
+#include "vorn/base/cron_times.hpp"
 
 #include <strings.h>
 
@@ -9,7 +9,7 @@
 #include <utility>
 #include <vector>
 
-namespace ctl {
+namespace host {
 
 namespace {
 
@@ -181,6 +181,46 @@ void CronTimes::read_fields(std::string_view text) {
   any_day_of_week_ = words.size() > kWeekday && words[kWeekday].starts_with('*');
 }
 
+namespace {
+
+// "*" or "1,15", from `low` to `high`.
+std::string listed(const CronTimes::Values& values, unsigned low, unsigned high) {
+  std::string list;
+  bool has_all = true;
+  for (unsigned i = low; i <= high; ++i) {
+    has_all = has_all && values.test(i);
+    list += values.test(i) ? (list.empty() ? "" : ",") + std::to_string(i) : "";
+  }
+  return has_all ? "*" : list;
+}
+
+std::string listed_days_of_week(const CronTimes::Values& values) {
+  std::string list;
+  for (unsigned i = 0; i < std::size(kDays); ++i) {
+    list += values.test(i) ? (list.empty() ? "" : ",") + std::string(kDays[i]) : "";
+  }
+  return list + " ";
+}
+
+}  // namespace
+
+std::vector<std::string> CronTimes::calendar() const {
+  if (values_[kMinute].none()) {
+    return {};
+  }
+  const auto range = [&](FieldIndex field) {
+    return listed(values_[field], kFields[field].low, kFields[field].high);
+  };
+  const std::string month = "*-" + range(kMonth) + "-";
+  const std::string time = " " + range(kHour) + ":" + range(kMinute) + ":00";
+  const bool every_weekday = listed(values_[kWeekday], 0, std::size(kDays) - 1) == "*";
+  const std::string weekdays = every_weekday ? "" : listed_days_of_week(values_[kWeekday]);
+  if (any_day_of_month_ || any_day_of_week_) {
+    return {weekdays + month + range(kDay) + time};
+  }
+  return {weekdays + month + "*" + time, month + range(kDay) + time};
+}
+
 bool CronTimes::day_matches(const std::tm& day) const {
   const bool of_month = values_[kDay].test(static_cast<std::size_t>(day.tm_mday));
   const bool of_week = values_[kWeekday].test(static_cast<std::size_t>(day.tm_wday));
@@ -217,4 +257,4 @@ std::optional<std::time_t> CronTimes::next(std::time_t now) const {
   return std::nullopt;
 }
 
-}  // namespace ctl
+}  // namespace host

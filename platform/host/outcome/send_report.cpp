@@ -1,0 +1,27 @@
+// The mail of a finished report, which tells of the runs before it, too.
+#include <cerrno>
+
+#include "base/text_containers.hpp"
+#include "config/profile.hpp"
+#include "mail/mail.hpp"
+#include "outcome/course.hpp"
+#include "vorn/report.h"
+
+int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* hash) try {
+  if (link == nullptr || hash == nullptr || !host::valid_profile(profile)) {
+    errno = EINVAL;
+    return -1;
+  }
+  const int saved_errno = errno;
+  const auto& course = host::course();
+  const host::EarlierRuns earlier =
+      course && course->profile == profile ? host::earlier_runs(*course) : host::EarlierRuns{};
+  const int result = host::send_report(profile, link, *hash, earlier, host::MailLimits{});
+  if (result == 0) {
+    errno = saved_errno;
+  }
+  return result;
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
