@@ -159,8 +159,7 @@ start_log
 in_sandbox --log "$log_dir/socket" -- /usr/vorn/bin/vornreport --report "$profile" \
   >"$stage/output" 2>&1 || true
 stop_log
-# Quotas are rare; the page says it when there are none.
-sed '/src\/rep_quota_usage:/d' "$log_dir/lines" >&2
+cat "$log_dir/lines" >&2
 
 made=''
 if [[ $(head -n 1 "$stage/usr/vorn/var/status/$profile" 2>/dev/null) == success ]]; then

@@ -1,5 +1,6 @@
 """The Debian package in a private view of this machine: installed, run by systemd, upgraded,
 removed and purged by the real tools, with everything they write kept in memory."""
+import json
 import os
 import re
 import shutil
@@ -201,7 +202,7 @@ class Package(unittest.TestCase):
         units = list((self.root / 'usr/lib/systemd/system').glob('vornreport*.service'))
         for unit in units:
             call('systemd-analyze', 'security', '--offline=true', '--threshold=25', unit)
-        share, elsewhere = self.root / 'home/share', self.root / 'srv/elsewhere'
+        share, elsewhere = self.root / 'home/share', self.root / 'elsewhere'
         for path in (share, elsewhere):
             path.mkdir(parents=True)
         for path in (share / 'first', share / 'second', share):
@@ -213,17 +214,36 @@ class Package(unittest.TestCase):
         elsewhere.chmod(0o2750)
         self.configure('share.conf', '[mine]\npath = /home/share\n')
         mails = MailServer(self, self.base / 'mails')
+        mail = f'mail_to = ann@localhost\nsmtp_url = smtp://localhost:{mails.port}\n'
+        metrics = self.root / 'srv/metrics'
+        metrics.mkdir(parents=True)
+        shutil.chown(self.root / 'srv', 'nobody')
         self.configure('vornreport.conf', (
-            f'[home]\n{PROFILE}mail_to = ann@localhost\nsmtp_url = smtp://localhost:{mails.port}\n'
-            f'[elsewhere]\n{PROFILE}report_dir = /srv/elsewhere\n'
-            f'[denied]\n{PROFILE}report_dir = /srv\n'))
+            f'[home]\n{PROFILE}{mail}[denied]\n{PROFILE}{mail}report_dir = /mnt/denied\n'
+            f'[elsewhere]\n{PROFILE}report_dir = /elsewhere\n'
+            'metrics_file = /srv/metrics/elsewhere.prom\n'))
+        (self.root / 'usr/sbin/policy-rc.d').unlink(missing_ok=True)  # a container's, that starts nothing
         own = self.root / 'etc/systemd/system/vornreport@elsewhere.service.d/own.conf'
         own.parent.mkdir()
-        own.write_text('[Service]\nReadWritePaths=/srv/elsewhere\nSupplementaryGroups=users\n')
-        timers, log, remaining = self.boot(self.quota_volume(), """
+        own.write_text('[Service]\nNice=11\n')
+        doctor, listed, timers, log, remaining = self.boot(self.quota_volume(), """
+systemctl --quiet enable --now vornreport@denied.timer vornreport-data@global.timer
+systemctl --quiet enable vornreport@home.timer
+vornctl doctor | grep '@' || true
+vornctl schedule elsewhere --report '15 4 * * 2' >/dev/null
+vornctl schedule elsewhere --timer --data @hourly >/dev/null
+vornctl schedule home --report '@daily' >/dev/null
 systemctl start vornreport-data@global vornreport@home vornreport@elsewhere
 if systemctl start vornreport@denied >/dev/null 2>&1; then exit 1; fi
-systemctl --quiet enable --now vornreport@home.timer vornreport-data@global.timer
+echo ---
+vornctl schedule --json
+echo ---
+dpkg --remove vornreport >/dev/null
+systemctl list-timers --no-legend
+dpkg --install /var/cache/package.deb >/dev/null
+systemctl list-timers --no-legend
+vornctl profile remove denied >/dev/null 2>&1
+vornctl schedule global --clean >/dev/null
 systemctl list-timers --no-legend
 echo ---
 journalctl -o cat -b -t vornreport
@@ -232,16 +252,31 @@ dpkg --purge vornreport >/dev/null
 echo ---
 systemctl list-timers --no-legend
 """).split('---\n')
-        self.assertEqual((re.findall(r' (\S+).timer', timers), remaining),
-                         (['vornreport-data@global', 'vornreport@home'], ''))
+        self.assertRegex(doctor, r'(?m)^✗.*@home\.timer: it is enabled but not started')
+        self.assertRegex(doctor, r'(?m)^✗.*@denied\.service: /mnt/denied can.t be found')
+        self.assertEqual({(job['profile'], job['kind'], job['times'], job['next_run'] is not None)
+                          for job in json.loads(listed)},
+                         {('global', 'data', '0 3 * * *', True), ('home', 'report', '@daily', True),
+                          ('denied', 'report', '0 4 * * 1', True),
+                          ('elsewhere', 'report', '15 4 * * 2', True),
+                          ('elsewhere', 'data', '@hourly', True)})
+        names = ['vornreport-data@elsewhere', 'vornreport-data@global', 'vornreport@denied',
+                 'vornreport@elsewhere', 'vornreport@home']
+        found = re.findall(r' (vornreport\S+)\.timer', timers)
+        self.assertEqual(sorted(found), sorted(names + ['vornreport-data@elsewhere',
+                                                        'vornreport@elsewhere', 'vornreport@home']),
+                         timers)
+        self.assertEqual(remaining, '')
         for line in log.splitlines():
-            self.assertRegex(line, 'volume=/ get quota failed|/srv/denied .*Read-only|=denied')
+            self.assertRegex(line, 'volume=/ get quota failed|/mnt/denied .*Read-only|denied')
+        metrics = (metrics / 'elsewhere.prom').read_text()
+        self.assertIn('last_run_success{profile="elsewhere"} 1\n', metrics)
         page, = self.root.glob('kept/*/report.html')
         text = page.read_text()
         for expected in ("['nobody', 16384, 8192, 50.0]", "'/home/share/first', 6", "[ '/mnt', "):
             self.assertIn(expected, text)
         self.assertEqual(len(data_rows(text, 'vornVolumeUsageData')), 2, text[:1000])
-        self.assertEqual(len(mails.mails()), 1)
+        self.assertEqual(len(mails.mails()), 2)  # one of them of a failure
         page, = elsewhere.glob('elsewhere/*/report.html')
         for path in (page, page.with_name('report.json')):
             self.assertEqual((path.owner(), path.group(), path.stat().st_mode & 0o777),

@@ -5,6 +5,7 @@
 #include "config/profile.hpp"
 #include "mail/mail.hpp"
 #include "outcome/course.hpp"
+#include "vorn/base/file_io.hpp"
 #include "vorn/report.h"
 
 int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* hash) try {
@@ -12,15 +13,12 @@ int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* 
     errno = EINVAL;
     return -1;
   }
-  const int saved_errno = errno;
-  const auto& course = host::course();
-  const host::EarlierRuns earlier =
-      course && course->profile == profile ? host::earlier_runs(*course) : host::EarlierRuns{};
-  const int result = host::send_report(profile, link, *hash, earlier, host::MailLimits{});
-  if (result == 0) {
-    errno = saved_errno;
-  }
-  return result;
+  return host::keeping_errno([&] {
+    const auto& course = host::course();
+    const host::EarlierRuns earlier =
+        course && course->profile == profile ? host::earlier_runs(*course) : host::EarlierRuns{};
+    return host::send_report(profile, link, *hash, earlier, host::MailLimits{});
+  });
 } catch (...) {
   errno = ENOMEM;
   return -1;
