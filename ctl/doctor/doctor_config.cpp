@@ -1,5 +1,6 @@
 // What the two configuration files say.
 #include <algorithm>
+#include <map>
 
 #include "base/ctl.hpp"
 #include "config/checks.hpp"
@@ -115,6 +116,17 @@ Configuration check_configuration(Findings& findings) {
     }
     check_profile(findings, section);
     configuration.profiles.push_back(std::move(section));
+  }
+  std::map<std::string, std::string> metrics;  // file to profile
+  for (const Section& profile : configuration.profiles) {
+    const std::string file = profile.value("metrics_file");
+    if (const auto [other, is_new] = metrics.try_emplace(file, profile.name);
+        !file.empty() && !is_new) {
+      findings.add(
+          Level::error, "profile " + profile.name,
+          "its metrics_file is that of " + other->second + ", so each replaces the other's",
+          "run vornctl profile set " + profile.name + " metrics_file with another file");
+    }
   }
   if (!collects) {
     findings.add(Level::warning, "whole server", "without a section [global] no history is kept",
