@@ -268,7 +268,7 @@ systemctl list-timers --no-legend
                          timers)
         self.assertEqual(remaining, '')
         for line in log.splitlines():
-            self.assertRegex(line, 'volume=/ get quota failed|/mnt/denied .*Read-only|denied')
+            self.assertRegex(line, 'volume=/ get quota failed|^repquota: |denied')
         metrics = (metrics / 'elsewhere.prom').read_text()
         self.assertIn('last_run_success{profile="elsewhere"} 1\n', metrics)
         page, = self.root.glob('kept/*/report.html')

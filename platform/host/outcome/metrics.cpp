@@ -200,21 +200,21 @@ void write_metrics(const std::string& profile, const VLIBCSzHash& settings,
     return;
   }
   if (const char* error = metrics_file_error(value); error != nullptr) {
-    log_line("profile \"%s\": metrics_file \"%.1100s\" %s; correct it in %s", profile.c_str(),
-             value, error, VORN_PATH_CONFIG);
+    log_line(R"(profile "%s": metrics_file "%.1100s" %s; correct it in %s)", profile.c_str(), value,
+             error, VORN_PATH_CONFIG);
     return;
   }
   const char* users = settings.find("metrics_users");
   std::string name;
   const TrustedFolder opened = open_folder_of(value, name);
   if (!opened.folder) {
-    log_line("profile \"%s\": metrics_file %s can't be written: %s", profile.c_str(), value,
+    log_line(R"(profile "%s": metrics_file %s can't be written: %s)", profile.c_str(), value,
              opened.problem.empty() ? "its folder is missing; make it" : opened.problem.c_str());
   } else if (!replace_file(opened.folder, name,
                            metrics_text(profile, status, facts,
                                         users != nullptr && report_format::is_true(users)))) {
     log_line(
-        "profile \"%s\": metrics_file %s can't be written (%s); vornctl doctor looks at its folder",
+        R"(profile "%s": metrics_file %s can't be written (%s); vornctl doctor looks at its folder)",
         profile.c_str(), value, std::strerror(errno));
   }
 }
