@@ -4,6 +4,7 @@
 #include <optional>
 
 #include "base/ctl.hpp"
+#include "vorn/admin/runs.hpp"
 #include "vorn/paths.h"
 
 namespace ctl {
@@ -56,6 +57,18 @@ bool profile_exists(const std::string& name) {
                      [&](const Section& section) { return section.name == name; });
 }
 
+void hold_profile(const std::string& profile) {
+  const std::string title = "profile \"" + profile + "\"";
+  switch (admin::hold_profile(profile)) {
+    case admin::Hold::taken:
+      return;
+    case admin::Hold::running:
+      throw Failure(title + " is running; try again when its run has ended");
+    case admin::Hold::failed:
+      throw host_failure(title + " can't be locked");
+  }
+}
+
 std::vector<Share> read_shares() {
   return content_of(admin::read_shares(), VORN_PATH_SHARES);
 }
@@ -64,8 +77,9 @@ void add_section(const char* file, const std::string& name, const Changes& entri
   check_changed(admin::add_section(file, name, entries), file);
 }
 
-void change_section(const char* file, const std::string& name, const Changes& changes) {
-  check_changed(admin::change_section(file, name, changes), file);
+void change_section(const char* file, const std::string& name, const Changes& changes,
+                    const std::string& new_name) {
+  check_changed(admin::change_section(file, name, changes, new_name), file);
 }
 
 void remove_section(const char* file, const std::string& name) {

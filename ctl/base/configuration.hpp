@@ -24,12 +24,16 @@ std::vector<Section> read_profiles();
 Section read_profile(const std::string& name);
 bool profile_exists(const std::string& name);
 
+// No run of the profile can begin from here to the end of the process.
+void hold_profile(const std::string& profile);
+
 // The usable shares in the order of the file; what is left out is warned of.
 std::vector<Share> read_shares();
 
 // Each changes one section of `file`, as admin's function of this name does.
 void add_section(const char* file, const std::string& name, const Changes& entries);
-void change_section(const char* file, const std::string& name, const Changes& changes);
+void change_section(const char* file, const std::string& name, const Changes& changes,
+                    const std::string& new_name = {});
 void remove_section(const char* file, const std::string& name);
 
 }  // namespace ctl

@@ -103,15 +103,16 @@ std::optional<ConfigFile> examine_file(const std::string& file) {
 }
 
 bool add_section(const std::string& file, const std::string& name, const Changes& entries) {
-  return edit(file, {host::SectionEdit::Kind::add, name, entries});
+  return edit(file, {host::SectionEdit::Kind::add, name, entries, {}});
 }
 
-bool change_section(const std::string& file, const std::string& name, const Changes& changes) {
-  return edit(file, {host::SectionEdit::Kind::change, name, changes});
+bool change_section(const std::string& file, const std::string& name, const Changes& changes,
+                    const std::string& new_name) {
+  return edit(file, {host::SectionEdit::Kind::change, name, changes, new_name});
 }
 
 bool remove_section(const std::string& file, const std::string& name) {
-  return edit(file, {host::SectionEdit::Kind::remove, name, {}});
+  return edit(file, {host::SectionEdit::Kind::remove, name, {}, {}});
 }
 
 }  // namespace admin

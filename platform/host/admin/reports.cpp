@@ -1,10 +1,13 @@
 #include "vorn/admin/reports.hpp"
 
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 
 #include "admin/section_hash.hpp"
@@ -67,6 +70,33 @@ bool remove_all_reports(const std::string& folder) {
                    holds_more ? "it holds more than reports" : std::strerror(errno));
   }
   return true;
+}
+
+bool move_reports(const std::string& folder, const std::string& to) {
+  const host::Fd opened = host::open_report_folder(folder);
+  if (!opened) {
+    return errno == ENOENT;
+  }
+  // Above it, too, nobody else can put something in its place.
+  if (renameat2(AT_FDCWD, folder.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) {
+    return true;
+  }
+  host::log_line("%s can't be renamed to %s (%s); see what stands there", folder.c_str(),
+                 to.c_str(), std::strerror(errno));
+  return false;
+}
+
+bool make_folder_like(const std::string& folder, const std::string& to) {
+  const host::Fd opened = host::open_report_folder(folder);
+  struct stat like {};
+  if (!opened) {
+    return false;
+  }
+  if (fstat(opened.get(), &like) == 0 && mkdir(to.c_str(), like.st_mode & 0777U) == 0) {
+    return true;
+  }
+  host::log_line("%s can't be made (%s); see what stands there", to.c_str(), std::strerror(errno));
+  return false;
 }
 
 std::optional<std::string> link_to(const Section& profile, const std::string& page) {

@@ -5,8 +5,11 @@
 
 #include <cerrno>
 #include <charconv>
+#include <cstdio>
+#include <cstring>
 
 #include "admin/section_hash.hpp"
+#include "base/host_log.hpp"
 #include "config/profile.hpp"
 #include "outcome/metrics.hpp"
 #include "run/run_lock.hpp"
@@ -88,6 +91,19 @@ std::string metrics_file_problem(const std::string& value) {
   return problem.empty() ? "" : "can't be written: " + problem;
 }
 
+std::optional<RunTrace> last_trace(const std::string& profile) {
+  const auto taken = host::last_taken_for_run(profile);
+  if (!taken) {
+    return std::nullopt;
+  }
+  RunTrace trace{taken->process, taken->time, std::nullopt};
+  struct stat stored {};
+  if (!host::held_by_other(profile) && stat(status_file(profile).c_str(), &stored) == 0) {
+    trace.ended = stored.st_mtime;
+  }
+  return trace;
+}
+
 std::optional<report_format::Progress> read_progress(const std::string& profile) {
   if (!host::held_by_other(profile)) {
     return std::nullopt;  // a killed run leaves what it has told
@@ -97,7 +113,7 @@ std::optional<report_format::Progress> read_progress(const std::string& profile)
 }
 
 Hold hold_profile(const std::string& profile) {
-  switch (host::take_profile(profile)) {
+  switch (host::take_profile(profile, host::TakeFor::administration)) {
     case host::TakeResult::taken:
       return Hold::taken;
     case host::TakeResult::busy:
@@ -117,6 +133,15 @@ bool forget_runs(const Section& profile) {
   const bool is_clean = clean_up(profile);
   unlink(status_file(profile.name).c_str());
   return is_clean;
+}
+
+bool move_status(const std::string& profile, const std::string& to) {
+  if (std::rename(status_file(profile).c_str(), status_file(to).c_str()) == 0 || errno == ENOENT) {
+    return true;
+  }
+  host::log_line("the status of profile \"%s\" can't be renamed (%s); run this as root",
+                 profile.c_str(), std::strerror(errno));
+  return false;
 }
 
 std::optional<std::vector<std::string>> leftovers_of(const Section& profile) {

@@ -70,7 +70,11 @@ class LookUp {
       }
     }
     Fd folder(openat(at_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    return folder ? TrustedFolder{std::move(folder), ""} : failed();
+    if (!folder) {
+      refuse(shown_ + " can't be read", "see to it");
+      return failed();
+    }
+    return TrustedFolder{std::move(folder), ""};
   }
 
  private:
@@ -140,7 +144,7 @@ class LookUp {
     if (errno != EPERM || what.ends_with("made")) {
       problem_ += std::string(" (") + std::strerror(errno) + ")";
     }
-    problem_ += "; " + remedy;
+    problem_ += "; " + (errno == EACCES ? "run this as root" : remedy);
     return false;
   }
 

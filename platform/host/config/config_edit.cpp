@@ -73,6 +73,13 @@ std::string new_lines(const Lines& lines, const SectionRange& range, const Confi
   return out;
 }
 
+std::string renamed(const ConfigLine& header, std::string_view name) {
+  std::string out(header.bytes);
+  out.replace(static_cast<std::size_t>(header.name.data() - header.bytes.data()),
+              header.name.size(), name);
+  return out;
+}
+
 std::string with_changes(const Lines& lines, const SectionRange& range, const SectionEdit& edit) {
   std::size_t last_key = range.header;
   for (std::size_t i = range.header + 1; i < range.end; ++i) {
@@ -83,7 +90,9 @@ std::string with_changes(const Lines& lines, const SectionRange& range, const Se
     const ConfigLine& line = lines[i];
     const bool inside = i > range.header && i < range.end && line.kind == LineKind::entry;
     const auto entry = inside ? find_entry(edit.entries, line.name) : edit.entries.rend();
-    if (entry == edit.entries.rend() || entry->second == line.value) {
+    if (i == range.header && !edit.new_name.empty()) {
+      out += renamed(line, edit.new_name);
+    } else if (entry == edit.entries.rend() || entry->second == line.value) {
       out += line.bytes;
     } else if (entry->second) {
       out += entry_line(indent_of(line), line.name, *entry->second, line_end_of(line));
@@ -162,9 +171,12 @@ Pairs meant(Pairs entries, const SectionEdit::Entries& changes) {
 bool reads_as_meant(const Lines& before, std::string_view new_text, const SectionEdit& edit) {
   auto old_sections = content(before);
   auto new_sections = content(parse_lines(new_text));
-  const auto is_it = [&](const auto& section) { return section.first == edit.section; };
-  const auto old_one = std::find_if(old_sections.begin() + 1, old_sections.end(), is_it);
-  const auto new_one = std::find_if(new_sections.begin() + 1, new_sections.end(), is_it);
+  const auto find = [](auto& sections, const std::string& name) {
+    return std::find_if(sections.begin() + 1, sections.end(),
+                        [&](const auto& section) { return section.first == name; });
+  };
+  const auto old_one = find(old_sections, edit.section);
+  const auto new_one = find(new_sections, edit.new_name.empty() ? edit.section : edit.new_name);
   if ((new_one == new_sections.end()) != (edit.kind == SectionEdit::Kind::remove)) {
     return false;
   }
@@ -194,11 +206,13 @@ std::optional<std::string> edited_text(const char* file, std::string_view text,
                                        const SectionEdit& edit) {
   const Lines lines = parse_lines(text);
   std::string out;
-  if (edit.kind == SectionEdit::Kind::add) {
-    if (has_section(lines, edit.section)) {
-      log_line("%s has a section [%s] already; it is unchanged", file, edit.section.c_str());
-      return std::nullopt;
-    }
+  const bool is_new = edit.kind == SectionEdit::Kind::add;
+  const std::string& made = is_new ? edit.section : edit.new_name;
+  if (!made.empty() && (is_new || made != edit.section) && has_section(lines, made)) {
+    log_line("%s has a section [%s] already; it is unchanged", file, made.c_str());
+    return std::nullopt;
+  }
+  if (is_new) {
     out = with_section(text, lines, edit);
   } else {
     SectionRange range;

@@ -23,12 +23,14 @@ struct SectionEdit {
   Kind kind = Kind::change;
   std::string section;
   Entries entries;
+  std::string new_name{};  // change: the section's from now on; empty when it keeps its own
 };
 
 // Applies `edit` to `file`, as rewrite_config does, when the new text reads back as meant: the
 // section with exactly its entries, and every other section with those it had.
-// 0; -1 with nothing changed and one log line: the section is there already (add) or isn't (change,
-// remove), it is malformed, a name or value doesn't fit a line, or the file can't be replaced.
+// 0; -1 with nothing changed and one log line: the section is there already (add, or the new name)
+// or isn't (change, remove), it is malformed, a name or value doesn't fit a line, or the file can't
+// be replaced.
 int edit_section(const char* file, const SectionEdit& edit);
 
 // What `edit` makes of `text`, the content of `file`. Nothing, after one log line, where

@@ -65,8 +65,8 @@ int clean_schedule(const char* profile, VLIBCSzHash& hash, const char* key) {
   if (!valid_schedule_id(id)) {
     log_line(
         "profile \"%s\": %s = %.80s is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -); "
-        "correct it in %s",
-        profile, key, id.c_str(), VORN_PATH_CONFIG);
+        "run vornctl profile set %s %s ''",
+        profile, key, id.c_str(), profile, key);
     errno = EINVAL;
     return -1;
   }

@@ -55,20 +55,20 @@ bool is_number(std::string_view text) {
 }
 
 // Whether the section says that the share is walked on network file systems.
-bool wants_network(const std::string& name, const VLIBCSzHash& section, const char* file) {
+bool wants_network(const std::string& name, const VLIBCSzHash& section) {
   const char* value = section.find("network");
   const bool wanted = value != nullptr && strcasecmp(value, "yes") == 0;
   if (value != nullptr && *value != '\0' && !wanted && strcasecmp(value, "no") != 0) {
     log_line(
-        "share \"%s\": network \"%.80s\" is neither yes nor no, so it counts as no; correct it in "
-        "%s",
-        name.c_str(), value, file);
+        "share \"%s\": network \"%.80s\" is neither yes nor no, so it counts as no; run vornctl "
+        "share set NAME --network, or --no-network",
+        name.c_str(), value);
   }
   return wanted;
 }
 
-Share make_share(const std::string& name, const VLIBCSzHash& section, const char* file) {
-  Share share{name, {}, {}, {}, wants_network(name, section, file)};
+Share make_share(const std::string& name, const VLIBCSzHash& section) {
+  Share share{name, {}, {}, {}, wants_network(name, section)};
   const char* path = section.find("path");
   std::string_view folder = path == nullptr ? "" : path;
   if (const char* error = share_path_error(folder); error != nullptr) {
@@ -132,10 +132,10 @@ const char* share_name_error(std::string_view name) {
 
 const char* share_path_error(std::string_view path) {
   if (path.empty()) {
-    return "it has no path; write path = /...";
+    return "it has no path; give it one with vornctl share set NAME --path FOLDER";
   }
   if (path.front() != '/') {
-    return "its path is not absolute; write path = /...";
+    return "its path is not absolute; write it from / on";
   }
   if (path.size() > kLongestPath) {
     return "its path is longer than 2048 bytes; give a shorter one, a bind mount for example";
@@ -165,7 +165,8 @@ std::optional<std::vector<Share>> load_shares(const char* file,
       continue;  // the section reader has refused the first of them, with a line
     }
     if (const char* error = share_name_error(name); error != nullptr) {
-      log_line("share \"%s\" is left out: %s; rename its section in %s", name.c_str(), error, file);
+      log_line("share \"%s\" is left out: %s; rename it with vornctl share set", name.c_str(),
+               error);
       if (left_out != nullptr) {
         left_out->push_back(name);
       }
@@ -174,7 +175,7 @@ std::optional<std::vector<Share>> load_shares(const char* file,
     VLIBCSzHash section(0);
     VLIBCSzHash* filled = &section;
     if (VLIBCFileGetSection(file, name.c_str(), &filled) >= 0) {
-      shares.push_back(make_share(name, section, file));
+      shares.push_back(make_share(name, section));
     } else {
       log_line("share \"%s\" is left out of every report until its section in %s is corrected",
                name.c_str(), file);

@@ -192,8 +192,8 @@ std::size_t reports_to_keep(const char* profile, const VLIBCSzHash& hash) {
   if (number < 1) {
     log_line(
         "profile \"%s\": keep_reports \"%.80s\" is no number from 1 on, so all reports are kept; "
-        "correct it in %s",
-        profile, value, VORN_PATH_CONFIG);
+        "run vornctl profile set %s keep_reports N",
+        profile, value, profile);
   }
   return static_cast<std::size_t>(std::max(number, 0));
 }

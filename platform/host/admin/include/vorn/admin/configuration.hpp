@@ -58,7 +58,9 @@ using Changes = std::vector<std::pair<std::string, std::optional<std::string>>>;
 // a message and with nothing changed: the section is there already (add) or isn't (change, remove),
 // it can't be understood, a name or value doesn't fit a line, or the file can't be replaced.
 bool add_section(const std::string& file, const std::string& name, const Changes& entries);
-bool change_section(const std::string& file, const std::string& name, const Changes& changes);
+// A `new_name` renames the section, in the same step; one of that name must not be there.
+bool change_section(const std::string& file, const std::string& name, const Changes& changes,
+                    const std::string& new_name = {});
 bool remove_section(const std::string& file, const std::string& name);
 
 }  // namespace admin

@@ -15,4 +15,10 @@ int samples_since(const std::string& profile, std::time_t start);
 std::string history_problem();
 std::string schema_problem();
 
+// What the history knows of `profile`, its samples and snapshots, goes. False after a message, with
+// nothing changed. A history that isn't there yet knows nothing.
+bool forget_history(const std::string& profile);
+// The same is known of `to` from now on, and nothing else. False after a message, as above.
+bool copy_history(const std::string& from, const std::string& to);
+
 }  // namespace admin

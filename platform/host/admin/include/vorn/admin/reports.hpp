@@ -36,6 +36,13 @@ bool remove_report(const std::string& folder, const std::string& name);
 // nothing else is in it; a message when it stays. False, after a message, when a report is left.
 bool remove_all_reports(const std::string& folder);
 
+// Gives `folder` with its reports the path `to`, beside it. False after a message: there is
+// something of that name already, or the folder can't be used. An absent one is fine.
+bool move_reports(const std::string& folder, const std::string& to);
+// Makes the new folder `to`, for a copy of the reports of `folder`, beside it. False, after a
+// message or because there is no `folder`.
+bool make_folder_like(const std::string& folder, const std::string& to);
+
 // The link to `page` that its mail has; nothing, after a message, when it can't be made.
 std::optional<std::string> link_to(const Section& profile, const std::string& page);
 

@@ -5,6 +5,7 @@
 
 #include <sys/types.h>
 
+#include <ctime>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -35,6 +36,14 @@ LastRun last_run(const std::string& profile);
 // begins with it, or nothing.
 std::string metrics_file_problem(const std::string& value);
 
+// The process of the last run, for whoever looks for its messages. Nothing when none is known.
+struct RunTrace {
+  pid_t process = 0;
+  std::time_t started = 0;
+  std::optional<std::time_t> ended;  // when it stored its status last; nothing while it runs
+};
+std::optional<RunTrace> last_trace(const std::string& profile);
+
 // How far the run that is going on has come; nothing when there is none or it doesn't tell.
 std::optional<report_format::Progress> read_progress(const std::string& profile);
 
@@ -54,6 +63,8 @@ Hold hold_profile(const std::string& profile);
 bool end_killed_run(const Section& profile);
 // The profile is about to go: its status goes as well.
 bool forget_runs(const Section& profile);
+// The profile is about to be called `to`: its status is told of that name. False after a message.
+bool move_status(const std::string& profile, const std::string& to);
 
 // What a killed run of the profile has left, by path. Nothing, after a message, when its folder of
 // reports can't be looked into.

@@ -34,4 +34,15 @@ struct FileSystem {
 // network server keeps this waiting for ever.
 std::optional<FileSystem> file_system_of(const std::string& path);
 
+// The places of one folder: the parts of file systems that lie in it, links followed and mounts
+// counted, so that two ways to the same files are seen to be that. Empty when it can't be found. A
+// dead network server keeps this waiting for ever.
+struct Place {
+  unsigned long long device = 0;
+  std::string path;  // within the file system of that device
+};
+std::vector<Place> places_of(const std::string& path);
+// Whether two folders hold some of the same files.
+bool overlap(const std::vector<Place>& one, const std::vector<Place>& other);
+
 }  // namespace admin
