@@ -26,6 +26,31 @@ constexpr bool is_layout(char32_t code) {
 
 }  // namespace
 
+std::vector<std::string> in_parse_order(std::vector<std::string> words) {
+  const auto is_word = [](const std::string& word) { return !word.starts_with('-'); };
+  const auto is_action = [](const std::string& word) {
+    return std::find(kReportActions.begin(), kReportActions.end(), word) != kReportActions.end();
+  };
+  if (words.size() < 2 || words.front() != "reports") {
+    return words;
+  }
+  const auto profile = std::find_if(words.begin() + 1, words.end(), is_word);
+  if (profile == words.end()) {
+    return words;
+  }
+  auto action = std::find_if(profile + 1, words.end(), is_action);
+  if (action == words.end()) {
+    action = profile + 1;  // the parser says that it is none
+  }
+  std::string named = kReportActions.front();
+  if (action != words.end() && is_word(*action)) {
+    named = *action;
+    words.erase(action);
+  }
+  words.insert(words.begin() + 1, named);
+  return words;
+}
+
 Failure host_failure(const std::string& otherwise) {
   const std::vector<std::string> messages = admin::take_messages();
   for (std::size_t i = 0; i + 1 < messages.size(); ++i) {
@@ -48,6 +73,19 @@ std::string printable(std::string_view text) {
     text.remove_prefix(std::max<std::size_t>(found.length, 1));
   }
   return out;
+}
+
+std::string shell_word(const std::string& word) {
+  constexpr const char* kPlain =
+      "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789._-+@%/:,";
+  if (!word.empty() && word.find_first_not_of(kPlain) == std::string::npos) {
+    return word;
+  }
+  std::string quoted = "'";
+  for (const char c : word) {
+    quoted += c == '\'' ? "'\\''" : std::string(1, c);
+  }
+  return quoted + "'";
 }
 
 std::size_t display_width(std::string_view text) {
@@ -112,6 +150,33 @@ void Table::print() const {
 
 CLI::Option* add_profile_argument(CLI::App& command, std::string& profile) {
   return command.add_option("PROFILE", profile, "Name of the profile")->type_name("")->required();
+}
+
+CLI::Option* add_share_argument(CLI::App& command, std::string& share) {
+  return command.add_option("SHARE", share, "Name of the share")->type_name("")->required();
+}
+
+void add_pairs(CLI::App& command) {
+  command.add_option("KEY", "Key to change")->type_name("");
+  command.add_option("VALUE", "Its new value; more pairs may follow")->type_name("");
+  command.allow_extras();
+}
+
+std::vector<std::pair<std::string, std::string>> pairs_of(const CLI::App& command) {
+  std::vector<std::string> words = command["KEY"]->results();
+  // An option of several values would take "[a,b]" apart, so the other pairs are what is left.
+  for (const std::vector<std::string>& more : {command["VALUE"]->results(), command.remaining()}) {
+    words.insert(words.end(), more.begin(), more.end());
+  }
+  std::vector<std::pair<std::string, std::string>> pairs;
+  for (std::size_t i = 0; i < words.size(); i += 2) {
+    if (i + 1 == words.size()) {
+      throw Failure("the key " + words.back() + " has no value; an empty one ('') unsets it",
+                    kWrongUsage);
+    }
+    pairs.emplace_back(words[i], words[i + 1]);
+  }
+  return pairs;
 }
 
 CLI::Option* add_json_flag(CLI::App& command, bool& json) {

@@ -8,11 +8,13 @@
 #define VORN_CTL_CTL_HPP
 
 #include <CLI/App.hpp>
+#include <array>
 #include <cstddef>
 #include <nlohmann/json_fwd.hpp>
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 namespace ctl {
@@ -36,10 +38,24 @@ class Failure : public std::runtime_error {
 // --- The command line ---------------------------------------------------------------------------
 
 // Arguments and options whose name or type is one of these are completed with what they stand for:
-// PROFILE, SHARE, SHARES, REPORTS, LANGUAGE, KEY, FOLDER, FILE.
-// The positional argument PROFILE, required. The profile need not exist.
+// PROFILE, SHARE, SHARES, REPORTS, LANGUAGE, KEY, DATE, FOLDER, FILE; so are words with '|'
+// between. The positional argument PROFILE, required. The profile need not exist.
 CLI::Option* add_profile_argument(CLI::App& command, std::string& profile);
+// The same for a share.
+CLI::Option* add_share_argument(CLI::App& command, std::string& share);
+// The positional arguments KEY VALUE, any number of pairs.
+void add_pairs(CLI::App& command);
+// Those that were given. Throws a Failure for a key without a value.
+std::vector<std::pair<std::string, std::string>> pairs_of(const CLI::App& command);
+// The group of options that are taken, but neither shown in a help nor completed.
+inline constexpr const char* kOldSpellings = "";
 CLI::Option* add_json_flag(CLI::App& command, bool& json);
+
+// What can stand behind `reports PROFILE`; the first when nothing does.
+inline constexpr std::array kReportActions{"list", "open", "compare", "remove", "keep"};
+// The words of a command line as they are parsed: people write `reports PROFILE ACTION`, the parser
+// reads `reports ACTION PROFILE`, so that a profile can have any name.
+std::vector<std::string> in_parse_order(std::vector<std::string> words);
 
 // --- The platform's messages --------------------------------------------------------------------
 
@@ -52,6 +68,8 @@ Failure host_failure(const std::string& otherwise);
 // `text` for one line of a terminal: control characters, what turns the direction of text, and
 // bytes that are no UTF-8 come out as \x1b, \u202e, \xff.
 std::string printable(std::string_view text);
+// `word` as a shell takes it for one word, for commands in remedies.
+std::string shell_word(const std::string& word);
 // The columns that a printable text takes.
 std::size_t display_width(std::string_view text);
 

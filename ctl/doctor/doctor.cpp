@@ -1,22 +1,16 @@
 // vornctl doctor: whether this machine has all that its runs need.
 #include "doctor/doctor.hpp"
 
-#include <fcntl.h>
-#include <poll.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
-#include <array>
-#include <csignal>
 #include <memory>
 #include <nlohmann/json.hpp>
 
 #include "base/ctl.hpp"
 #include "doctor/commands.hpp"
 #include "vorn/admin/messages.hpp"
-#include "vorn/base/file_io.hpp"
 
 namespace ctl {
 namespace {
@@ -97,35 +91,6 @@ void Findings::add(Level level, std::string subject, std::string text, std::stri
     text.resize(at);
   }
   all_.push_back({level, std::move(subject), std::move(text), std::move(remedy)});
-}
-
-std::optional<std::string> answer_within(std::chrono::milliseconds limit,
-                                         const std::function<std::string()>& ask) {
-  int ends[2];
-  if (pipe2(ends, O_CLOEXEC) != 0) {
-    return std::nullopt;
-  }
-  host::Fd reading(ends[0]);
-  host::Fd writing(ends[1]);
-  const pid_t child = fork();
-  if (child == 0) {
-    const std::string answer = ask();
-    _exit(host::write_all(writing.get(), answer + "\n") ? 0 : 1);
-  }
-  writing = host::Fd();
-  std::array<char, 4096> bytes{};
-  pollfd poller{reading.get(), POLLIN, 0};
-  ssize_t got = 0;
-  if (child > 0 && poll(&poller, 1, static_cast<int>(limit.count())) == 1) {
-    got = read(reading.get(), bytes.data(), bytes.size());
-  }
-  if (child > 0) {
-    // One that waits for a dead server can't even be killed, so nobody waits for its end.
-    kill(child, SIGKILL);
-    waitpid(child, nullptr, got > 0 ? 0 : WNOHANG);
-  }
-  return got > 0 ? std::optional(std::string(bytes.data(), static_cast<std::size_t>(got) - 1))
-                 : std::nullopt;
 }
 
 void add_doctor_command(CLI::App& app) {

@@ -2,9 +2,6 @@
 #ifndef VORN_CTL_DOCTOR_HPP
 #define VORN_CTL_DOCTOR_HPP
 
-#include <chrono>
-#include <functional>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -54,11 +51,6 @@ void check_space(Findings& findings, const Configuration& configuration);
 void check_clock(Findings& findings);
 void check_schedules(Findings& findings, const Configuration& configuration);
 void check_last_runs(Findings& findings, const Configuration& configuration);
-
-// What `ask` answers, asked in a process of its own: a dead network server can keep it for ever.
-// Nothing when it gives no answer within `limit`.
-std::optional<std::string> answer_within(std::chrono::milliseconds limit,
-                                         const std::function<std::string()>& ask);
 
 }  // namespace ctl
 
