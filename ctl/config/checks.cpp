@@ -27,6 +27,8 @@
 namespace ctl {
 namespace {
 
+constexpr const char* kEmptyList = "is an empty list; name something in it";
+
 std::string in_quotes(std::string_view text) {
   return '"' + std::string(text) + '"';
 }
@@ -61,7 +63,7 @@ std::string report_list_problem(const std::string& value) {
              (near.empty() ? "; there are " + joined(names, ", ") : near);
     }
   }
-  return is_empty ? "names no report" : "";
+  return is_empty ? kEmptyList : "";
 }
 
 std::string share_list_problem(const std::string& value) {
@@ -159,10 +161,13 @@ std::string schedule_problem(const std::string& value) {
                                       : "is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -)";
 }
 
+constexpr const char* kTruth = "true|false";
+constexpr const char* kNumber = "N";
+
 constexpr ProfileKey kKeys[] = {
-    {"report_list", "--reports", "REPORTS", "Reports to make (default: all)", true,
+    {"report_list", "--report-list,--reports", "REPORTS", "Reports to make (default: all)", true,
      report_list_problem},
-    {"share_list", "--shares", "SHARES", "Shares to cover (default: all)", true,
+    {"share_list", "--share-list,--shares", "SHARES", "Shares to cover (default: all)", true,
      share_list_problem},
     {"language", "--language", "LANGUAGE", "Language of page and mail", false, language_problem},
     {"report_dir", "--report-dir", "FOLDER", "Folder for the reports", false, report_dir_problem},
@@ -177,13 +182,13 @@ constexpr ProfileKey kKeys[] = {
      admin::password_file_problem},
     {"limit_user", "--limit-user", "USERS", "Users shown one by one in file_group", true,
      users_problem},
-    {"duplicate_compare", nullptr, "true|false", "true compares contents of duplicates", false,
-     truth_problem},
-    {"duplicate_compare_minutes", nullptr, "N",
+    {"duplicate_compare", "--duplicate-compare", kTruth, "true compares contents of duplicates",
+     false, truth_problem},
+    {"duplicate_compare_minutes", "--duplicate-compare-minutes", kNumber,
      "Longest comparison of contents (default: no limit)", false, minutes_problem},
-    {"volume_history", nullptr, "true|false", "true shows history and forecast of volumes", false,
-     truth_problem},
-    {"keep_reports", "--keep-reports", "N", "Number of reports to keep (default: all)", false,
+    {"volume_history", "--volume-history", kTruth, "true shows history and forecast of volumes",
+     false, truth_problem},
+    {"keep_reports", "--keep-reports", kNumber, "Number of reports to keep (default: all)", false,
      admin::keep_reports_problem},
     {"mail_on_failure", nullptr, "true|false", "false sends no mail of a failed run", false,
      truth_problem},
@@ -212,6 +217,17 @@ std::size_t distance(std::string_view a, std::string_view b) {
     }
   }
   return row[b.size()];
+}
+
+// Whether `name` is the key as an option of `profile add` spells it, without the dashes before it.
+bool is_option_of(const ProfileKey& key, const std::string& name) {
+  const std::string options = "," + std::string(key.option == nullptr ? "" : key.option) + ",";
+  return !name.empty() && options.find(",--" + name + ",") != std::string::npos;
+}
+
+std::string listed(const std::string& value) {
+  const std::vector<std::string_view> words = host::comma_words(value);
+  return joined({words.begin(), words.end()}, ",");
 }
 
 }  // namespace
@@ -268,7 +284,7 @@ std::span<const ProfileKey> profile_keys() {
 const ProfileKey& profile_key(const std::string& name) {
   std::vector<std::string> names;
   for (const ProfileKey& key : kKeys) {
-    if (key.name == name) {
+    if (key.name == name || is_option_of(key, name)) {
       return key;
     }
     names.emplace_back(key.name);
@@ -280,6 +296,9 @@ const ProfileKey& profile_key(const std::string& name) {
 
 std::string checked_value(const ProfileKey& key, const std::string& value) {
   std::string problem = text_problem(value);
+  if (problem.empty() && key.is_list && !value.empty() && listed(value).empty()) {
+    problem = kEmptyList;
+  }
   if (problem.empty() && !value.empty()) {
     problem = key.problem(value);
   }
@@ -287,11 +306,35 @@ std::string checked_value(const ProfileKey& key, const std::string& value) {
     const bool names_it = problem.front() == '"';
     throw Failure(key.name + (names_it ? ": " : ' ' + in_quotes(value) + ' ') + problem);
   }
-  if (!key.is_list) {
+  return key.is_list ? listed(value) : value;
+}
+
+nlohmann::ordered_json json_value(const std::string& name, const std::string& value) {
+  const auto* key = std::find_if(std::begin(kKeys), std::end(kKeys),
+                                 [&](const ProfileKey& known) { return known.name == name; });
+  if (key == std::end(kKeys)) {
     return value;
   }
-  const std::vector<std::string_view> words = host::comma_words(value);
-  return joined({words.begin(), words.end()}, ",");
+  std::vector<std::string> words;
+  if (name == "report_list") {
+    for (const std::string& report : report_names()) {
+      if (report_format::is_selected(report, value)) {
+        words.push_back(report);
+      }
+    }
+    return words;
+  }
+  if (key->is_list) {
+    const auto split = host::comma_words(value);
+    words.assign(split.begin(), split.end());
+    return words;
+  }
+  if (key->type == std::string_view(kTruth)) {
+    return report_format::is_true(value);
+  }
+  const auto number = report_format::whole_number(value);
+  return key->type == std::string_view(kNumber) && number ? nlohmann::ordered_json(*number)
+                                                          : nlohmann::ordered_json(value);
 }
 
 std::vector<std::string> report_names() {

@@ -11,6 +11,9 @@ namespace ctl {
 void add_share_commands(CLI::App& app);
 void add_profile_commands(CLI::App& app);
 
+// Adds "copy" and "rename" to the group `profile`.
+void add_profile_moves(CLI::App& profile);
+
 // Adds "test-mail" to the group `profile`.
 void add_test_mail_command(CLI::App& profile);
 

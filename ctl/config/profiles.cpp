@@ -14,6 +14,7 @@
 #include "report_format/reports.hpp"
 #include "schedule/jobs.hpp"
 #include "schedule/timers.hpp"
+#include "vorn/admin/history.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/paths.h"
 #include "vorn/volume.h"
@@ -28,7 +29,7 @@ std::string titled(const std::string& profile) {
 // Keys that need each other. `profile` is as it shall be.
 void check_together(const Section& profile) {
   if (profile.value("report_list").empty() && profile.name != "global") {
-    throw Failure("report_list can't be empty: a profile without reports makes none");
+    throw Failure("report_list \"\" is an empty list; name something in it");
   }
   if (!profile.value("smtp_user").empty() && profile.value("smtp_password_file").empty()) {
     throw Failure("smtp_user needs smtp_password_file, the file with the password");
@@ -59,10 +60,35 @@ Section changed(Section profile, const Changes& changes) {
 
 // --- add ----------------------------------------------------------------------------------------
 
+// An option for each key that has one. Their values are results, so that it can be told which of
+// them were given.
+void add_key_options(CLI::App& command) {
+  for (const ProfileKey& key : profile_keys()) {
+    if (key.option != nullptr) {
+      const std::string help = key.help;
+      command.add_option(key.option, help)->type_name(key.type);
+    }
+  }
+}
+
+// The keys whose options were given, with their values.
+std::vector<std::pair<std::string, std::string>> given_keys(const CLI::App& command) {
+  std::vector<std::pair<std::string, std::string>> given;
+  for (const ProfileKey& key : profile_keys()) {
+    const std::string option = key.option == nullptr ? "" : key.option;
+    const CLI::Option* found =
+        option.empty() ? nullptr : command.get_option_no_throw(option.substr(0, option.find(',')));
+    if (found != nullptr && found->count() > 0) {
+      given.emplace_back(key.name, found->results().back());
+    }
+  }
+  return given;
+}
+
 struct NewProfile {
   std::string name;
-  std::map<std::string, std::string, std::less<>> values;  // by key
-  std::string duplicates;
+  std::map<std::string, std::string, std::less<>> values{};  // by key
+  std::string duplicates{};                                  // old spellings
   bool no_history = false;
 };
 
@@ -87,17 +113,25 @@ std::string default_reports() {
   return list;
 }
 
-void add_profile(NewProfile profile) {
+void add_profile(NewProfile profile, const CLI::App& command) {
   check_profile_name(profile.name);
   if (profile_exists(profile.name)) {
     throw Failure(titled(profile.name) + " is there already; change it with vornctl profile set");
+  }
+  profile.values["duplicate_compare"] = profile.duplicates == "content" ? "true" : "";
+  profile.values["volume_history"] = profile.no_history ? "" : "true";
+  for (const auto& [key, value] : given_keys(command)) {
+    // Most likely a variable of a script that wasn't set.
+    if (value.empty()) {
+      throw Failure(key + " \"\" is " + (profile_key(key).is_list ? "an empty list" : "empty") +
+                    "; name something, or leave the option out");
+    }
+    profile.values[key] = value;
   }
   const bool has_default = profile.values["report_list"].empty();
   if (has_default) {
     profile.values["report_list"] = default_reports();
   }
-  profile.values["duplicate_compare"] = profile.duplicates == "content" ? "true" : "";
-  profile.values["volume_history"] = profile.no_history ? "" : "true";
   Changes entries;
   for (const ProfileKey& key : profile_keys()) {
     if (const std::string value = checked_value(key, profile.values[key.name]); !value.empty()) {
@@ -118,18 +152,16 @@ void describe_add(CLI::App& group) {
   add.add_option("NAME", profile->name, "Name of the profile: A-Z a-z 0-9 . _ -")
       ->type_name("")
       ->required();
-  for (const ProfileKey& key : profile_keys()) {
-    if (key.option != nullptr) {
-      add.add_option(key.option, profile->values[key.name], key.help)->type_name(key.type);
-    }
-  }
-  add.add_option("--duplicates", profile->duplicates, "Compare files by name and size or content")
+  add_key_options(add);
+  add.add_option("--duplicates", profile->duplicates, "--duplicate-compare as it was once spelt")
+      ->group(kOldSpellings)
       ->type_name("name|content")
       ->check([](const std::string& word) {
         return word == "name" || word == "content" ? "" : "write name or content";
       });
-  add.add_flag("--no-history", profile->no_history, "Show no history and forecast of volumes");
-  add.callback([profile] { add_profile(std::move(*profile)); });
+  add.add_flag("--no-history", profile->no_history, "--volume-history false, likewise")
+      ->group(kOldSpellings);
+  add.callback([profile, &add] { add_profile(std::move(*profile), add); });
 }
 
 // --- list and show ------------------------------------------------------------------------------
@@ -137,7 +169,7 @@ void describe_add(CLI::App& group) {
 nlohmann::ordered_json as_json(const Section& profile) {
   nlohmann::ordered_json json{{"name", profile.name}};
   for (const auto& [key, value] : profile.entries) {
-    json[key] = value;
+    json[key] = json_value(key, value);
   }
   return json;
 }
@@ -191,62 +223,57 @@ void describe_list_and_show(CLI::App& group) {
 
 // --- set ----------------------------------------------------------------------------------------
 
-// `words` are keys, each with its value behind it.
-void set_keys(const std::string& name, const std::vector<std::string>& words) {
-  if (words.size() % 2 != 0) {
-    throw Failure("the key " + words.back() + " has no value; an empty one ('') unsets it",
-                  kWrongUsage);
+// The changed key, with its checked value. What is no key of a profile can only be unset.
+std::pair<std::string, std::optional<std::string>> checked_change(const Section& profile,
+                                                                  const std::string& name,
+                                                                  const std::string& value) {
+  if (value.empty() && profile.find(name) != nullptr) {
+    return {name, std::nullopt};
   }
+  const ProfileKey& key = profile_key(name);
+  const std::string checked = checked_value(key, value);
+  return {key.name, checked.empty() ? std::nullopt : std::optional(checked)};
+}
+
+void set_keys(const std::string& name, const CLI::App& command) {
+  auto pairs = pairs_of(command);
+  for (auto& given : given_keys(command)) {
+    pairs.push_back(std::move(given));
+  }
+  if (pairs.empty()) {
+    throw Failure("say what to change: KEY VALUE, or an option", kWrongUsage);
+  }
+  // The whole server's section may be missing; it is made then.
+  const bool is_new = name == "global" && !profile_exists(name);
+  const Section profile = is_new ? Section{name, {}} : read_profile(name);
   Changes changes;
-  for (std::size_t i = 0; i < words.size(); i += 2) {
-    const ProfileKey& key = profile_key(words[i]);
-    const std::string value = checked_value(key, words[i + 1]);
-    changes.emplace_back(key.name, value.empty() ? std::nullopt : std::optional(value));
+  for (const auto& [key, value] : pairs) {
+    changes.push_back(checked_change(profile, key, value));
   }
-  const Section profile = changed(read_profile(name), changes);
-  check_together(profile);
-  check_metrics_file(profile);
-  change_section(VORN_PATH_CONFIG, name, changes);
-  refresh_services(profile);
+  const Section made = changed(profile, changes);
+  check_together(made);
+  check_metrics_file(made);
+  is_new ? add_section(VORN_PATH_CONFIG, name, changes)
+         : change_section(VORN_PATH_CONFIG, name, changes);
+  refresh_services(made);
 }
 
 void describe_set(CLI::App& group) {
   CLI::App* set = group.add_subcommand("set", "Change keys of a profile; an empty value unsets");
   const auto name = std::make_shared<std::string>();
-  const auto first = std::make_shared<std::pair<std::string, std::string>>();
   add_profile_argument(*set, *name);
-  set->add_option("KEY", first->first, "Key, see vornreport.conf(5)")->type_name("")->required();
-  set->add_option("VALUE", first->second, "Its new value; more pairs may follow")
-      ->type_name("")
-      ->required();
-  // An option of several values would take "[a,b]" apart, so the other pairs are what is left.
-  set->allow_extras();
-  set->callback([set, name, first] {
-    std::vector<std::string> words = set->remaining();
-    words.insert(words.begin(), {first->first, first->second});
-    set_keys(*name, words);
-  });
+  add_pairs(*set);
+  add_key_options(*set);
+  set->callback([set, name] { set_keys(*name, *set); });
 }
 
 // --- remove -------------------------------------------------------------------------------------
-
-// No run of the profile can begin from here to the end of the process.
-void hold(const std::string& profile) {
-  switch (admin::hold_profile(profile)) {
-    case admin::Hold::taken:
-      return;
-    case admin::Hold::running:
-      throw Failure(titled(profile) + " is running; try again when its run has ended");
-    case admin::Hold::failed:
-      throw host_failure(titled(profile) + " can't be locked");
-  }
-}
 
 void remove_profile(const std::string& name, bool reports_too) {
   check_profile_name(name);
   const Section profile = read_profile(name);
   const std::string folder = folder_of_reports(profile);
-  hold(name);
+  hold_profile(name);
   remove_cron_file(profile);
   remove_timers(name);
   admin::forget_runs(profile);  // what can't be removed has a message
@@ -254,13 +281,17 @@ void remove_profile(const std::string& name, bool reports_too) {
     throw host_failure(folder + " can't be emptied");
   }
   remove_section(VORN_PATH_CONFIG, name);
+  if (!admin::forget_history(name)) {
+    throw host_failure("the history of " + titled(name) + " stays");
+  }
   if (!reports_too && access(folder.c_str(), F_OK) == 0) {
     warn("the reports of " + titled(name) + " stay in " + folder);
   }
 }
 
 void describe_remove(CLI::App& group) {
-  CLI::App& remove = *group.add_subcommand("remove", "Remove a profile and its schedule");
+  CLI::App& remove =
+      *group.add_subcommand("remove", "Remove a profile with its history and schedule");
   const auto name = std::make_shared<std::string>();
   const auto reports_too = std::make_shared<bool>();
   add_profile_argument(remove, *name);
@@ -276,6 +307,7 @@ void add_profile_commands(CLI::App& app) {
   describe_add(group);
   describe_list_and_show(group);
   describe_set(group);
+  add_profile_moves(group);
   describe_remove(group);
   add_test_mail_command(group);
 }
