@@ -5,7 +5,9 @@
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
+#include <string>
 #include <string_view>
+#include <vector>
 
 #include "base/ctl.hpp"
 #include "config/commands.hpp"
@@ -21,17 +23,33 @@ constexpr const char* kFooter =
     "is "
     "described in vornctl(8).";
 
+using Words = std::vector<std::string>;
+
+// "help share add" is "share add --help". The words of a command line are taken from behind.
+Words parsed_words(int argc, char** argv) {
+  Words words{argv + 1, argv + argc};
+  if (!words.empty() && words.front() == "help") {
+    words.erase(words.begin());
+    words.emplace_back("--help");
+  } else {
+    words = ctl::in_parse_order(std::move(words));
+  }
+  return words;
+}
+
 // Names a word that is no command; the parser only says that one is missing.
-void check_commands(const CLI::App& app, int argc, char** argv) {
+void check_commands(const CLI::App& app, const Words& words) {
   const CLI::App* group = &app;
-  for (int i = 1; i < argc && *argv[i] != '-' && group->get_require_subcommand_min() > 0; ++i) {
+  for (const std::string& word : words) {
+    if (word.starts_with('-') || group->get_require_subcommand_min() == 0) {
+      return;
+    }
     const auto commands = group->get_subcommands([](const CLI::App*) { return true; });
     const auto named = std::find_if(commands.begin(), commands.end(), [&](const CLI::App* command) {
-      return command->check_name(argv[i]);
+      return command->check_name(word);
     });
     if (named == commands.end()) {
-      throw ctl::Failure('"' + std::string(argv[i]) + "\" is no command; see vornctl --help",
-                         ctl::kWrongUsage);
+      throw ctl::Failure('"' + word + "\" is no command; see vornctl --help", ctl::kWrongUsage);
     }
     group = *named;
   }
@@ -40,6 +58,7 @@ void check_commands(const CLI::App& app, int argc, char** argv) {
 void run(int argc, char** argv) {
   CLI::App app("Administration of vornreport: shares, profiles, runs and reports.", "vornctl");
   app.footer(kFooter);
+  app.set_version_flag("--version", "vornctl " VORN_VERSION);
   app.set_help_all_flag("--help-all", "Print the help of all commands and exit");
   app.require_subcommand(1);
   ctl::add_share_commands(app);
@@ -48,6 +67,7 @@ void run(int argc, char** argv) {
   ctl::add_schedule_command(app);
   ctl::add_status_command(app);
   ctl::add_reports_command(app);
+  ctl::add_log_command(app);
   ctl::add_doctor_command(app);
 
   // Hidden, and asked for before anything is parsed: what it is asked about is no command yet.
@@ -55,12 +75,14 @@ void run(int argc, char** argv) {
     ctl::complete(app, {argv + 2, argv + argc});
     return;
   }
-  check_commands(app, argc, argv);
+  Words words = parsed_words(argc, argv);
+  check_commands(app, words);
+  std::reverse(words.begin(), words.end());
   try {
-    app.parse(argc, argv);
+    app.parse(std::move(words));
   } catch (const CLI::ParseError& error) {
     if (error.get_exit_code() == 0) {
-      app.exit(error);  // the help that was asked for
+      app.exit(error);  // the help or version that was asked for
     } else {
       throw ctl::Failure(std::string(error.what()) + "; see vornctl --help", ctl::kWrongUsage);
     }

@@ -4,9 +4,11 @@
 
 #include "base/configuration.hpp"
 #include "base/ctl.hpp"
+#include "base/stored_reports.hpp"
 #include "config/checks.hpp"
 #include "config/commands.hpp"
 #include "vorn/admin/messages.hpp"
+#include "vorn/base/words.hpp"
 
 namespace ctl {
 namespace {
@@ -15,11 +17,18 @@ using Words = std::vector<std::string>;
 
 // The values that a name or type of ctl.hpp stands for. FOLDER and FILE are the shell's own; they
 // are answered by a line that no name can be.
-Words values_of(const std::string& kind) {
+Words values_of(const std::string& kind, const std::string& profile) {
   Words words;
-  if (kind == "PROFILE") {
-    for (const Section& profile : read_profiles()) {
-      words.push_back(profile.name);
+  if (kind == "DATE" || kind == "DATE2") {
+    const std::string folder = folder_of_reports(read_profile(profile));
+    for (const admin::StoredReport& report : reports_in(folder, ReportSize::left_out)) {
+      if (report.is_whole) {
+        words.push_back(report.name);
+      }
+    }
+  } else if (kind == "PROFILE") {
+    for (const Section& section : read_profiles()) {
+      words.push_back(section.name);
     }
   } else if (kind == "SHARE" || kind == "SHARES") {
     for (const Share& share : read_shares()) {
@@ -46,10 +55,14 @@ Words values_of(const std::string& kind) {
 }
 
 // The words of a list are completed one by one.
-Words list_values(const std::string& kind, const std::string& current) {
-  Words words = values_of(kind);
+Words list_values(const std::string& kind, const std::string& current, const std::string& profile) {
+  Words words = values_of(kind, profile);
   const std::size_t comma = current.rfind(',');
   if ((kind == "SHARES" || kind == "REPORTS") && comma != std::string::npos) {
+    const auto named = host::comma_words(std::string_view(current).substr(0, comma));
+    std::erase_if(words, [&](const std::string& word) {
+      return std::find(named.begin(), named.end(), word) != named.end();
+    });
     for (std::string& word : words) {
       word.insert(0, current, 0, comma + 1);
     }
@@ -65,7 +78,7 @@ bool takes_value(const CLI::Option& option) {
 struct Place {
   const CLI::App* command = nullptr;
   const CLI::Option* waiting = nullptr;  // an option that wants its value
-  std::size_t positionals = 0;
+  Words positionals{};
 };
 
 Place place_of(const CLI::App& app, const Words& before) {
@@ -84,19 +97,17 @@ Place place_of(const CLI::App& app, const Words& before) {
       if (found != commands.end()) {
         place.command = *found;
       } else {
-        ++place.positionals;
+        place.positionals.push_back(word);
       }
     }
   }
   return place;
 }
 
-std::string type_of_key(const std::string& name) {
-  for (const ProfileKey& key : profile_keys()) {
-    if (key.name == name) {
-      return key.type;
-    }
-  }
+// The shells ask at every key, so a word that is no key is no failure.
+std::string type_of_key(const std::string& name) try {
+  return profile_key(name).type;
+} catch (const Failure&) {
   return "";
 }
 
@@ -108,7 +119,7 @@ Words positional_values(const Place& place, const std::string& previous,
       kinds.push_back(option->get_name(true));
     }
   }
-  std::size_t index = place.positionals;
+  std::size_t index = place.positionals.size();
   if (place.command->get_allow_extras() && kinds.size() >= 2) {
     while (index >= kinds.size()) {
       index -= 2;  // further pairs of key and value
@@ -117,19 +128,30 @@ Words positional_values(const Place& place, const std::string& previous,
   if (index >= kinds.size()) {
     return {};
   }
-  return list_values(kinds[index] == "VALUE" ? type_of_key(previous) : kinds[index], current);
+  return list_values(kinds[index] == "VALUE" ? type_of_key(previous) : kinds[index], current,
+                     place.positionals.empty() ? "" : place.positionals.front());
 }
 
-Words candidates(const CLI::App& app, const Words& before, const std::string& current) {
-  const Place place = place_of(app, before);
+Words candidates(const CLI::App& app, Words before, const std::string& current) {
+  const bool is_option = current.starts_with('-');
+  const bool is_help = !before.empty() && before.front() == "help";
+  if (is_help) {
+    before.erase(before.begin());
+  } else if (before == Words{"reports"} && !is_option) {
+    return values_of("PROFILE", "");
+  }
+  // The action that may follow in its place is none yet, nor has a help a profile before it.
+  const bool is_reports = !before.empty() && before.front() == "reports" && !is_option;
+  const bool wants_action = is_reports && before.size() == (is_help ? 1 : 2);
+  const Place place = place_of(app, wants_action ? Words{"reports"} : in_parse_order(before));
   if (place.waiting != nullptr) {
-    return list_values(place.waiting->get_type_name(), current);
+    return list_values(place.waiting->get_type_name(), current, "");
   }
   Words words;
-  if (current.starts_with('-')) {
+  if (is_option) {
     for (const CLI::Option* option : place.command->get_options()) {
-      for (const std::string& name : option->get_lnames()) {
-        words.push_back("--" + name);
+      if (!option->get_lnames().empty() && option->get_group() != kOldSpellings) {
+        words.push_back("--" + option->get_lnames().front());
       }
     }
     return words;

@@ -9,6 +9,10 @@ namespace ctl {
 void add_run_command(CLI::App& app);
 void add_status_command(CLI::App& app);
 void add_reports_command(CLI::App& app);
+void add_log_command(CLI::App& app);
+
+// Adds "compare" to the group `reports`.
+void add_compare_command(CLI::App& reports);
 
 }  // namespace ctl
 

@@ -23,18 +23,12 @@ namespace {
 
 struct Options {
   std::string profile;
-  std::string action = "list";
-  std::string argument;
+  std::string date;
+  std::string count;
   std::string older_than;
   bool dry_run = false;
   bool json = false;
 };
-
-// The worst that a report says of what it has seen.
-const char* level_of(const report_format::Facts& facts) {
-  return report_format::word_of(facts.attention.empty() ? report_format::Level::kOk
-                                                        : facts.attention.front().level);
-}
 
 // "yes", "yes, lacking 2" (incidents that it tells), or "no" (its page).
 std::string complete_text(const admin::StoredReport& report,
@@ -45,35 +39,21 @@ std::string complete_text(const admin::StoredReport& report,
              : "yes";
 }
 
-void list_as_json(const Reports& reports) {
+void list(const Options& options) {
+  const std::string folder = folder_of_reports(read_profile(options.profile));
+  const Reports reports = reports_in(folder, ReportSize::measured);
   auto array = nlohmann::ordered_json::array();
-  for (const admin::StoredReport& report : reports) {
-    nlohmann::ordered_json entry{{"name", report.name},  {"made", json_time(report.made)},
-                                 {"bytes", report.size}, {"complete", report.is_whole},
-                                 {"level", nullptr},     {"incidents", nullptr},
-                                 {"path", report.page}};
-    if (const auto facts = facts_of(report)) {
-      entry["level"] = level_of(*facts);
-      entry["incidents"] = facts->incidents.size();
-    }
-    array.push_back(std::move(entry));
-  }
-  print_json(array);
-}
-
-void list(const Options& options, const std::string& folder, const Reports& reports) {
-  if (options.json) {
-    list_as_json(reports);
-    return;
-  }
   Table table({{"DATE"}, {"SIZE", Table::Align::right}, {"COMPLETE"}, {"LEVEL"}, {"PATH"}});
   for (const admin::StoredReport& report : reports) {
     const auto facts = facts_of(report);
+    array.push_back(json_of(report, facts));
     table.add({report.name, size_text(report.size), complete_text(report, facts),
                facts ? level_of(*facts) : "-", report.page});
   }
-  if (table.empty()) {
-    print_line("profile " + options.profile + " has no reports in " + folder);
+  if (options.json) {
+    print_json(array);
+  } else if (table.empty()) {
+    warn("there are no reports in " + folder + "; make one with vornctl run " + options.profile);
   } else {
     table.print();
   }
@@ -81,23 +61,11 @@ void list(const Options& options, const std::string& folder, const Reports& repo
 
 // --- Opening ------------------------------------------------------------------------------------
 
-// The newest whole report whose name begins with `date`.
-const admin::StoredReport& find_report(const Options& options, const Reports& reports) {
-  const auto found =
-      std::find_if(reports.rbegin(), reports.rend(), [&](const admin::StoredReport& report) {
-        return report.is_whole && report.name.starts_with(options.argument);
-      });
-  if (found != reports.rend()) {
-    return *found;
-  }
-  throw Failure("profile " + options.profile + " has no complete report" +
-                (options.argument.empty() ? "" : " of " + options.argument) +
-                "; see vornctl reports " + options.profile);
-}
-
-void open_report(const Options& options, const Reports& reports) {
+void open_report(const Options& options) {
   constexpr const char* kOpener = "/usr/bin/xdg-open";
-  const std::string page = find_report(options, reports).page;
+  const Section profile = read_profile(options.profile);
+  const Reports reports = reports_in(folder_of_reports(profile), ReportSize::left_out);
+  const std::string page = find_report(options.profile, reports, options.date).page;
   const bool has_display =
       std::getenv("DISPLAY") != nullptr || std::getenv("WAYLAND_DISPLAY") != nullptr;
   if (has_display && access(kOpener, X_OK) == 0) {
@@ -109,7 +77,7 @@ void open_report(const Options& options, const Reports& reports) {
     }
   }
   print_line(page);
-  if (const auto link = admin::link_to(read_profile(options.profile), page)) {
+  if (const auto link = admin::link_to(profile, page)) {
     print_line(*link);
   }
 }
@@ -176,49 +144,84 @@ void remove(const Options& options, const std::string& folder, const Reports& do
   }
 }
 
-void reports(const Options& options) {
-  if (options.json && options.action != "list") {
-    throw Failure("--json goes with the list only", kWrongUsage);
+// The one report that the date names.
+Reports named(const Options& options, const Reports& reports) {
+  const admin::StoredReport& report = find_report(options.profile, reports, options.date);
+  const auto count = std::count_if(reports.begin(), reports.end(), [&](const auto& other) {
+    return other.is_whole && other.name.starts_with(options.date);
+  });
+  if (count > 1 && report.name != options.date) {
+    throw Failure(options.date + " is the beginning of " + std::to_string(count) +
+                  " reports; write more of the one that you mean");
   }
-  if (options.older_than.empty() != (options.action != "remove")) {
-    throw Failure("write remove --older-than AGE, for instance remove --older-than 90d",
+  return {report};
+}
+
+void remove_some(const Options& options) {
+  if (options.date.empty() == options.older_than.empty()) {
+    throw Failure("write remove DATE, or remove --older-than AGE, for instance --older-than 90d",
                   kWrongUsage);
   }
-  if (!options.argument.empty() && options.action != "open" && options.action != "keep") {
-    throw Failure("\"" + options.argument + "\" means nothing to " + options.action +
-                      "; only open and keep take a word",
-                  kWrongUsage);
-  }
-  const std::size_t keep = options.action == "keep" ? parse_count(options.argument) : 0;
   const std::string folder = folder_of_reports(read_profile(options.profile));
-  const Reports found =
-      reports_in(folder, options.action == "open" ? ReportSize::left_out : ReportSize::measured);
-  if (options.action == "open") {
-    open_report(options, found);
-  } else if (options.action == "remove") {
-    remove(options, folder, older_than(options, found));
-  } else if (options.action == "keep") {
-    remove(options, folder, all_but_newest(found, keep));
-  } else {
-    list(options, folder, found);
+  const Reports found = reports_in(folder, ReportSize::measured);
+  remove(options, folder,
+         options.date.empty() ? older_than(options, found) : named(options, found));
+}
+
+void keep(const Options& options) {
+  const std::size_t count = parse_count(options.count);
+  const std::string folder = folder_of_reports(read_profile(options.profile));
+  remove(options, folder, all_but_newest(reports_in(folder, ReportSize::measured), count));
+}
+
+// The profile stands before the action.
+class ReportsFormatter : public CLI::Formatter {
+ public:
+  std::string make_usage(const CLI::App* app, std::string name) const override {
+    constexpr std::string_view kProfile = " PROFILE";
+    const bool is_group = app->get_name() == "reports";
+    std::string usage =
+        is_group ? "\nUsage: " + name + " [ACTION]\n" : CLI::Formatter::make_usage(app, name);
+    if (const std::size_t at = usage.find(kProfile); at != std::string::npos) {
+      usage.erase(at, kProfile.size());
+    }
+    const std::string own = " reports";
+    return usage.insert(usage.find(own) + own.size(), kProfile);
   }
+};
+
+CLI::App& add_action(CLI::App& group, const char* action, const char* help,
+                     void (*run)(const Options&), const std::shared_ptr<Options>& options) {
+  CLI::App& command = *group.add_subcommand(action, help);
+  add_profile_argument(command, options->profile);
+  command.callback([options, run] { run(*options); });
+  return command;
+}
+
+void add_date(CLI::App& command, const std::shared_ptr<Options>& options, const char* help) {
+  command.add_option("DATE", options->date, help)->type_name("");
 }
 
 }  // namespace
 
 void add_reports_command(CLI::App& app) {
-  auto options = std::make_shared<Options>();
-  CLI::App* command = app.add_subcommand("reports", "List, open and remove finished reports");
-  add_profile_argument(*command, options->profile);
-  command->add_option("ACTION", options->action, "list, open [DATE], remove or keep N")
-      ->type_name("")
-      ->check(CLI::IsMember({"list", "open", "remove", "keep"}));
-  command->add_option("ARGUMENT", options->argument, "For open and keep")->type_name("");
-  command->add_option("--older-than", options->older_than, "With remove: 90d, 12w or 2y")
+  CLI::App& group = *app.add_subcommand("reports", "List, open, compare and remove reports");
+  group.formatter(std::make_shared<ReportsFormatter>());
+  group.require_subcommand(1);
+  const auto options = std::make_shared<Options>();
+  add_json_flag(add_action(group, "list", "Print every report", list, options), options->json);
+  add_date(add_action(group, "open", "Open the newest report in a browser", open_report, options),
+           options, "The newest whose name begins so");
+  add_compare_command(group);
+  CLI::App& remove = add_action(group, "remove", "Remove reports", remove_some, options);
+  add_date(remove, options, "The one whose name begins so");
+  remove.add_option("--older-than", options->older_than, "All that are older: 90d, 12w or 2y")
       ->type_name("AGE");
-  command->add_flag("--dry-run", options->dry_run, "Only say what would be removed");
-  add_json_flag(*command, options->json);
-  command->callback([options] { reports(*options); });
+  CLI::App& keeping = add_action(group, "keep", "Remove all but the newest", keep, options);
+  keeping.add_option("N", options->count, "How many stay")->type_name("")->required();
+  for (CLI::App* command : {&remove, &keeping}) {
+    command->add_flag("--dry-run", options->dry_run, "Only say what would be removed");
+  }
 }
 
 }  // namespace ctl

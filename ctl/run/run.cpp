@@ -9,15 +9,17 @@
 #include <array>
 #include <chrono>
 #include <cstdio>
+#include <cstdlib>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <string>
+#include <string_view>
 
 #include "base/child.hpp"
 #include "base/configuration.hpp"
 #include "base/ctl.hpp"
 #include "base/stored_reports.hpp"
 #include "base/texts.hpp"
-#include "report_format/facts_file.hpp"
 #include "report_format/reports.hpp"
 #include "run/commands.hpp"
 #include "run/run_log.hpp"
@@ -30,10 +32,13 @@ namespace ctl {
 namespace {
 
 using Clock = std::chrono::steady_clock;
+using Json = nlohmann::ordered_json;
 
 struct Options {
   std::string profile;
   bool data = false;
+  bool all = false;
+  bool json = false;
 };
 
 volatile sig_atomic_t g_signal = 0;
@@ -99,7 +104,14 @@ class ProgressLine {
     return text;
   }
 
-  const bool is_terminal_ = isatty(STDERR_FILENO) == 1;
+  // One that can write over what stands there.
+  static bool is_capable_terminal() {
+    const char* term = std::getenv("TERM");
+    return isatty(STDERR_FILENO) == 1 && term != nullptr && *term != '\0' &&
+           std::string_view(term) != "dumb";
+  }
+
+  const bool is_terminal_ = is_capable_terminal();
   const Clock::time_point start_ = Clock::now();
   std::string shown_;
 };
@@ -129,7 +141,8 @@ void check_start(const Options& options, const Section& profile) {
                   kWrongUsage);
   }
   if (count_reports(profile.value("report_list")) == 0) {
-    throw Failure("profile " + profile.name + " selects no report; set its key report_list");
+    throw Failure("profile " + profile.name + " selects no report; run vornctl profile set " +
+                  profile.name + " report_list REPORTS");
   }
   if (!options.data) {
     // Where the report couldn't go, hours of counting would be for nothing.
@@ -198,12 +211,22 @@ bool has_collected(const Section& profile, std::time_t start) {
 }
 
 // Prints the page of the report, and what it lacks to standard error.
-void show_report(const Section& profile, const report_format::RunStatus& status) {
-  const std::string folder = folder_of_reports(profile) + "/" + status.report;
-  print_line(folder + "/" + report_format::kPageFile);
-  const auto facts = report_format::read_facts(folder);
+void show_report(const Options& options, const Section& profile,
+                 const report_format::RunStatus& status, Json& told) {
+  const std::string folder = folder_of_reports(profile);
+  const Reports reports = reports_in(folder, ReportSize::measured);
+  const auto report = std::find_if(reports.begin(), reports.end(), [&](const auto& stored) {
+    return stored.name == status.report;
+  });
+  const auto facts = report == reports.end() ? std::nullopt : facts_of(*report);
   if (!facts) {
-    throw Failure(folder + "/" + report_format::kFactsFile + " can't be read; run vornctl doctor");
+    throw Failure(folder + "/" + status.report + "/" + report_format::kFactsFile +
+                  " can't be read; run vornctl doctor");
+  }
+  told["report"] = json_of(*report, facts);
+  told["mail_failed"] = status.mail_failed;
+  if (!options.json) {
+    print_line(report->page);
   }
   for (const report_format::Incident& incident : facts->incidents) {
     warn(incident.text);
@@ -216,8 +239,7 @@ void show_report(const Section& profile, const report_format::RunStatus& status)
   }
 }
 
-void run(const Options& options) {
-  const Section profile = read_profile(options.profile);
+void run_profile(const Options& options, const Section& profile, Json& told) {
   check_start(options, profile);
   const std::string before = admin::last_run(profile.name).status.report;
   const std::time_t start = std::time(nullptr);
@@ -249,7 +271,57 @@ void run(const Options& options) {
       last.status.report == before) {
     fail_with_log("the run of profile " + profile.name + " failed", log, child, output);
   }
-  show_report(profile, last.status);
+  show_report(options, profile, last.status, told);
+}
+
+// The exit status, and in `list` what there is to tell.
+int run_and_tell(const Options& options, const Section& profile, Json& list) {
+  Json told{{"profile", profile.name}, {"kind", options.data ? "data" : "report"},
+            {"status", "success"},     {"report", nullptr},
+            {"mail_failed", false},    {"error", nullptr}};
+  int exit_status = 0;
+  try {
+    run_profile(options, profile, told);
+  } catch (const Failure& failure) {
+    exit_status = failure.exit_code();
+    if (*failure.what() != '\0') {
+      warn(failure.what());
+      told["error"] = failure.what();
+    }
+    if (exit_status != kWithIncidents) {
+      told["status"] = "fail";
+    }
+  }
+  list.push_back(std::move(told));
+  return exit_status;
+}
+
+// One after another, in the order of the file; one that fails keeps none from its turn.
+void run(const Options& options) {
+  if (options.all != options.profile.empty()) {
+    throw Failure("name one profile, or give --all", kWrongUsage);
+  }
+  const std::vector<Section> profiles =
+      options.all ? read_profiles() : std::vector{read_profile(options.profile)};
+  Json list = Json::array();
+  int worst = 0;
+  for (const Section& profile : profiles) {
+    const int exit_status = run_and_tell(options, profile, list);
+    if (exit_status != 0 && (worst == 0 || worst == kWithIncidents)) {
+      worst = exit_status;  // that something is lacking is the least of them
+    }
+    if (g_signal != 0) {
+      break;
+    }
+  }
+  if (options.json) {
+    print_json(options.all ? list : list.front());
+  } else if (profiles.empty()) {
+    warn("there are no profiles; add one with vornctl profile add NAME");
+  }
+  if (worst != 0) {
+    throw Failure("", worst);
+  }
 }
 
 }  // namespace
@@ -257,8 +329,10 @@ void run(const Options& options) {
 void add_run_command(CLI::App& app) {
   auto options = std::make_shared<Options>();
   CLI::App* command = app.add_subcommand("run", "Make a report now and watch it");
-  add_profile_argument(*command, options->profile);
+  add_profile_argument(*command, options->profile)->required(false);
   command->add_flag("--data", options->data, "Only collect what accumulates over time");
+  command->add_flag("--all", options->all, "Run every profile, one after another");
+  add_json_flag(*command, options->json);
   command->callback([options] { run(*options); });
 }
 

@@ -7,6 +7,9 @@
 #include <algorithm>
 #include <array>
 #include <chrono>
+#include <ctime>
+#include <fstream>
+#include <optional>
 #include <string_view>
 #include <thread>
 
@@ -43,6 +46,59 @@ std::string journal_of(pid_t pid) {
   return read && read->status == 0 ? read->out : "";
 }
 
+bool has_journal() {
+  return access("/run/systemd/journal/socket", F_OK) == 0 && access(kJournalctl, X_OK) == 0;
+}
+
+// The time that a line of a log file begins with: "2026-11-21T06:00:00.123+01:00", or "Nov 21
+// 06:00:00", which is of this year unless that would be ahead.
+std::optional<std::time_t> time_of(const std::string& line, std::time_t now) {
+  constexpr std::time_t kDay = 86400;
+  std::tm read{};
+  if (const char* end = strptime(line.c_str(), "%Y-%m-%dT%H:%M:%S", &read)) {
+    while (*end == '.' || (*end >= '0' && *end <= '9')) {
+      ++end;
+    }
+    std::tm zone{};
+    return strptime(end, "%z", &zone) == nullptr ? std::optional<std::time_t>()
+                                                 : timegm(&read) - zone.tm_gmtoff;
+  }
+  std::tm local{};
+  localtime_r(&now, &local);
+  for (const int year : {local.tm_year, local.tm_year - 1}) {
+    read = {};
+    if (strptime(line.c_str(), "%b %d %H:%M:%S", &read) == nullptr) {
+      return std::nullopt;
+    }
+    read.tm_year = year;
+    read.tm_isdst = -1;
+    if (const std::time_t time = mktime(&read); time <= now + kDay) {
+      return time;
+    }
+  }
+  return std::nullopt;
+}
+
+// Those of the time between, each included.
+RunLines lines_between(std::time_t start, std::time_t end) {
+  RunLines found;
+  const std::time_t now = std::time(nullptr);
+  for (const char* file : kLogFiles) {
+    for (const char* rotated : {".1", ""}) {
+      std::ifstream stream(std::string(file) + rotated);
+      found.is_read = found.is_read || stream.is_open();
+      for (std::string line; std::getline(stream, line);) {
+        const bool is_ours = line.find(kTag) != std::string::npos;
+        const auto time = is_ours ? time_of(line, now) : std::nullopt;
+        if (time && *time >= start && *time <= end) {
+          found.lines.push_back(line);
+        }
+      }
+    }
+  }
+  return found;
+}
+
 std::string text_behind(const std::string& file, off_t start) {
   constexpr std::size_t kLongest = 1U << 20U;
   const host::Fd fd(open(file.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
@@ -54,9 +110,17 @@ std::string text_behind(const std::string& file, off_t start) {
 
 }  // namespace
 
-RunLog::RunLog()
-    : is_journal_(access("/run/systemd/journal/socket", F_OK) == 0 &&
-                  access(kJournalctl, X_OK) == 0) {
+RunLines lines_of_run(const admin::RunTrace& trace) {
+  if (!has_journal()) {
+    return lines_between(trace.started, trace.ended.value_or(std::time(nullptr)));
+  }
+  const auto read = ask_program({kJournalctl, "--quiet", "--no-pager", "--output=short-iso",
+                                 "--since=@" + std::to_string(trace.started),
+                                 "_PID=" + std::to_string(trace.process)});
+  return {read && read->status == 0, lines_of(read ? read->out : "")};
+}
+
+RunLog::RunLog() : is_journal_(has_journal()) {
   struct stat status {};
   for (const char* file : kLogFiles) {
     if (file_.empty() && stat(file, &status) == 0 && S_ISREG(status.st_mode)) {

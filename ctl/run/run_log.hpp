@@ -7,7 +7,18 @@
 #include <string>
 #include <vector>
 
+#include "vorn/admin/runs.hpp"
+
 namespace ctl {
+
+// Every line of the run in the system log, with its time. Where the log is a file, which has no
+// process numbers, those of other runs at the time are among them. `is_read` tells whether there is
+// a log that can be read.
+struct RunLines {
+  bool is_read = false;
+  std::vector<std::string> lines;
+};
+RunLines lines_of_run(const admin::RunTrace& trace);
 
 class RunLog {
  public:

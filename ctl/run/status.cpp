@@ -115,9 +115,7 @@ void print_as_json(const std::vector<ProfileStatus>& all) {
       entry["overdue_since"] = json_time(*status.overdue);
     }
     if (status.last) {
-      entry["last_report"] = {{"path", status.last->page},
-                              {"made", json_time(status.last->made)},
-                              {"bytes", status.last->size}};
+      entry["last_report"] = json_of(*status.last, status.facts);
     }
     if (status.next) {
       entry["next_run"] = {{"time", json_time(status.next->time)},
@@ -190,7 +188,7 @@ void print_as_table(const std::vector<ProfileStatus>& all) {
                outlook_text(status.facts)});
   }
   if (table.empty()) {
-    print_line("no profiles; add one with vornctl profile add");
+    warn("there are no profiles; add one with vornctl profile add NAME");
     return;
   }
   table.print();
