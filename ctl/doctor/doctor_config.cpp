@@ -26,7 +26,7 @@ std::vector<Section> check_lines(Findings& findings, const char* file) {
   }
   for (const admin::WrongLine& line : found->wrong) {
     findings.add(Level::error, file, "line " + std::to_string(line.number) + ": " + line.problem,
-                 "correct the line");
+                 "correct line " + std::to_string(line.number) + " of " + file + " first");
   }
   const std::size_t count = found->sections.size();
   if (found->wrong.empty()) {
@@ -35,26 +35,44 @@ std::vector<Section> check_lines(Findings& findings, const char* file) {
   return std::move(found->sections);
 }
 
+// What to do about a section: the command, which can't change one that has a broken line.
+std::string remedy_for(const char* file, const Section& section, const std::string& command) {
+  return admin::read_section(file, section.name) ? "run " + command
+                                                 : "correct the lines of " + std::string(file) +
+                                                       " that are told above, then run " + command;
+}
+
+// What to do about a key that means nothing; `command` changes keys of its section.
+std::string remedy_for_key(const char* file, const Section& section, const std::string& command,
+                           const std::string& key, const std::vector<std::string>& known) {
+  const std::string near = suggestion(key, known);
+  const std::string unset = remedy_for(file, section, command + " " + shell_word(key) + " ''");
+  return near.empty() ? unset : near.substr(2) + " To unset it " + unset;
+}
+
+std::string set_command(const char* group, const Section& section) {
+  return "vornctl " + std::string(group) + " set " + shell_word(section.name);
+}
+
 // The number of findings.
-int check_entry(Findings& findings, const std::string& subject, const std::string& key,
-                const std::string& value) {
-  const auto keys = profile_keys();
-  if (std::none_of(keys.begin(), keys.end(),
-                   [&](const auto& known) { return known.name == key; })) {
-    std::vector<std::string> names;
-    for (const ProfileKey& known : keys) {
-      names.emplace_back(known.name);
-    }
-    const std::string near = suggestion(key, names);
+int check_entry(Findings& findings, const std::string& subject, const Section& section,
+                const std::string& key, const std::string& value) {
+  std::vector<std::string> names;
+  for (const ProfileKey& known : profile_keys()) {
+    names.emplace_back(known.name);
+  }
+  const std::string command = set_command("profile", section);
+  if (std::find(names.begin(), names.end(), key) == names.end()) {
     findings.add(Level::warning, subject, "the key " + key + " means nothing",
-                 near.empty() ? "remove it" : near.substr(2));
+                 remedy_for_key(VORN_PATH_CONFIG, section, command, key, names));
     return 1;
   }
   try {
     checked_value(profile_key(key), value);
     return 0;
   } catch (const Failure& failure) {
-    add_failure(findings, subject, failure.what());
+    findings.add(Level::error, subject, failure.what(),
+                 remedy_for(VORN_PATH_CONFIG, section, command + " " + key + " VALUE"));
     return 1;
   }
 }
@@ -63,38 +81,45 @@ void check_profile(Findings& findings, const Section& section) {
   const std::string subject = section.name == "global" ? "whole server" : "profile " + section.name;
   int problems = 0;
   for (const auto& [key, value] : section.entries) {
-    problems += check_entry(findings, subject, key, value);
+    problems += check_entry(findings, subject, section, key, value);
     admin::take_messages();  // those about other sections have findings of their own
   }
   const std::string reports = section.value("report_list");
   if (reports.empty()) {
-    findings.add(Level::error, subject, "it selects no report",
-                 "run vornctl profile set " + section.name + " report_list share_list,large_file");
+    findings.add(
+        Level::error, subject, "it selects no report",
+        remedy_for(VORN_PATH_CONFIG, section,
+                   set_command("profile", section) + " report_list share_list,large_file"));
   } else if (problems == 0) {
     findings.ok(subject, reports);
   }
+  admin::take_messages();
 }
 
 void check_share_section(Findings& findings, const Section& section,
                          const std::vector<Share>& shares) {
   const std::string subject = "share " + section.name;
+  const std::string command = set_command("share", section);
   if (const std::string problem = share_name_problem(section.name); !problem.empty()) {
-    findings.add(Level::error, subject, "it is left out: " + problem, "rename its section");
+    findings.add(Level::error, subject, "it is left out: " + problem,
+                 remedy_for(VORN_PATH_SHARES, section, command + " --name NAME"));
     return;
   }
   const std::vector<std::string> known{"path", "file_index", "network"};
   for (const auto& [key, value] : section.entries) {
     if (std::find(known.begin(), known.end(), key) == known.end()) {
-      const std::string near = suggestion(key, known);
       findings.add(Level::warning, subject, "the key " + key + " means nothing",
-                   near.empty() ? "remove it" : near.substr(2));
+                   remedy_for_key(VORN_PATH_SHARES, section, command, key, known));
     }
   }
   for (const Share& share : shares) {
     if (share.name == section.name && !share.path_error.empty()) {
-      findings.add(Level::error, subject, share.path_error);
+      const std::string& problem = share.path_error;
+      findings.add(Level::error, subject, problem.substr(0, problem.rfind("; ")),
+                   remedy_for(VORN_PATH_SHARES, section, command + " --path FOLDER"));
     }
   }
+  admin::take_messages();
 }
 
 }  // namespace
@@ -130,7 +155,7 @@ Configuration check_configuration(Findings& findings) {
   }
   if (!collects) {
     findings.add(Level::warning, "whole server", "without a section [global] no history is kept",
-                 "write [global] and report_list = volume_usage into " VORN_PATH_CONFIG);
+                 "run vornctl profile set global report_list volume_usage");
   }
   const std::vector<Section> sections = check_lines(findings, VORN_PATH_SHARES);
   configuration.shares = admin::read_shares().value_or(std::vector<Share>{});
@@ -139,7 +164,7 @@ Configuration check_configuration(Findings& findings) {
   }
   if (configuration.shares.empty()) {
     findings.add(Level::warning, "shares", "there are none, so reports on files are empty",
-                 "run vornctl share add NAME PATH");
+                 "run vornctl share add NAME FOLDER");
   }
   admin::take_messages();  // those lines have their findings
   return configuration;

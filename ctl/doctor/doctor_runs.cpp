@@ -87,7 +87,7 @@ void check_leftovers(Findings& findings, const Section& profile) {
   const auto left = admin::leftovers_of(profile);
   if (!left) {
     findings.add(Level::error, "reports of " + profile.name,
-                 host_failure(folder + " can't be used; move it away").what());
+                 host_failure(folder + " can't be used; see who owns it").what());
   } else if (!left->empty()) {
     findings.add(Level::warning, "leftovers of " + profile.name, left->front(),
                  "the next run removes them, or " + std::string(kProgram) + " --clean " +
@@ -126,6 +126,13 @@ void check_schedules(Findings& findings, const Configuration& configuration) {
     for (const std::string& problem : service_problems(profile)) {
       findings.add(Level::error, "service " + admin::service_of(JobKind::report, profile.name),
                    problem);
+    }
+    const bool is_scheduled = std::any_of(jobs.begin(), jobs.end(), [&](const Job& job) {
+      return job.profile == profile.name && job.kind == JobKind::report;
+    });
+    if (!is_scheduled) {
+      findings.add(Level::warning, "schedule of " + profile.name, "nothing makes its reports",
+                   "run vornctl schedule " + profile.name + " --report @weekly");
     }
   }
   if (uses_cron && cron_is_running()) {
