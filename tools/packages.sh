@@ -11,7 +11,8 @@ build_packages=(
 # Besides those, to run all tests. (CMake looks for GoogleTest only when tests are built.)
 test_packages=(
   libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota samba-common-bin
-  lintian systemd systemd-container cron strace glusterfs-server glusterfs-client iproute2 prometheus
+  lintian systemd systemd-container cron strace glusterfs-server glusterfs-client iproute2
+  prometheus zsh bash-completion
 )
 
 # npm bundles the page. Where it came with another Node.js, Debian's stays away: they conflict.

@@ -63,7 +63,7 @@ class Run:
         self.log = log
         streams = {'stdout': subprocess.PIPE, 'stderr': subprocess.PIPE} | streams
         self.process = subprocess.Popen(machine.sandbox(log) + ['--', *command],
-                                        stdin=subprocess.DEVNULL, **streams)
+                                        **({'stdin': subprocess.DEVNULL} | streams))
 
     def pid(self, program='vornreport'):
         """Waits for the program: the sandbox's only child. Its process id."""

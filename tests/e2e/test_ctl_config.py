@@ -1,9 +1,15 @@
 """vornctl's commands for shares and profiles, on the staged product."""
 import json
 import os
+import pty
+import re
+import select
 import shutil
+import sqlite3
+import time
+from unittest.mock import ANY
 
-from harness import ALL, CTL, CtlTest, Run, needs_root
+from harness import ALL, CTL, LIMIT, ROOT, CtlTest, Run, needs_root
 
 SHARES = '# top\n\n# of one\n[one]\n path=/etc ; not a comment\n\n[two]\npath = /usr\n# end'
 
@@ -24,12 +30,25 @@ class Shares(ControlTest):
     def test_each_change_and_refusal(self):
         index = '/usr/vorn/vornreport/sql/vornreport.sql'
         self.m.profile('p', report_list='share_list', share_list='x, two')
-        add = 'share', 'add'
+        add, put = ('share', 'add'), ('share', 'set', 'one')
         self.check_table(self.m.shares, SHARES, (
             ((*add, 'Größe & mehr', '/etc//'), SHARES + '\n\n[Größe & mehr]\npath = /etc\n', ''),
             ((*add, 'x', '/etc', '--file-index', index, '--network'), SHARES +
              f'\n\n[x]\npath = /etc\nfile_index = {index}\nnetwork = yes\n', ''),
-            ((*add, 'x', '/usr'), SHARES + '\n\n[x]\npath = /usr\n', 'count twice'),
+            ((*add, 'x', '/usr/bin'), SHARES + '\n\n[x]\npath = /usr/bin\n',
+             'shares two and x hold the same files.*'),
+            ((*add, 'x', '/proc'), SHARES + '\n\n[x]\npath = /proc\n', 'not walked .*set x --path'),
+            ((*put, 'file_index', index, '--network'),
+             SHARES.replace('comment\n', f'comment\n file_index = {index}\n network = yes\n'),
+             "can't be found .*set one --path"),
+            ((*put, 'path', '/proc/'), SHARES.replace('=/etc ; not a comment', ' = /proc'),
+             'not walked '),
+            ((*put, '--name', 'uno'), SHARES.replace('[one]', '[uno]'), ''),
+            ((*put, '--name', 'two'), None, r'has a section \[two\] already'),
+            ((*put, '--path', 'etc'), None, 'not absolute'),
+            ((*put, 'network', 'maybe'), None, 'neither yes nor no'),
+            ((*put, 'pth', '/etc'), None, '"pth" is no key'),
+            (('share', 'set', 'three', '--network'), None, 'share list'),
             (('share', 'remove', 'one'), SHARES.replace('[one]\n path=/etc ; not a comment\n\n',
                                                         '\n'), ''),
             (('share', 'remove', 'two', '--force'), SHARES.replace('[two]\npath = /usr\n', ''),
@@ -59,7 +78,34 @@ class Shares(ControlTest):
         self.assertNotIn('\x1b', run.out)
         self.assertIn('control character', lines[2])
         self.assertEqual(json.loads(self.ctl('share', 'list', '--json').out)[0],
-                         {'name': '写真', 'path': '/etc', 'file_index': '', 'state': 'fine'})
+                         {'name': '写真', 'path': '/etc', 'kind': ANY, 'network': False,
+                          'file_index': None, 'state': 'fine', 'walked': True, 'overlaps': []})
+
+    def test_renaming_is_followed_into_profiles(self):
+        self.m.share('b')
+        for name, shares in (('p', 'a, b ,c'), ('q', 'bb')):
+            self.m.profile(name, report_list='share_list', share_list=shares)
+        self.check(('share', 'set', 'b', '--name', 'new one'),
+                   out='profile p now covers new one\n')
+        text = self.m.config.read_text()
+        self.assertIn('share_list = a,new one,c\n', text)
+        self.assertIn('share_list = bb\n', text)
+
+    @needs_root  # a mount
+    def test_two_ways_to_the_same_files(self):
+        inside = self.m.base / 'shares/all/deep'
+        inside.mkdir(parents=True)
+        for name in ('all', 'bound', 'beside', 'linked'):
+            (self.m.base / 'shares' / name).mkdir(exist_ok=True)
+        (inside / 'link').symlink_to(inside.parent)
+        self.m.options += ['--bind', inside, self.m.base / 'shares/bound']
+        for name, folder in (('all', 'all'), ('bound', 'bound'), ('beside', 'beside'),
+                             ('linked', 'all/deep/link')):
+            self.m.share(name, self.m.base / 'shares' / folder)
+        found = {share['name']: share['overlaps']
+                 for share in json.loads(self.ctl('share', 'list', '--json').out)}
+        self.assertEqual(found, {'all': ['bound', 'linked'], 'bound': ['all', 'linked'],
+                                 'beside': [], 'linked': ['all', 'bound']})
 
     def test_writers_at_once_lose_nothing(self):
         self.m.shares.write_text('')
@@ -178,6 +224,18 @@ class Profiles(ControlTest):
         add, put = ('profile', 'add', 'n'), ('profile', 'set', 'p')
         self.check_table(self.m.config, before, (
             (add, f'{made}{ALL.replace("quota_usage,", "")}\nvolume_history = true\n', 'no volume has quotas'),
+            ((*add, '--report-list', 'share_list', '--volume-history', 'false',
+              '--duplicate-compare', 'true', '--duplicate-compare-minutes', '9'),
+             made + 'share_list\nduplicate_compare = true\nduplicate_compare_minutes = 9\n'
+             'volume_history = false\n', ''),
+            ((*add, '--share-list', ''), None, 'share_list "" is an empty list'),
+            ((*add, '--reports', ''), None, 'report_list "" is an empty list'),
+            ((*put, '--language', 'fr', '--keep-reports', '2'),
+             before.replace('language=de', 'language = fr\nkeep_reports = 2'), ''),
+            ((*put, 'keep-reports', '2', 'own', ''),
+             before.replace('own = 1\n', '').replace('=de\n', '=de\nkeep_reports = 2\n'), ''),
+            (('profile', 'set', 'global', 'shares', 'photos'),
+             before.replace('usage\n', 'usage\nshare_list = photos\n'), ''),
             ((*add, '--reports', 'large_file, share_list', '--shares', 'my docs,photos', '--language',
               'de-AT', '--mail-to', 'a@b.c ,d@e.f', '--mail-from', 'v@b.c', '--smtp-url',
               'smtps://m:465', '--smtp-user', 'u', '--smtp-password-file', '/tmp/secret',
@@ -199,7 +257,9 @@ class Profiles(ControlTest):
                 ('p', 'already'), ('global', 'no profile'), ('a b', 'no profile name'),
                 ('a]\n[b', 'no profile name'), ('.a', 'no profile name'))),
             *(((*put, key, value), None, message) for key, value, message in (
-                ('report_list', 'large_fiel', 'mean "large_file"'), ('report_list', '', 'empty'),
+                ('report_list', 'large_fiel', 'mean "large_file"'),
+                ('report_list', '', 'is an empty list'), ('report_list', ',', 'is an empty list'),
+                ('share_list', ',,', 'is an empty list'), ('mail_to', ',', 'is an empty list'),
                 ('report_list', 'share_list; larg_file', '"larg_file"'),
                 ('share_list', 'photo', 'mean "photos"'), ('share_list', 'q', 'share add'),
                 ('language', 'tlh', 'there are de, en'), ('mail_to', 'a@b, c', '"c" is no mail'),
@@ -218,12 +278,14 @@ class Profiles(ControlTest):
             (('profile', 'remove', 'global'), None, 'no profile')))
 
     def test_show_and_list(self):
-        self.m.config.write_text(self.GLOBAL + f'[p]\nreport_list = {ALL}\nmail_to = a@b\n')
+        self.m.config.write_text(self.GLOBAL + f'[p]\nreport_list = {ALL}\nmail_to = a@b\n'
+                                 'keep_reports = 3\nvolume_history = TRUE\nlanguage = de\n')
         self.check(('profile', 'list'), out='PROFILE  SHARES  MAIL TO  REPORTS\n'
                                             'p        all     a@b      all\n')
         self.check(('profile', 'show', 'global'), out='KEY          VALUE\n'
                                                       'report_list  volume_usage\n')
-        shown = {'name': 'p', 'report_list': ALL, 'mail_to': 'a@b'}
+        shown = {'name': 'p', 'report_list': ALL.split(','), 'mail_to': ['a@b'],
+                 'keep_reports': 3, 'volume_history': True, 'language': 'de'}
         self.assertEqual(json.loads(self.ctl('profile', 'show', 'p', '--json').out), shown)
         self.assertEqual(json.loads(self.ctl('profile', 'list', '--json').out), [shown])
 
@@ -252,22 +314,117 @@ class Profiles(ControlTest):
         self.check(('profile', 'remove', 'q'))
 
 
+    def test_copies_and_renames_take_all_along(self):
+        self.m.share('s')
+        self.m.profile('p', report_list='share_list,volume_usage', schedule_collect_id='p')
+        job = self.m.cron / 'vornreport-p'
+        job.write_text('0 4 * * 1 root /usr/vorn/bin/vornreport --report p\n')
+        self.m.run('--data', 'p')
+        report = self.assertSucceeded(self.m.run('--report', 'p'), 'p')
+
+        def known():
+            with sqlite3.connect(self.m.vorn / 'etc/vornreport.db') as db:
+                return {name: (db.execute('select count(*) from VolumeUsage where profile = ?',
+                                          (name,)).fetchone()[0] > 0,
+                               db.execute('select count(*) from Snapshot where profile = ?',
+                                          (name,)).fetchone()[0]) for name in ('p', 'q', 'r')}
+        all_of_it, nothing = (True, 1), (False, 0)
+        for action, name, message in (('rename', 'p', 'already'), ('copy', 'global', 'no profile'),
+                                      ('rename', '.x', 'no profile name')):
+            self.check(('profile', action, 'p', name), 1, message)
+        self.check(('profile', 'copy', 'p', 'r', '--settings-only'))
+        self.check(('profile', 'remove', 'r'))
+        self.check(('profile', 'copy', 'p', 'q'))
+        self.assertEqual(known(), {'p': all_of_it, 'q': all_of_it, 'r': nothing})
+        (self.m.reports / 'r').mkdir()
+        self.check(('profile', 'rename', 'p', 'r'), 1, 'File exists')
+        self.assertIn('--report p ', job.read_text())
+        (self.m.reports / 'r').rmdir()
+        self.check(('profile', 'rename', 'p', 'r'))
+        self.assertEqual(known(), {'p': nothing, 'q': all_of_it, 'r': all_of_it})
+        for name in ('q', 'r'):
+            stored = self.m.reports / name / report.name
+            self.assertTrue((stored / 'report.html').exists() and (stored / 'csv').exists())
+            self.assertIn(f'--report {name} ', (self.m.cron / f'vornreport-{name}').read_text())
+        self.assertFalse(job.exists() or report.exists())
+        self.assertEqual(self.m.status('r'), 'success')
+        self.assertEqual(re.findall(r'\[(.*)\]', self.m.config.read_text()),
+                         ['global', 'r', 'q'])
+        self.check(('profile', 'remove', 'r', '--reports-too'))
+        self.assertEqual(known(), {'p': nothing, 'q': all_of_it, 'r': nothing})
+
+
 class Completion(ControlTest):
-    def test_vornctl_knows_what_can_stand_where(self):
-        self.m.share('photos')
-        self.m.share('my docs')
+    def machine(self):
+        for name in ('photos', 'my docs', 'music'):
+            self.m.share(name)
         self.m.profile('weekly', report_list='share_list')
+        for name in ('2026-01-02_03-04-05', '2026-02-03_03-04-05'):
+            folder = self.m.reports / 'weekly' / name
+            folder.mkdir(parents=True)
+            (folder / 'report.html').write_text('<!DOCTYPE html>\n</html>\n')
+
+    def test_in_real_shells(self):
+        """Typed into bash and zsh on a terminal; the words that the line consists of afterwards."""
+        self.machine()
+        files = ROOT / 'packaging/completion'
+        setup = {
+            'bash --norc --noprofile -i':
+                f'. /usr/share/bash-completion/bash_completion; . {files}/vornctl.bash',
+            'zsh -f -i': f'fpath=({files} $fpath); autoload -U compinit; compinit -u -D; bindkey -e'}
+        cases = (('ru', 'run'), ('help sh', 'help|share'), ('run w', 'run|weekly'),
+                 ('share set pho', 'share|set|photos'), ('share set my', 'share|set|my docs'),
+                 ('reports w', 'reports|weekly'), ('reports weekly rem', 'reports|weekly|remove'),
+                 ('reports weekly open 2026-01', 'reports|weekly|open|2026-01-02_03-04-05'),
+                 ('reports weekly compare 2026-01-02_03-04-05 2026-02',
+                  'reports|weekly|compare|2026-01-02_03-04-05|2026-02-03_03-04-05'),
+                 ('profile set weekly share_list photos,mus',
+                  'profile|set|weekly|share_list|photos,music'),
+                 ('profile add x --share-list photos,my', 'profile|add|x|--share-list|photos,my docs'),
+                 ('profile set weekly --lang', 'profile|set|weekly|--language'))
+        for shell, commands in setup.items():
+            master, slave = pty.openpty()
+            self.addCleanup(os.close, master)
+            run = Run(self.m, ['setsid', '--ctty', 'env', 'TERM=dumb', 'HOME=/tmp', *shell.split()], None,
+                      stdin=slave, stdout=slave, stderr=slave)
+            os.close(slave)
+
+            def answer(typed, end):
+                os.write(master, typed.encode())
+                shown, limit = '', time.monotonic() + LIMIT
+                while not (found := re.search(end, shown)):
+                    self.assertLess(time.monotonic(), limit, f'{shell}: {typed!r}: {shown!r}')
+                    if select.select([master], [], [], 1)[0]:
+                        shown += os.read(master, 4096).decode()
+                return found
+            answer(f"stty cols 400; PATH=/usr/vorn/bin:$PATH; {commands}; printf '%s!' DONE\n", 'DONE!')
+            for typed, words in cases:
+                with self.subTest(shell=shell, typed=typed):
+                    # The line becomes the arguments of another command, which shows its words.
+                    shown = answer(f"vornctl {typed}\t\x01printf '(%s)' \x05 END\n", r'(\(.*\))\(END\)')
+                    self.assertEqual(shown[1], ''.join(
+                        f'({word})' for word in ['vornctl', *words.split('|')]))
+            os.write(master, b'exit\n')
+            run.process.wait(LIMIT)
+
+    def test_vornctl_knows_what_can_stand_where(self):
+        self.machine()
         languages = self.m.vorn / 'vornreport/reportUI/template/lang'
         for name, text in (('de.bak.json', '{}'), ('de.json.bak', '{}'), ('dx.json', '{'),
                            ('dy.json', '[]'), ('dz.js', '{}'), ('da.json', '{}')):
             (languages / name).write_text(text)
         for words, expected in (
-                ('sh', 'share'), ('share remove ', 'photos|my docs'), ('run w', 'weekly'),
+                ('sh', 'share'), ('share remove ', 'photos|my docs|music'), ('run w', 'weekly'),
                 ('share add x ', '/folders'), ('profile set weekly lang', 'language'),
                 ('profile set weekly language d', 'da|de'),
                 ('profile set weekly language de volume_history ', 'true|false'),
                 ('profile add x --reports large_file,q', 'large_file,quota_usage'),
-                ('profile add x --rep', '--reports|--report-dir'), ('profile show weekly ', '')):
+                ('profile add x --shares music,', 'music,photos|music,my docs'),
+                ('reports ', 'weekly'), ('reports weekly ', 'list|open|compare|remove|keep'),
+                ('reports weekly remove --', '--help|--help-all|--older-than|--dry-run'),
+                ('reports weekly remove 2026-0', '2026-01-02_03-04-05|2026-02-03_03-04-05'),
+                ('help reports ', 'list|open|compare|remove|keep'),
+                ('profile add x --rep', '--report-list|--report-dir'), ('profile show weekly ', '')):
             with self.subTest(words):
                 run = self.ctl('complete', *words.split(' '))
                 self.assertEqual((run.out.splitlines(), run.err),

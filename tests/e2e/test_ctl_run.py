@@ -9,7 +9,7 @@ import signal
 import time
 from pathlib import Path
 
-from harness import CTL, LIMIT, PROGRAM, CtlTest, Run, make_files, wait_for
+from harness import CTL, LIMIT, PROGRAM, CtlTest, Run, make_files, needs_root, wait_for
 
 ALONE = 'unshare', '--pid', '--fork', '--kill-child', '--mount-proc'  # sees its own processes only
 WHOLE, CUT = '<!DOCTYPE html>\n</html>\n', '<!DOCTYPE html>\n'
@@ -77,6 +77,44 @@ class Running(WeeklyTest):
         self.assertIn('\nincidents = 2\n', (self.m.vorn / 'var/status/weekly').read_text())
         self.assertIn('share gone is missing', self.ctl('doctor').out)
 
+    def test_all_profiles_and_json(self):
+        self.m.profile('bare')
+        self.m.profile('more', report_list='share_list')
+        page = rf'{self.m.reports}/%s/[-_\d]*/report\.html\n'
+        self.check(['run', '--all'], 1, 'profile bare selects no report',
+                   page % 'weekly' + page % 'more')
+        run = self.ctl('run', '--all', '--json')
+        told = json.loads(run.out)
+        self.assertEqual([(each['profile'], each['status'], each['report'] is not None)
+                          for each in told],
+                         [('weekly', 'success', True), ('bare', 'fail', False),
+                          ('more', 'success', True)])
+        self.assertEqual(told[0]['report'],
+                         json.loads(self.ctl('status', 'weekly', '--json').out)[0]['last_report'])
+        self.assertIn('selects no report', told[1]['error'])
+        data = json.loads(self.ctl('run', 'more', '--data', '--json').out)
+        self.assertEqual((data['kind'], data['report']), ('data', None))
+        for wrong in (['run'], ['run', 'weekly', '--all']):
+            self.check(wrong, 2, 'name one profile, or give --all')
+
+    def test_log(self):
+        self.check(['log', 'weekly'], 1, 'profile weekly has not run yet')
+        logs = self.m.base / 'logs'
+        logs.mkdir()
+        self.m.options += ['--bind', logs, '/var/log', '--tmpfs', '4096', '/run']
+        self.ctl('run', 'weekly')
+        now = datetime.datetime.now().astimezone()
+        hour = datetime.timedelta(hours=1)
+        for stamp in (lambda time: time.strftime('%b %d %H:%M:%S'), datetime.datetime.isoformat):
+            with self.subTest(stamp(now)):
+                (logs / 'syslog').write_text(''.join(
+                    f'{stamp(time)} host {what}\n' for time, what in (
+                        (now - hour, 'vornreport: earlier'), (now, 'vornreport: of \x1b it'),
+                        (now, 'cron: other'), (now + hour, 'vornreport: later'))))
+                self.check(['log', 'weekly'], out=r'.* vornreport: of \\x1b it\n')
+        (logs / 'syslog').write_text('')
+        self.check(['log', 'weekly'], err='the run of .* has said nothing')
+
     def test_a_mail_that_nobody_got(self):
         self.m.profile('mailed', report_list='share_list', mail_to='a@b.example',
                        smtp_url='smtp://127.0.0.1:1')
@@ -105,7 +143,7 @@ class Running(WeeklyTest):
         for call, phase in (('lang', 'weekly: starting'),
                             ('body 2', 'weekly: putting the page together')):
             self.m.stop_at(call)
-            run = Run(self.m, [CTL, 'run', 'weekly'], None, stderr=slave)
+            run = Run(self.m, ['env', 'TERM=xterm', CTL, 'run', 'weekly'], None, stderr=slave)
             self.m.stopped_pid()
             end = time.monotonic() + LIMIT
             while phase not in shown and time.monotonic() < end:
@@ -114,6 +152,10 @@ class Running(WeeklyTest):
             self.assertIn(phase, shown)
             self.m.go_on()
             self.assertEqual(run.finish().status, 0)
+        while select.select([master], [], [], 0.1)[0]:
+            os.read(master, 4096)
+        Run(self.m, ['env', 'TERM=dumb', CTL, 'run', 'weekly'], None, stderr=slave).finish()
+        self.assertEqual(select.select([master], [], [], 0.5)[0], [])
         os.close(slave)
 
     def test_one_run_at_a_time(self):
@@ -268,7 +310,8 @@ class Status(WeeklyTest):
                          r'weekly: /srv/a: full in about 12 days \(9 to 20\)\n$')
         listed, = (entry for entry in json.loads(self.ctl('reports', 'weekly', '--json').out)
                    if entry['level'])
-        self.assertEqual((listed['level'], listed['incidents']), ('critical', 1))
+        self.assertEqual((listed['level'], len(listed['incidents'])), ('critical', 1))
+        self.assertEqual(listed, weekly['last_report'])
         self.assertRegex(self.ctl('reports', 'weekly').out, r'yes, lacking 1 +critical +/')
 
     def test_next_run(self):
@@ -311,6 +354,9 @@ class Reports(WeeklyTest):
                 (['keep', '2'], 0, [old]), (['keep', '2', '--dry-run'], 0, []),
                 (['keep', '9'], 0, []), (['keep', '0'], 2, []), (['keep'], 2, []),
                 (['remove'], 2, []), (['remove', old, '--older-than', '2d'], 2, []),
+                (['remove', new], 0, [new]), (['remove', new[:10], '--dry-run'], 0, []),
+                (['remove', old], 0, [old]), (['remove', '2020-01'], 1, []),
+                (['remove', '2020-02-02'], 1, []), (['remove', '../x'], 1, []),
                 (['remove', '--older-than', '0d'], 2, []),
                 (['remove', '--older-than', '9'], 2, []), (['purge'], 2, [])):
             with self.subTest(arguments):
@@ -334,13 +380,85 @@ class Reports(WeeklyTest):
         folder = self.stored('weekly', {
             '2020-01-02_03-04-05': WHOLE, '2020-01-03_03-04-05': WHOLE, '2021-01-01_00-00-00': CUT})
         shown = json.loads(self.ctl('reports', 'weekly', '--json').out)
-        self.assertEqual([(entry['name'], entry['complete']) for entry in shown],
+        self.assertEqual([(entry['name'], entry['whole']) for entry in shown],
                          [('2020-01-02_03-04-05', True), ('2020-01-03_03-04-05', True),
                           ('2021-01-01_00-00-00', False)])
         for date, name in (('', '2020-01-03_03-04-05'), ('2020-01-02', '2020-01-02_03-04-05')):
             page = f'{folder}/{name}/report.html'
             self.check(['reports', 'weekly', 'open', *date.split()], out=f'{page}\nfile://{page}\n')
         self.check(['reports', 'weekly', 'open', '2021'], 1, 'profile weekly has no complete ')
+
+
+    def test_compare(self):
+        def facts(used, **more):
+            return {'format': 1, 'volumes': [{'path': '/srv', 'used': used}]} | more
+
+        def share(name, size, files, whole=True):
+            return {'name': name, 'bytes': size, 'files': files, 'whole': whole}
+        gib = 1 << 30
+        folder = self.stored('weekly', dict.fromkeys(
+            ('2026-01-01_00-00-00', '2026-01-02_00-00-00', '2026-01-03_00-00-00'), WHOLE))
+        for day, content in ((1, facts(gib, shares=[share('a', gib, 3), share('old', 5, 1)], owners=[
+                                 {'name': 'u\x1b', 'bytes': 1 << 63, 'files': 1}])),
+                             (2, facts(3 * gib, shares=[share('a', 2 * gib, 1),
+                                                        share('new', 7, 1, False)], owners=[
+                                 {'name': 'u\x1b', 'bytes': 0, 'files': 1}],
+                                 incidents=[{'level': 'error', 'kind': 'share_missing', 'what': 'old',
+                                             'text': 'x'}]))):
+            (folder / f'2026-01-0{day}_00-00-00/report.json').write_text(json.dumps(content))
+        for dates in (('2026-01-01', '2026-01-02'), ('2026-01-02', '2026-01-01')):
+            shown = self.ctl('reports', 'weekly', 'compare', *dates)
+            self.assertRegex(shown.err, 'report 2026-01-02_00-00-00: Share old is missing')
+            rows = [re.split('  +', line) for line in shown.out.splitlines()[2:]]
+            self.assertEqual(rows, [
+                ['volume', '/srv', '1 GiB', '3 GiB', '+2 GiB', '-'],
+                ['share', 'a', '1 GiB', '2 GiB', '+1 GiB', '-2'],
+                ['share', 'new', '-', '7 B', '+7 B', '+1', 'new'],
+                ['share', 'old', '5 B', '-', '-5 B', '-1', 'gone'],
+                ['owner', r'u\x1b', '8 EiB', '0 B', '-8 EiB', '+0']])
+        found = json.loads(self.ctl('reports', 'weekly', 'compare', *dates, '--json').out)
+        self.assertEqual((found['from']['name'], found['types'], found['shares'][1]),
+                         ('2026-01-01_00-00-00', None,
+                          {'name': 'new', 'bytes': {'before': None, 'after': 7, 'change': 7},
+                           'files': {'before': None, 'after': 1}, 'whole': False}))
+        for dates, message in ((['2026-01-01', '2026-01-01'], 'both dates name'),
+                               (['2025'], 'has no complete report of 2025'),
+                               (['2026-01-01'], '2026-01-03_00-00-00 has no report.json')):
+            self.check(['reports', 'weekly', 'compare', *dates], 1, message)
+
+
+class EveryCommand(WeeklyTest):
+    def test_help_and_version(self):
+        self.check(['--version'], out=r'vornctl \d+\.\d+\.\d+\n')
+        help_of = {}
+        for words in ('', 'share', 'share set', 'profile copy', 'run', 'reports', 'reports compare'):
+            help_of[words] = self.ctl('help', *words.split()).out
+            of_command = words.split()[:1] if words == 'reports compare' else words.split()
+            self.assertEqual(self.ctl(*of_command, '--help').out, help_of[' '.join(of_command)])
+        self.assertIn('reports PROFILE compare [OPTIONS] DATE [DATE2]', help_of['reports compare'])
+        self.assertEqual(self.ctl('reports', 'weekly', 'compare', '--help').out,
+                         help_of['reports compare'])
+        # A profile may be called as an action is.
+        self.m.profile('remove', report_list='share_list')
+        self.check(['reports', 'remove'], err='there are no reports in .*/remove; ')
+        self.check(['reports', 'weekly', 'purge'], 2, '"purge" is no command')
+
+    @needs_root
+    def test_another_user_is_told_to_be_root(self):
+        (self.stored('weekly', {'2026-01-01_00-00-00': WHOLE})).chmod(0o700)
+        for folder in (self.m.base, self.m.stage, self.m.stage / 'usr'):
+            folder.chmod(0o755)
+        for words in ('share add x /etc', 'share set photos --network', 'share remove photos',
+                      'profile add x', 'profile set weekly language de', 'profile remove weekly',
+                      'profile copy weekly x', 'profile rename weekly x', 'run weekly', 'run --all',
+                      'log weekly', 'reports weekly', 'reports weekly keep 1', 'doctor',
+                      'schedule weekly --report @daily', 'schedule weekly --clean'):
+            with self.subTest(words):
+                run = Run(self.m, ['setpriv', '--reuid=65534', '--regid=65534', '--clear-groups',
+                                   CTL, *words.split()], None).finish()
+                self.assertEqual((run.status, run.out), (1, ''), run.err)
+                self.assertRegex(run.err, 'as root')
+                self.assertNotIn('move it away', run.err)
 
 
 class Doctor(WeeklyTest):
@@ -410,7 +528,12 @@ class Doctor(WeeklyTest):
                 ('error', 'profile more: its metrics_file is that of again',
                  lambda: [self.m.profile(name, report_list='share_list',
                                          metrics_file='/tmp/x.prom') for name in ('again', 'more')]),
-                ('warning', 'schedule of more: ', configure(schedule_collect_id='job9')),
+                ('warning', 'schedule of more: .*missing', configure(schedule_collect_id='job9')),
+                ('warning', 'schedule of more: nothing makes .*schedule more --report', configure()),
+                ('error', 'profile weekly: .*correct the lines .* that are told above',
+                 append(config, 'language = xx\n[weekly]\n')),
+                ('warning', 'share in: shares photos and in hold',
+                 append(shares, f'[in]\npath = {self.m.base}/shares\n')),
                 ('warning', 'last run of weekly: ended early', killed),
                 ('warning', 'leftovers of weekly: ', leftover),
                 ('warning', 'time zone: ', bind('no zone', os.path.realpath('/etc/localtime'))),
