@@ -83,6 +83,14 @@ struct NewShare {
   bool network = false;
 };
 
+// The failure that says which share it is of.
+Failure with_title(const std::string& name, const Failure& failure) {
+  const std::string text = failure.what();
+  return text.starts_with("its ") || text.starts_with("--")
+             ? Failure(titled(name) + ": " + text, failure.exit_code())
+             : failure;
+}
+
 void add_share(NewShare share) try {
   check_name(share.name);
   share.path = checked_path(share.path);
@@ -97,9 +105,7 @@ void add_share(NewShare share) try {
   add_section(VORN_PATH_SHARES, share.name, entries);
   warn_of_state({share.name, share.path, {}, share.file_index, share.network}, others);
 } catch (const Failure& failure) {
-  const std::string title = titled(share.name);
-  const std::string text = failure.what();
-  throw text.starts_with(title) || text.starts_with("/") ? failure : Failure(title + ": " + text);
+  throw with_title(share.name, failure);
 }
 
 constexpr const char* kIndexHelp = "Database that lists the files, not to walk";
@@ -161,7 +167,7 @@ void follow(const std::string& name, const std::string& new_name) {
 
 using Pairs = std::vector<std::pair<std::string, std::string>>;
 
-void set_share(const ShareChanges& set, Pairs pairs) {
+void set_share(const ShareChanges& set, Pairs pairs) try {
   std::optional<Section> section = admin::read_section(VORN_PATH_SHARES, set.name);
   if (!section) {
     throw host_failure(titled(set.name) + " is not in " VORN_PATH_SHARES
@@ -198,6 +204,8 @@ void set_share(const ShareChanges& set, Pairs pairs) {
   if (own != others.end() && !changes.empty()) {
     warn_of_state(Share(*own), others);
   }
+} catch (const Failure& failure) {
+  throw with_title(set.name, failure);
 }
 
 void describe_set(CLI::App& group) {
@@ -209,8 +217,12 @@ void describe_set(CLI::App& group) {
       ->type_name("NAME");
   set->add_option("--path", share->path, "New folder")->type_name("FOLDER");
   set->add_option("--file-index", share->file_index, kIndexHelp)->type_name("FILE");
-  set->add_flag("--network,!--no-network", share->network, kNetworkHelp);
-  set->callback([set, share] { set_share(*share, pairs_of(*set)); });
+  const auto network = std::make_shared<bool>();
+  const CLI::Option* flag = set->add_flag("--network,!--no-network", *network, kNetworkHelp);
+  set->callback([set, share, network, flag] {
+    share->network = flag->count() > 0 ? std::optional(*network) : std::nullopt;
+    set_share(*share, pairs_of(*set));
+  });
 }
 
 // --- list ---------------------------------------------------------------------------------------

@@ -71,8 +71,16 @@ int check_entry(Findings& findings, const std::string& subject, const Section& s
     checked_value(profile_key(key), value);
     return 0;
   } catch (const Failure& failure) {
-    findings.add(Level::error, subject, failure.what(),
-                 remedy_for(VORN_PATH_CONFIG, section, command + " " + key + " VALUE"));
+    // What to do ends the message, unless the section has to be put right before.
+    constexpr std::string_view kSeparator = "; ";
+    const std::string text = failure.what();
+    const std::size_t at = text.rfind(kSeparator);
+    const std::string set = command + " " + key + " VALUE";
+    const bool is_told =
+        at != std::string::npos && admin::read_section(VORN_PATH_CONFIG, section.name);
+    findings.add(Level::error, subject, text.substr(0, at),
+                 is_told ? text.substr(at + kSeparator.size()) + " (" + set + ")"
+                         : remedy_for(VORN_PATH_CONFIG, section, set));
     return 1;
   }
 }

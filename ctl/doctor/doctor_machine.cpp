@@ -34,7 +34,7 @@ void check_mail(Findings& findings, const Configuration& configuration) {
       findings.ok(subject, "it answers");
     } else {
       findings.add(Level::error, subject, problem,
-                   "start it, or correct smtp_url of profile " + profile.name);
+                   "start it, or run vornctl profile set " + profile.name + " smtp_url URL");
     }
   }
 }

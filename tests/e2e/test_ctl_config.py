@@ -83,6 +83,8 @@ class Shares(ControlTest):
 
     def test_renaming_is_followed_into_profiles(self):
         self.m.share('b')
+        with self.m.shares.open('a') as file:
+            file.write('network = yes\n')
         for name, shares in (('p', 'a, b ,c'), ('q', 'bb')):
             self.m.profile(name, report_list='share_list', share_list=shares)
         self.check(('share', 'set', 'b', '--name', 'new one'),
@@ -90,6 +92,7 @@ class Shares(ControlTest):
         text = self.m.config.read_text()
         self.assertIn('share_list = a,new one,c\n', text)
         self.assertIn('share_list = bb\n', text)
+        self.assertRegex(self.m.shares.read_text(), r'\[new one\]\npath = .*\nnetwork = yes\n$')
 
     @needs_root  # a mount
     def test_two_ways_to_the_same_files(self):
@@ -348,7 +351,7 @@ class Profiles(ControlTest):
             self.assertIn(f'--report {name} ', (self.m.cron / f'vornreport-{name}').read_text())
         self.assertFalse(job.exists() or report.exists())
         self.assertEqual(self.m.status('r'), 'success')
-        self.assertEqual(re.findall(r'\[(.*)\]', self.m.config.read_text()),
+        self.assertEqual(re.findall(r'^\[(.*)\]', self.m.config.read_text(), re.MULTILINE),
                          ['global', 'r', 'q'])
         self.check(('profile', 'remove', 'r', '--reports-too'))
         self.assertEqual(known(), {'p': nothing, 'q': all_of_it, 'r': nothing})

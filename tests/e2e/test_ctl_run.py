@@ -533,7 +533,7 @@ class Doctor(WeeklyTest):
                 ('error', 'profile weekly: .*correct the lines .* that are told above',
                  append(config, 'language = xx\n[weekly]\n')),
                 ('warning', 'share in: shares photos and in hold',
-                 append(shares, f'[in]\npath = {self.m.base}/shares\n')),
+                 append(shares, '[in]\npath = /var/tmp\n')),
                 ('warning', 'last run of weekly: ended early', killed),
                 ('warning', 'leftovers of weekly: ', leftover),
                 ('warning', 'time zone: ', bind('no zone', os.path.realpath('/etc/localtime'))),

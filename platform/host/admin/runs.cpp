@@ -28,8 +28,12 @@ std::string status_file(const std::string& profile) {
   return VORN_PATH_STATUS "/" + profile;
 }
 
+std::string lock_file(const std::string& profile) {
+  return VORN_PATH_STATUS "/." + profile + ".lock";
+}
+
 pid_t holder_of(const std::string& profile) {
-  const auto text = host::read_file(VORN_PATH_STATUS "/." + profile + ".lock", kLargestFile);
+  const auto text = host::read_file(lock_file(profile), kLargestFile);
   pid_t pid = 0;
   if (text) {
     std::from_chars(text->data(), text->data() + text->size(), pid);
@@ -136,6 +140,8 @@ bool forget_runs(const Section& profile) {
 }
 
 bool move_status(const std::string& profile, const std::string& to) {
+  // Who holds it goes on doing so, by the other name; without it only its last run isn't known.
+  std::rename(lock_file(profile).c_str(), lock_file(to).c_str());
   if (std::rename(status_file(profile).c_str(), status_file(to).c_str()) == 0 || errno == ENOENT) {
     return true;
   }
