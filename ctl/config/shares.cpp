@@ -26,17 +26,17 @@ std::string titled(const std::string& name) {
 }
 
 // `path` as it shall stand in the file.
-std::string checked_path(std::string path) {
+std::string checked_path(const std::string& share, std::string path) {
   while (path.size() > 1 && path.ends_with('/')) {
     path.pop_back();
   }
   if (const std::string problem = share_path_problem(path); !problem.empty()) {
-    throw Failure(problem);
+    throw Failure(titled(share) + ": " + problem);
   }
   return path;
 }
 
-std::string checked_file_index(const std::string& path) {
+std::string checked_file_index(const std::string& share, const std::string& path) {
   struct stat status {};
   std::string problem = text_problem(path);
   if (problem.empty() && !path.starts_with('/')) {
@@ -46,7 +46,7 @@ std::string checked_file_index(const std::string& path) {
     problem = "is no file, or a link, which no run follows";
   }
   if (!problem.empty()) {
-    throw Failure("--file-index " + path + " " + problem +
+    throw Failure(titled(share) + ": --file-index " + path + " " + problem +
                   "; give the path of the share's database");
   }
   return path;
@@ -83,20 +83,12 @@ struct NewShare {
   bool network = false;
 };
 
-// The failure that says which share it is of.
-Failure with_title(const std::string& name, const Failure& failure) {
-  const std::string text = failure.what();
-  return text.starts_with("its ") || text.starts_with("--")
-             ? Failure(titled(name) + ": " + text, failure.exit_code())
-             : failure;
-}
-
-void add_share(NewShare share) try {
+void add_share(NewShare share) {
   check_name(share.name);
-  share.path = checked_path(share.path);
+  share.path = checked_path(share.name, share.path);
   Changes entries{{"path", share.path}};
   if (!share.file_index.empty()) {
-    entries.emplace_back("file_index", checked_file_index(share.file_index));
+    entries.emplace_back("file_index", checked_file_index(share.name, share.file_index));
   }
   if (share.network) {
     entries.emplace_back("network", "yes");
@@ -104,8 +96,6 @@ void add_share(NewShare share) try {
   const std::vector<Share> others = read_shares();
   add_section(VORN_PATH_SHARES, share.name, entries);
   warn_of_state({share.name, share.path, {}, share.file_index, share.network}, others);
-} catch (const Failure& failure) {
-  throw with_title(share.name, failure);
 }
 
 constexpr const char* kIndexHelp = "Database that lists the files, not to walk";
@@ -136,7 +126,7 @@ std::pair<std::string, std::optional<std::string>> checked_key(const Section& se
                                                                const std::string& key,
                                                                const std::string& value) {
   if (key == "path") {
-    return {key, checked_path(value)};
+    return {key, checked_path(section.name, value)};
   }
   const std::string name = key == "file-index" ? "file_index" : key;
   if (name != "file_index" && name != "network" && (!value.empty() || !section.find(name))) {
@@ -145,7 +135,8 @@ std::pair<std::string, std::optional<std::string>> checked_key(const Section& se
   if (value.empty()) {
     return {name, std::nullopt};
   }
-  return {name, name == "network" ? checked_network(value) : checked_file_index(value)};
+  return {name,
+          name == "network" ? checked_network(value) : checked_file_index(section.name, value)};
 }
 
 // Lets every profile that names the share call it by its new name.
@@ -167,7 +158,7 @@ void follow(const std::string& name, const std::string& new_name) {
 
 using Pairs = std::vector<std::pair<std::string, std::string>>;
 
-void set_share(const ShareChanges& set, Pairs pairs) try {
+void set_share(const ShareChanges& set, Pairs pairs) {
   std::optional<Section> section = admin::read_section(VORN_PATH_SHARES, set.name);
   if (!section) {
     throw host_failure(titled(set.name) + " is not in " VORN_PATH_SHARES
@@ -204,8 +195,6 @@ void set_share(const ShareChanges& set, Pairs pairs) try {
   if (own != others.end() && !changes.empty()) {
     warn_of_state(Share(*own), others);
   }
-} catch (const Failure& failure) {
-  throw with_title(set.name, failure);
 }
 
 void describe_set(CLI::App& group) {
