@@ -190,11 +190,11 @@ constexpr ProfileKey kKeys[] = {
      false, truth_problem},
     {"keep_reports", "--keep-reports", kNumber, "Number of reports to keep (default: all)", false,
      admin::keep_reports_problem},
-    {"mail_on_failure", nullptr, "true|false", "false sends no mail of a failed run", false,
+    {"mail_on_failure", "--mail-on-failure", kTruth, "false sends no mail of a failed run", false,
      truth_problem},
     {"metrics_file", "--metrics-file", "FILE", "File for Prometheus' node exporter, .../NAME.prom",
      false, admin::metrics_file_problem},
-    {"metrics_users", nullptr, "true|false", "true tells users' quotas there", false,
+    {"metrics_users", "--metrics-users", kTruth, "true tells users' quotas there", false,
      truth_problem},
     {"schedule_collect_id", nullptr, "", "Identifier of the schedule", false, schedule_problem},
 };

@@ -55,10 +55,20 @@ using Words = std::vector<std::string>;
 // The words that give a profile the schedule that `profile` has; none without one.
 Words schedule_words(const std::string& profile) {
   Words words;
-  for (const Job& job : scheduled_jobs()) {
-    if (job.profile == profile) {
-      words.insert(words.end(), {option_of(job.kind), job.times});
+  bool has_timer = false;
+  for (const Job& job : admin::scheduled_jobs()) {
+    if (job.profile != profile) {
+      continue;
     }
+    if (job.times.empty()) {
+      throw Failure("the timer " + job.file + " has times that vornctl doesn't know; run vornctl " +
+                    "schedule " + profile + " --clean first");
+    }
+    words.insert(words.end(), {option_of(job.kind), job.times});
+    has_timer = has_timer || job.by == Scheduler::timer;
+  }
+  if (has_timer) {
+    words.emplace_back("--timer");
   }
   return words;
 }
@@ -95,22 +105,28 @@ void copy_reports(const std::string& folder, const std::string& to) {
   }
 }
 
+constexpr const char* kMetricsKey = "metrics_file";
+
 void copy_profile(const Move& move) {
   const Section profile = checked_profile(move);
   const std::string folder = folder_of_reports(profile);
+  const Words words = move.settings_only ? Words{} : schedule_words(move.profile);
   if (!move.settings_only) {
     copy_reports(folder, folder_beside(folder, move.name));
     copy_history(move);
   }
   Changes entries;
   for (const auto& [key, value] : profile.entries) {
-    if (key != kScheduleKey) {
+    if (key != kScheduleKey && key != kMetricsKey) {
       entries.emplace_back(key, value);
     }
   }
   add_section(VORN_PATH_CONFIG, move.name, entries);
-  const Words words = schedule_words(move.profile);
-  if (!move.settings_only && !words.empty()) {
+  if (profile.find(kMetricsKey) != nullptr) {
+    warn("profile " + move.name + " has no metrics_file, since each needs its own; name one with " +
+         "vornctl profile set");
+  }
+  if (!words.empty()) {
     schedule(move.name, words);
   }
 }
