@@ -21,7 +21,8 @@ std::string folder_of_reports(const admin::Section& profile);
 // The reports in `folder`, oldest first, with their sizes if asked for.
 Reports reports_in(const std::string& folder, ReportSize size);
 
-// The whole report that is called `date`, else the newest one whose name begins so. Throws a Failure when there is none.
+// The whole report that is called `date`, else the newest one whose name begins so. Throws a
+// Failure when there is none.
 const admin::StoredReport& find_report(const std::string& profile, const Reports& reports,
                                        const std::string& date);
 
