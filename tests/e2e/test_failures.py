@@ -109,8 +109,8 @@ class FullDisks(ProductTest):
         return word
 
     def test_every_disk(self):
-        for place, sizes in (('/tmp', range(1, 100, 4)), ('reports', range(1, 150, 7)),
-                             ('/usr/vorn/var/stat', range(1, 40, 4)),
+        for place, sizes in (('/tmp', range(1, 180, 7)), ('reports', range(1, 240, 10)),
+                             ('/usr/vorn/var/stat', range(1, 110, 6)),
                              ('/usr/vorn/var/status', range(1, 9))):
             words = []
             for pages in sizes:
