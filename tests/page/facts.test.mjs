@@ -126,7 +126,7 @@ test('volumes are called by their paths, and say what fills them', async () => {
   await withPage(withFacts(withBlock(page, 'vornShareListData', share), facts({volumes: named})), async view => {
     assert.deepEqual(await textOf(view, '.card h3'), ['/srv/日本', '/']);
     assert.deepEqual((await section(view, 'share_list')).rows, [['s', '1 B', '100%', '/srv/日本']]);
-    assert.ok((await view.locator('.letters.group').allTextContents()).includes('/srv/日本  1 B'));
+    assert.ok((await view.locator('.letters.group').allTextContents()).some(text => text.startsWith('/srv/日本')));
     const [large, small] = (await textOf(view, '.card')).map(text => plain(text).replace(/\s+/g, ' '));
     assert.match(large, /\+7 GiB a week Grew since Oct 15, 2023 Share CAD \+9 GiB Folder CAD\/new\/a \+5 GiB Owner anna \+2 GiB Filled by Share CAD 700 GiB$/);
     assert.match(small, /mostly chen$/);

@@ -22,7 +22,7 @@ async function assertAccessible(page, rules) {
 }
 
 test('axe finds nothing', async t => {
-  await withPage(bare, assertAccessible);
+  await withPage(bare, page => assertAccessible(page));
   for (const [name, text] of Object.entries(PAGES)) {
     for (const [look, options] of Object.entries({light: {}, dark: {colorScheme: 'dark'}, narrow: NARROW})) {
       await t.test(`${name}, ${look}`, () => withPage(text, async page => {

@@ -153,7 +153,7 @@ function firstLook() {
                incidents(facts, written)),
           h('div', {class: volumes.length > MOST_BESIDE ? 'first many' : 'first'},
             part('attention', format.say('attention'), attention(facts, written)),
-            part('volumes', format.say('volumes'), volumes.length ? cards(volumes, finished) : null),
+            part('volumes', format.say('volumes'), volumes.length ? cards(volumes, finished, written) : null),
             part('next', format.say('next'), next(facts, written)),
             part('glance', format.say('glance'), glance(facts, written)))];
 }

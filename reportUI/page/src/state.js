@@ -7,9 +7,6 @@ let anchor = '';
 export function readAddress() {
   const [name, words = ''] = location.hash.slice(1).split(/\?(.*)/s);
   anchor = decodeURIComponent(name);
-  if (words) {
-    state.clear();
-  }
   for (const [key, value] of new URLSearchParams(words)) {
     state.set(key, value);
   }
@@ -22,6 +19,9 @@ function writeAddress() {
 }
 
 export const stateOf = key => state.get(key) ?? '';
+
+// The address of a section with some of that.
+export const addressOf = (section, values) => `#${section}?${new URLSearchParams(values)}`;
 
 // `section`: where the reader is, for the address.
 export function keep(key, value, section = anchor) {

@@ -2,7 +2,7 @@
 // Rows become elements when they are shown.
 import {copyText, copyable, h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
-import {keep, stateOf} from './state.js';
+import {addressOf, keep, stateOf} from './state.js';
 
 const FIRST_ROWS = 10;
 const FEW_MORE = 4;  // rows that are shown rather than asked for
@@ -201,9 +201,8 @@ class Table {
 
   // The address of the table with this row alone.
   linkTo(text) {
-    const words = new URLSearchParams({[this.key]: `!!${text}`});
     return h('a', {class: 'here', tabindex: -1, 'aria-label': format.say('rowLink'),
-                   href: `#${this.key.replace(/\..*/, '')}?${words}`});
+                   href: addressOf(this.key.replace(/\..*/, ''), {[this.key]: `!!${text}`})});
   }
 
   // A button that opens what belongs to a row below it.

@@ -3,6 +3,7 @@ import {sparkline} from './charts.js';
 import {h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
 import {basisTexts, outlookText} from './outlook.js';
+import {addressOf} from './state.js';
 import {barElement, sizeElement} from './table.js';
 
 const MOST_LARGE = 2;  // cards that tell all of a volume
@@ -59,23 +60,32 @@ const KINDS = {
   owner: ['grownOwner', 'M7 1.5a2.6 2.6 0 1 1 0 5.2 2.6 2.6 0 0 1 0-5.2Z M2 12.5c.4-3 2.3-4.3 5-4.3s4.6 1.3 5 4.3']
 };
 
-function causeElement({kind, share, name, bytes}, most, text) {
+// Where more is to be seen of a cause: the folder in the drawing, or the owner's row.
+function wayTo({kind, share, name}, volume, sections) {
+  const section = kind === 'owner' ? 'file_owner' : 'folder_usage';
+  return sections.has(section) ? addressOf(section, kind === 'owner' ? {file_owner: `!!${name}`} : {
+    'folder_usage.place': [volume, share, ...kind === 'share' ? [] : name.split('/')].join('\n')}) : undefined;
+}
+
+function causeElement(cause, most, {text, volume, sections}) {
+  const {kind, share, name, bytes} = cause;
   const [key, shape] = Object.hasOwn(KINDS, kind) ? KINDS[kind] : [kind, KINDS.folder[1]];
   const who = kind === 'share' ? share : kind === 'owner' ? name : `${share}/${name}`;
+  const href = wayTo(cause, volume, sections);
   return h('li', {}, h('span', {class: 'kind', title: format.say(key)}, sign(shape),
                        h('span', {class: 'unseen'}, format.say(key))),
-           barElement(bytes / most * 100, [shown(who), ' ', sizeElement(bytes, null, text(bytes))]));
+           barElement(bytes / most * 100, [h(href ? 'a' : 'span', {href}, shown(who)), ' ', sizeElement(bytes, null, text(bytes))]));
 }
 
-function causes(heading, list, text) {
+function causes(heading, list, way) {
   return list.length ? h('div', {class: 'causes'}, h('h4', {}, heading), h('ul', {}, ...list.map(
-    cause => causeElement(cause, Math.max(...list.map(({bytes}) => bytes)), text)))) : null;
+    cause => causeElement(cause, Math.max(...list.map(({bytes}) => bytes)), way)))) : null;
 }
 
-const because = ({grown_by: grownBy, filled_by: filledBy}) => [
+const because = ({path: volume, grown_by: grownBy, filled_by: filledBy}, sections) => [
   causes(format.say('grewSince', {date: format.day(grownBy?.[0]?.since)}), grownBy ?? [],
-         format.sizeChange),
-  causes(format.say('filledBy'), filledBy, format.size)].filter(Boolean);
+         {text: format.sizeChange, volume, sections}),
+  causes(format.say('filledBy'), filledBy, {text: format.size, volume, sections})].filter(Boolean);
 
 // In one line: the greatest of them.
 function mainCause({grown_by: grownBy}) {
@@ -95,12 +105,12 @@ function drawing(volume, now, width, height) {
     width, height, now, size, forecast, level, limit: forecast.state === 'growing'}) : null;
 }
 
-function largeCard(volume, now) {
+function largeCard(volume, now, sections) {
   return h('article', {class: `card large ${volume.level}`},
            h('div', {class: 'says'}, title(volume), outlook(volume, true), ...basis(volume)),
            h('div', {class: 'shape'}, drawing(volume, now, 400, 104)),
            h('div', {class: 'holds'}, share(volume), meter(volume), usage(volume), pace(volume)),
-           ...because(volume));
+           ...because(volume, sections));
 }
 
 function smallCard(volume, now) {
@@ -110,10 +120,10 @@ function smallCard(volume, now) {
            h('div', {class: 'line'}, pace(volume), mainCause(volume)));
 }
 
-// The most pressing first, and these at length.
-export function cards(volumes, now) {
+// The most pressing first, and these at length. `sections`: names of those that the page has.
+export function cards(volumes, now, sections) {
   const pressing = volumes.filter(({level}) => level !== 'ok').length;
   const large = Math.max(1, Math.min(MOST_LARGE, pressing));
   return h('div', {class: 'cards'}, ...volumes.map(
-    (volume, i) => i < large ? largeCard(volume, now) : smallCard(volume, now)));
+    (volume, i) => i < large ? largeCard(volume, now, sections) : smallCard(volume, now)));
 }
