@@ -15,7 +15,9 @@ export function readAddress() {
 
 function writeAddress() {
   const words = new URLSearchParams([...state].filter(([, value]) => value)).toString();
-  history.replaceState(null, '', `#${encodeURIComponent(anchor)}${words && `?${words}`}`);
+  try {
+    history.replaceState(null, '', `#${encodeURIComponent(anchor)}${words && `?${words}`}`);
+  } catch { /* where a page may have no address, as in a viewer's frame */ }
 }
 
 export const stateOf = key => state.get(key) ?? '';
