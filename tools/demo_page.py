@@ -20,7 +20,7 @@ GIB, DAY = 1 << 30, 86400
 TYPES = ('video', 'image', 'disk_image', 'archive', 'document', 'database', 'backup', 'drawing',
          'source', 'audio', 'log', 'spreadsheet', 'temporary', 'other')
 AGES = ('0-7', '7-30', '30-90', '90-365', '365-1095', '1095-1825', '1825-')
-AGE_BOUNDS = (7, 30, 90, 365, 1095, 1825)
+AGE_PARTS = (.06, .09, .14, .24, .27, .12, .08)  # of all bytes
 ENDINGS = {'Engineering': 'iso qcow2 zip log', 'Marketing': 'psd pptx mp4', 'CAD': 'dwg step stl',
            'Videos': 'mov mkv mp4', 'Photos': 'raw jpg tif', 'Backups': 'bak vmdk tar'}
 WORDS = ('annual', 'budget', 'draft', 'final', 'release', 'survey', 'team', 'scan', 'build', 'render',
@@ -92,7 +92,8 @@ class Model:
         words = self.choice.sample(WORDS, 3)
         ending = self.choice.choice(ENDINGS.get(share, 'pdf docx zip xlsx db').split())
         path = next(path for name, path, *_ in self.shares if name == share)
-        return f'{path}/{share}/{words[0]} {self.choice.randint(2016, 2026)}/{words[1]}-{words[2]}-{self.choice.randint(1, 99)}.{ending}'
+        year, number = self.choice.randint(2016, 2026), self.choice.randint(1, 99)
+        return f'{path}/{share}/{words[0]} {year}/{words[1]}-{words[2]}-{number}.{ending}'
 
 
 def quoted(text):
@@ -109,8 +110,12 @@ def tables_of(tables):
 
 
 def grown(model, month):
-    return {name: {'since': model.now - days * DAY, 'files': month // days_part, 'bytes': month * days // 30}
-            for name, days, days_part in (('last', 1, 90 << 20), ('week', 7, 20 << 20), ('month', 30, 5 << 20))}
+    """Growth since each earlier report, of something that grows by so many bytes a month."""
+    def since(days, bytes_a_file):
+        return {'since': model.now - days * DAY, 'files': month // bytes_a_file,
+                'bytes': month * days // 30}
+    return {'last': since(1, 90 << 20), 'week': since(7, 20 << 20),
+            'month': since(30, 5 << 20)} if model.has_history else None
 
 
 def forecast(model, path):
@@ -149,124 +154,192 @@ def volume_facts(model, path):
                  'since': model.now - 30 * DAY} for kind, share, name, amount in
                 sorted(found, key=lambda each: -each[3])[:5] if amount > 0]
     total, held = size * GIB, int(size * used * GIB)
+    samples = (model.samples(held, growth * GIB, size * GIB * .0015, jump * GIB)
+               if model.has_history else [[model.now, held]])
     return {'id': path, 'path': path, 'size': total, 'used': held, 'free': total - held,
             'percent': held / total * 100, 'level': level, 'forecast': outlook,
-            'samples': model.samples(held, growth * GIB, size * GIB * .0015, jump * GIB) if model.has_history
-            else [[model.now, held]],
+            'samples': samples,
             'explained': explained, 'outside': held - explained, 'filled_by': largest(filled),
             'grown_by': largest(causes) if model.has_history else None}
 
 
-def facts_of(model, kind):
-    volumes = sorted((volume_facts(model, path) for path in model.volumes), key=lambda volume: (
-        {'critical': 0, 'warning': 1, 'ok': 2}[volume['level']], volume['forecast']['days'] or 1e9))
-    shares = sorted(({
-        'name': name, 'path': f'{path}/{name}', 'volume': path, 'files': files, 'folders': files // 14,
-        'bytes': bytes_, 'allocated': bytes_, 'unreadable': 0, 'other': 2, 'whole': True, 'index': False,
-        'grown': grown(model, month) if model.has_history else None,
-        'samples': model.samples(bytes_, month / 30, abs(month) / 40)} for name, path, bytes_, files, month in
-        model.shares), key=lambda share: -share['bytes'])
-    owners, types = {}, {}
-    for share in shares:
-        for table, names, key in ((owners, model.choice.sample(model.people, min(len(model.people), 9)), 'places'),
-                                  (types, model.choice.sample(TYPES, 9), 'shares')):
-            for name, part in model.parts(share['bytes'], names):
-                table.setdefault(name, []).append({'share': share['name'], 'volume': share['volume'],
-                                                   'files': part >> 23, 'bytes': part})
+def share_facts(model):
+    return sorted(({'name': name, 'path': f'{path}/{name}', 'volume': path, 'files': files,
+                    'folders': files // 14, 'bytes': bytes_, 'allocated': bytes_, 'unreadable': 0,
+                    'other': 2, 'whole': True, 'index': False, 'grown': grown(model, month),
+                    'samples': model.samples(bytes_, month / 30, abs(month) / 40)}
+                   for name, path, bytes_, files, month in model.shares),
+                  key=lambda share: -share['bytes'])
 
-    def summed(table, key, name_key):
-        return sorted(({name_key: name, 'files': sum(place['files'] for place in places),
-                        'bytes': sum(place['bytes'] for place in places),
-                        'grown': grown(model, sum(place['bytes'] for place in places) // 60) if model.has_history else None,
-                        key: sorted(places, key=lambda place: -place['bytes'])}
-                       for name, places in table.items()), key=lambda each: -each['bytes'])
-    owner_list = summed(owners, 'places', 'name')
-    type_list = [{**each, 'type': f"reportUI_file_type_{each['type']}"} for each in summed(types, 'shares', 'type')]
-    total = sum(share['bytes'] for share in shares)
-    ages = [{'age': age, 'files': part >> 22, 'bytes': part} for age, part in zip(
-        AGES, (int(total * weight) for weight in (.06, .09, .14, .24, .27, .12, .08)))]
-    attention = []
+
+def split_shares(model, shares, names, called, places_called):
+    """What is in the shares, split among nine of `names` in each: records by size."""
+    places = {}
+    for share in shares:
+        for name, part in model.parts(share['bytes'], model.choice.sample(names, min(len(names), 9))):
+            places.setdefault(name, []).append({'share': share['name'], 'volume': share['volume'],
+                                                'files': part >> 23, 'bytes': part})
+    records = []
+    for name, found in places.items():
+        total = sum(place['bytes'] for place in found)
+        records.append({called: name, 'files': sum(place['files'] for place in found), 'bytes': total,
+                        'grown': grown(model, total // 60),
+                        places_called: sorted(found, key=lambda place: -place['bytes'])})
+    return sorted(records, key=lambda record: -record['bytes'])
+
+
+def quota_facts(model):
+    users = zip(model.people, (120, 60, 200, 80, 100, 50), (1.08, .94, .72, .6, .41, .12))
+    return [{'volume': list(model.volumes)[-2], 'user': name, 'used': int(quota * share * GIB),
+             'quota': quota * GIB, 'percent': share * 100, 'forecast': None,
+             'level': 'critical' if share > 1 else 'warning' if share >= .9 else 'ok'}
+            for name, quota, share in users]
+
+
+def attention_of(model, facts):
+    found = []
 
     def tell(level, code, section, **values):
-        attention.append({'level': level, 'code': code, 'section': section, 'values': values})
-    for volume in volumes:
-        outlook = volume['forecast']
-        if volume['level'] != 'ok' and outlook['days'] is not None:
-            tell(volume['level'], 'volume_fills', 'volume_usage', volume=volume['path'], days=outlook['days'],
-                 days_low=outlook['days_low'], days_high=outlook['days_high'], percent=volume['percent'],
-                 free=volume['free'], window=30)
+        found.append({'level': level, 'code': code, 'section': section, 'values': values})
+    for volume in facts['volumes']:
+        same = {'volume': volume['path'], 'percent': volume['percent'], 'free': volume['free']}
+        days = {key: volume['forecast'][key] for key in ('days', 'days_low', 'days_high', 'window')}
+        if volume['level'] != 'ok' and days['days'] is not None:
+            tell(volume['level'], 'volume_fills', 'volume_usage', **same, **days)
         elif volume['level'] != 'ok':
-            tell(volume['level'], 'volume_used', 'volume_usage', volume=volume['path'],
-                 percent=volume['percent'], free=volume['free'])
-    quotas = [] if kind == 'tiny' else [
-        {'volume': list(model.volumes)[-2], 'user': name, 'used': int(quota * share * GIB), 'quota': quota * GIB,
-         'percent': share * 100, 'level': 'critical' if share > 1 else 'warning' if share >= .9 else 'ok',
-         'forecast': None} for name, quota, share in zip(model.people, (120, 60, 200, 80, 100, 50), (1.08, .94, .72, .6, .41, .12))]
-    for user in quotas[:2]:
-        tell(user['level'], 'quota_over' if user['percent'] > 100 else 'quota_near', 'quota_usage', user=user['user'],
-             volume=user['volume'], used=user['used'], quota=user['quota'], percent=user['percent'])
-    attention.sort(key=lambda each: each['level'] != 'critical')
-    for volume in volumes:
-        if volume['grown_by']:
-            cause = volume['grown_by'][0]
-            tell('ok', 'volume_grew_in', 'growth', volume=volume['path'], bytes=cause['bytes'] * 4 // 3,
-                 date=model.now - 30 * DAY, place=cause['share'])
-    tell('ok', 'share_largest', 'share_list', share=shares[0]['name'], bytes=shares[0]['bytes'])
-    tell('ok', 'owner_most', 'file_owner', owner=owner_list[0]['name'], bytes=owner_list[0]['bytes'])
-    if kind != 'tiny':
-        tell('ok', 'duplicates_possible', 'duplicate_file', bytes=412 * GIB, groups=1873)
+            tell(volume['level'], 'volume_used', 'volume_usage', **same)
+    for user in facts['quotas'][:2]:
+        tell(user['level'], 'quota_over' if user['percent'] > 100 else 'quota_near', 'quota_usage',
+             **{key: user[key] for key in ('user', 'volume', 'used', 'quota', 'percent')})
+    found.sort(key=lambda each: each['level'] != 'critical')
+    for volume in facts['volumes']:
+        for cause in (volume['grown_by'] or [])[:1]:
+            tell('ok', 'volume_grew_in', 'growth', volume=volume['path'], place=cause['share'],
+                 bytes=cause['bytes'] * 4 // 3, date=model.now - 30 * DAY)
+    share, owner = facts['shares'][0], facts['owners'][0]
+    tell('ok', 'share_largest', 'share_list', share=share['name'], bytes=share['bytes'])
+    tell('ok', 'owner_most', 'file_owner', owner=owner['name'], bytes=owner['bytes'])
+    if facts['duplicates']['groups']:
+        tell('ok', 'duplicates_possible', 'duplicate_file', groups=facts['duplicates']['groups'],
+             bytes=facts['duplicates']['reclaimable'])
     tell('ok', 'data_oldest', 'least_modify', date=model.now - 5400 * DAY, file='minutes 2011/plan.dwg')
-    incidents = [] if kind != 'damaged' else [
-        {'level': 'error', 'kind': 'share_missing', 'what': 'Finance',
-         'text': 'The folder /srv/home/Finance is not there: mount it, or remove the share from share.conf.'},
-        {'level': 'warning', 'kind': 'share_part', 'what': 'Users: 17', 'text': 'Folders could not be read: permission denied.'},
-        {'level': 'error', 'kind': 'report_failed', 'what': 'large_file', 'text': 'The rows of the report could not be written.'}]
-    return {'format': 1, 'host': 'files', 'profile': 'weekly', 'time_zone': 'Europe/Berlin', 'language': 'en',
-            'started': model.now - 1840, 'finished': model.now, 'complete': kind != 'damaged', 'incidents': incidents,
-            'volumes': volumes, 'shares': shares, 'owners': owner_list, 'types': type_list, 'ages': ages,
-            'quotas': quotas, 'duplicates': {'mode': 'name', 'groups': 1873, 'files': 4201,
-                                             'reclaimable': 412 * GIB if kind != 'tiny' else 0},
-            'attention': attention, 'reports': []}
+    return found
+
+
+INCIDENTS = [
+    ('error', 'share_missing', 'Finance',
+     'The folder /srv/home/Finance is not there: mount it, or remove the share from share.conf.'),
+    ('warning', 'share_part', 'Users: 17', 'Folders could not be read: permission denied.'),
+    ('error', 'report_failed', 'large_file', 'The rows of the report could not be written.')]
+
+
+def facts_of(model, kind):
+    shares = share_facts(model)
+    order = {'critical': 0, 'warning': 1, 'ok': 2}
+    types = split_shares(model, shares, TYPES, 'type', 'shares')
+    for record in types:
+        record['type'] = f"reportUI_file_type_{record['type']}"
+    total = sum(share['bytes'] for share in shares)
+    facts = {
+        'format': 1, 'host': 'files', 'profile': 'weekly', 'time_zone': 'Europe/Berlin',
+        'language': 'en', 'started': model.now - 1840, 'finished': model.now,
+        'complete': kind != 'damaged',
+        'incidents': [dict(zip(('level', 'kind', 'what', 'text'), each)) for each in INCIDENTS]
+        if kind == 'damaged' else [],
+        'volumes': sorted((volume_facts(model, path) for path in model.volumes), key=lambda volume: (
+            order[volume['level']], volume['forecast']['days'] or 1e9)),
+        'shares': shares, 'owners': split_shares(model, shares, model.people, 'name', 'places'),
+        'types': types,
+        'ages': [{'age': age, 'files': int(total * part) >> 22, 'bytes': int(total * part)}
+                 for age, part in zip(AGES, AGE_PARTS)],
+        'quotas': [] if kind == 'tiny' else quota_facts(model),
+        'duplicates': {'mode': 'name', 'groups': 0, 'files': 0, 'reclaimable': 0} if kind == 'tiny'
+        else {'mode': 'name', 'groups': 1873, 'files': 4201, 'reclaimable': 412 * GIB},
+        'reports': []}
+    facts['attention'] = attention_of(model, facts)
+    return facts
+
+
+# --- The blocks ---------------------------------------------------------------------------------
+
+def files_of(model, facts, size, days):
+    """Rows of share, path, bytes and time; `size` and `days` of the n-th."""
+    names = [share['name'] for share in facts['shares']]
+    chosen = model.choice.choices(names, k=200 if len(names) > 1 else 8)
+    return [(share, model.file(share), size(n), int(model.now - days(n) * DAY))
+            for n, share in enumerate(chosen)]
+
+
+def copies_of(large):
+    """Groups of two and three of the large files, each much smaller."""
+    return [(n + 1, share, f'{Path(path).parent}/{where}{Path(path).name}', size // 40, changed)
+            for n, (share, path, size, changed) in enumerate(large)
+            for where in ('', 'copy/', 'old/')[:2 + n % 2]]
+
+
+def changes_of(model, facts):
+    """Rows of the growth report."""
+    rows = []
+    for since, part in (('last', 30), ('week', 4), ('month', 1)) if model.has_history else ():
+        for kind, key, records in (('share', 'name', facts['shares']), ('owner', 'name', facts['owners']),
+                                   ('type', 'type', facts['types'])):
+            for record in records:
+                place = (record[key], '') if kind == 'share' else ('', record[key])
+                change = record['grown'][since]
+                rows.append((since, kind, *place, change['files'], change['bytes']))
+        rows += [(since, 'folder', share, folder, files // 9,
+                  int(bytes_ * model.choice.uniform(-.03, .09)) // part)
+                 for share, folder, bytes_, files, _ in model.folders[:60] if folder != '.']
+    return rows
+
+
+def ages_of(model, facts):
+    return [(share['name'], age, share['files'] // 7, int(share['bytes'] * part))
+            for share in facts['shares']
+            for age, part in zip(AGES, model.choice.sample(AGE_PARTS, len(AGE_PARTS)))]
+
+
+def quotas_of(model, facts):
+    """Of the first volume with quotas: user, quota, used, percent."""
+    def row(name):
+        return (quoted(name), str(model.choice.randrange(2) * 50 * GIB),
+                str(model.choice.randrange(80 * GIB)), f'{model.choice.randrange(120)}.0')
+    return {user['volume']: [row(name) for name in model.people[:100]] for user in facts['quotas'][:1]}
+
+
+def types_of(model, facts):
+    """All files' types, cut as the page is, and those of some owners."""
+    tables = {'vornAll': [(quoted(each['type']), quoted(place['share']), str(place['bytes']))
+                          for each in facts['types'] for place in each['shares']][:100]}
+    for owner in facts['owners'][:len(PEOPLE)]:
+        share = quoted(owner['places'][0]['share'])
+        tables[owner['name']] = [(quoted(f'reportUI_file_type_{name}'), share, str(part))
+                                 for name, part in model.parts(owner['bytes'], TYPES[:8])]
+    return tables
 
 
 def blocks_of(model, facts):
-    """Each report's block: name, text behind `var NAME = `, rows in all."""
-    few = len(facts['shares']) < 2
+    """Each report's block behind `var NAME = `; None for one without rows."""
     choice = model.choice
-
-    def files(count, size, days):
-        return [(share, model.file(share), size(i), int(model.now - days(i) * DAY)) for i, share in enumerate(
-            choice.choices([share['name'] for share in facts['shares']], k=8 if few else count))]
-    large = files(200, lambda i: int(900 * GIB * .96 ** i), lambda i: choice.expovariate(.004))
-    old = files(200, lambda i: int(choice.paretovariate(.5) * (1 << 20)) % (300 * GIB), lambda i: 5400 - i * 9)
-    new = files(200, lambda i: int(choice.paretovariate(.6) * (1 << 18)) % (80 * GIB), lambda i: i * .03)
-    groups = [(str(n + 1), share, f'{Path(path).parent}/{where}{Path(path).name}', size // 40, time_)
-              for n, (share, path, size, time_) in enumerate(large[:200]) for where in ('', 'copy/', 'old/')[:2 + n % 2]]
-    changes = []
-    for since in ('last', 'week', 'month') if model.has_history else ():
-        for kind, key, source in (('share', 'name', 'shares'), ('owner', 'name', 'owners'), ('type', 'type', 'types')):
-            changes += [(since, kind, '' if kind != 'share' else each[key], '' if kind == 'share' else each[key],
-                         each['grown'][since]['files'], each['grown'][since]['bytes']) for each in facts[source]]
-        part = {'last': 30, 'week': 4, 'month': 1}[since]
-        changes += [(since, 'folder', share, folder, files_ // 9, int(bytes_ * choice.uniform(-.03, .09)) // part)
-                    for share, folder, bytes_, files_, _ in model.folders[:60] if folder != '.']
-    ages = [(share['name'], age, share['files'] // 7, int(share['bytes'] * part)) for share in facts['shares'] for age, part in
-            zip(AGES, sorted((.04, .09, .14, .24, .27, .14, .08), key=lambda _: choice.random()))]
-    quotas = {user['volume']: [f"['{one}', {choice.randrange(2) * 50 * GIB}, {choice.randrange(80 * GIB)}, {choice.randrange(120)}.0]"[1:-1].split(', ')
-                               for one in model.people[:100]] for user in facts['quotas'][:1]}
-    types = {'vornAll': [[quoted(each['type']), quoted(place['share']), str(place['bytes'])] for each in facts['types'] for place in each['shares']][:100],
-             **{owner['name']: [[quoted(f'reportUI_file_type_{name}'), quoted(owner['places'][0]['share']), str(part)] for name, part in
-                                model.parts(owner['bytes'], TYPES[:8])] for owner in facts['owners'][:len(PEOPLE)]}}
-    return {
-        'quota_usage': tables_of(quotas) if quotas else None,
-        'file_owner': rows_of([(owner['name'], place['share'], place['files'], place['bytes']) for owner in facts['owners'] for place in owner['places']]),
-        'volume_usage': rows_of([(v['id'], v['used'], v['free'], f"{v['percent']:.1f}%", v['forecast']['days'] or '') for v in facts['volumes']]),
-        'share_list': rows_of([(share['name'], share['volume'], share['bytes']) for share in facts['shares']]),
-        'file_group': tables_of(types), 'duplicate_file': None if few else rows_of(groups),
-        'large_file': rows_of([row[:3] for row in large]), 'least_modify': rows_of(old), 'most_modify': rows_of(new),
-        'folder_usage': rows_of(model.folders), 'file_age': rows_of(ages),
-        'growth': rows_of(changes) if changes else None,
-        'coverage': rows_of([(share['volume'], share['name'], share['files'], share['bytes'], share['allocated'], 0, 2) for share in facts['shares']])}
+    large = files_of(model, facts, lambda n: int(900 * GIB * .96 ** n), lambda n: choice.expovariate(.004))
+    rows = {
+        'file_owner': [(owner['name'], place['share'], place['files'], place['bytes'])
+                       for owner in facts['owners'] for place in owner['places']],
+        'volume_usage': [(volume['id'], volume['used'], volume['free'], f"{volume['percent']:.1f}%",
+                          volume['forecast']['days'] or '') for volume in facts['volumes']],
+        'share_list': [(share['name'], share['volume'], share['bytes']) for share in facts['shares']],
+        'duplicate_file': copies_of(large) if facts['duplicates']['groups'] else [],
+        'large_file': [row[:3] for row in large],
+        'least_modify': files_of(model, facts, lambda n: int(choice.paretovariate(.5) * 2 ** 20) % (300 * GIB),
+                                 lambda n: 5400 - n * 9),
+        'most_modify': files_of(model, facts, lambda n: int(choice.paretovariate(.6) * 2 ** 18) % (80 * GIB),
+                                lambda n: n * .03),
+        'folder_usage': model.folders, 'file_age': ages_of(model, facts), 'growth': changes_of(model, facts),
+        'coverage': [(share['volume'], share['name'], share['files'], share['bytes'], share['allocated'], 0, 2)
+                     for share in facts['shares']]}
+    tables = {'quota_usage': quotas_of(model, facts), 'file_group': types_of(model, facts)}
+    return {name: rows_of(found) if found else None for name, found in rows.items()} | {
+        name: tables_of(found) if found else None for name, found in tables.items()}
 
 
 def write_page(folder, facts, blocks, build, language):
@@ -275,8 +348,10 @@ def write_page(folder, facts, blocks, build, language):
         text = blocks[report['name']] or ''
         shown = text.count('\n[')
         limit = report['page_limit'] or None
-        facts['reports'].append({'name': report['name'], 'rows': 10000 if limit and shown >= limit else shown, 'shown': shown,
-                                 'limit': limit, 'csv': f"csv/{report['name']}.csv" if report['has_csv_rows'] else None, 'ok': True})
+        facts['reports'].append({
+            'name': report['name'], 'rows': 10000 if limit and shown >= limit else shown, 'shown': shown,
+            'limit': limit, 'csv': f"csv/{report['name']}.csv" if report['has_csv_rows'] else None,
+            'ok': True})
     folder.mkdir(parents=True, exist_ok=True)
     with tempfile.TemporaryDirectory() as work:
         script = Path(work, 'build-template.sh')
@@ -290,12 +365,12 @@ def write_page(folder, facts, blocks, build, language):
             subprocess.run([script, *words], check=True)
         call('header', head)
         call('lang', head, language)
-        lines = json.dumps(facts).replace('<', '\\u003c')
+        facts_line = json.dumps(facts).replace('<', '\\u003c')
+        texts = [(report['variable'], blocks[report['name']]) for report in formats['reports']]
         with head.open('a') as file:
-            for report in formats['reports']:
-                if blocks[report['name']]:
-                    file.write(f"<script type='text/javascript'>\nvar {report['variable']} = {blocks[report['name']]}</script>\n")
-            file.write(f"<script type='text/javascript'>\nvar {formats['facts_variable']} = {lines};\n</script>\n")
+            for variable, text in [*texts, (formats['facts_variable'], f'{facts_line};\n')]:
+                if text:
+                    file.write(f"<script type='text/javascript'>\nvar {variable} = {text}</script>\n")
         call('header', head, 'volume_usage')
         call('body', body)
         for report in formats['reports']:
