@@ -2,7 +2,8 @@
 import assert from 'node:assert/strict';
 import test from 'node:test';
 
-import {fileOf, read, section, serve, withPage} from './browser.mjs';
+import {fileOf, read, section, serve, withBlock, withPage} from './browser.mjs';
+import {facts, volume, withFacts} from './facts.mjs';
 
 const names = JSON.parse(read('', 'names.json'));  // path, and how it is to be shown
 
@@ -25,6 +26,17 @@ test('names are shown exactly and do nothing', () => withPage(fileOf('hostile'),
   assert.deepEqual((await section(page, 'share_list')).rows.map(row => row[0]), ['big & small', 'docs']);
   assert.deepEqual((await section(page, 'file_group')).captions, ['File types', 'All files', 'john-doe', '007']);
   assert.equal((await section(page, 'duplicate_file')).heading, 'Confirmed duplicates (same content)');
+}));
+
+// Bytes that are no UTF-8 stand in the address as they are.
+test('a folder of any name can be gone into, and has an address', () => withPage(withFacts(withBlock(
+  read('hostile'), 'vornFolderUsageData', `[\n${['.', 'a ?#%\\udcff', 'a ?#%\\udcff/b'].map(
+    (folder, i) => `[ 's', '${folder}', '${9 - i}', '1', '1700000000' ]`).join(',\n')}\n];\n</script>\n`), facts({
+  volumes: [volume('/x', 9)], shares: [{name: 's', path: '/x/s', volume: '/x', files: 1, bytes: 9, samples: []}]})), async page => {
+  await page.locator('.box.way', {hasText: 's: 9'}).press('Enter');
+  await page.locator('.box.way', {hasText: 'a ?#%'}).press('Enter');
+  assert.equal(await page.locator('.go').getAttribute('href'), 'file:///x/s/a%20%3F%23%25%ff');
+  assert.equal(await page.locator('.trail .chip').innerText(), '\\xff');
 }));
 
 test('the clipboard gets the names themselves', () => withClipboard('hostile', async (page, clipboard) => {

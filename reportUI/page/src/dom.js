@@ -56,6 +56,11 @@ export function copyable(text) {
     /\p{Cs}/gu, codeName)}'`;
 }
 
+// The address of a file or folder, bytes that are no UTF-8 included.
+export const fileAddress = path => `file://${path.split(/(\p{Cs})/u).map((piece, index) =>
+  index % 2 === 0 ? encodeURIComponent(piece).replaceAll('%2F', '/') :
+    BYTE.test(piece) ? `%${(piece.charCodeAt(0) - 0xdc00).toString(16)}` : '%EF%BF%BD').join('')}`;
+
 export async function copyText(text) {
   try {
     await navigator.clipboard.writeText(text);

@@ -3,7 +3,7 @@
 import {hierarchy, treemap} from 'd3-hierarchy';
 
 import {drawnIn, fit, fitWhole, legend} from './charts.js';
-import {h, shown, shownPlain, svg} from './dom.js';
+import {fileAddress, h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
 import {keep, stateOf} from './state.js';
 import {ageName, copyButton, table} from './table.js';
@@ -141,7 +141,6 @@ class Treemap {
         this.way.push(next);
       }
     }
-    // Where it presses most is what a reader wants to see.
     if (!stateOf(key)) {
       this.way.push(...tree.children.filter(({name}) => tree.children.length === 1 || name === first));
     }
@@ -164,8 +163,7 @@ class Treemap {
       return [button, ' › '];
     }), ' ', h('span', {class: 'amount'}, last.bytes === undefined ? '' : format.size(last.bytes)),
     ...last.path ? [copyButton(last.path), ...location.protocol === 'file:' ? [
-      h('a', {class: 'go', href: `file://${encodeURI(last.path).replace(/[?#]/g, encodeURIComponent)}`},
-        format.say('openFolder'))] : []] : []);
+      h('a', {class: 'go', href: fileAddress(last.path)}, format.say('openFolder'))] : []] : []);
     this.chosen.textContent = format.say('treemapHelp');
     if (this.width) {
       this.draw(this.width);
@@ -196,8 +194,8 @@ class Treemap {
     const {root, height} = layOut(this.way.at(-1), width);
     const drawing = svg('svg', {class: 'treemap', viewBox: `0 0 ${width} ${height}`, role: 'group',
                                 'aria-label': format.nameOf('reports', 'folder_usage')});
-    const boxes = root.descendants().filter(box => box.depth && box.x1 - box.x0 >= LEAST && box.y1 - box.y0 >= LEAST)
-      .slice(0, MOST_BOXES);
+    const boxes = root.descendants().filter(({depth, x0, x1, y0, y1}) =>
+      depth && x1 - x0 >= LEAST && y1 - y0 >= LEAST).slice(0, MOST_BOXES);
     for (const box of boxes) {
       const parts = this.box(box, root.value);
       drawing.append(...parts);
@@ -216,12 +214,14 @@ class Treemap {
     const age = data.newest ? ` · ${format.nameOf('columns', 'newest')}: ${format.day(data.newest)}` : '';
     const label = format.say('selected', {name: plain, size, percent: format.percent(value / total * 100)}) + age;
     const number = ageClass(data.newest ?? 0, this.now);
-    const kind = ['free', 'outside'].includes(data.kind) ? data.kind : children ? 'group' : number < 0 ? 'noage' : `age${number}`;
-    const element = svg('g', {class: `box ${kind}${canEnter(data) ? ' way' : ''}`, role: canEnter(data) ? 'button' : 'img',
-                              tabindex: -1, 'aria-label': label, transform: `translate(${x0},${y0})`},
+    const kind = ['free', 'outside'].includes(data.kind) ? data.kind : children ? 'group' :
+      number < 0 ? 'noage' : `age${number}`;
+    const transform = `translate(${x0},${y0})`;
+    const element = svg('g', {class: `box ${kind}${canEnter(data) ? ' way' : ''}`, transform, tabindex: -1,
+                              role: canEnter(data) ? 'button' : 'img', 'aria-label': label},
                         svg('title', {}, label), svg('rect', {width, height, rx: 2}));
     // Letters stand beside the button, whose label says more than there is room for.
-    const letters = svg('g', {class: `letters ${kind}`, 'aria-hidden': 'true', transform: `translate(${x0},${y0})`});
+    const letters = svg('g', {class: `letters ${kind}`, transform, 'aria-hidden': 'true'});
     if (children) {
       const both = `${plain}  ${size}`;
       letters.append(svg('text', {x: 4, y: 14}, fitWhole(both, width - 8) || fit(plain, width - 8)));
@@ -289,8 +289,13 @@ export function folders(rows, shareRows, facts, {heading, csv}) {
       ([share, folder, bytes, files, newest]) => [[share, folder], bytes, files, newest]);
     place.replaceChildren(table(COLUMNS, lines, {key: 'folder_usage', caption: heading, csv, sorted: 1}));
   };
-  return tree.children.length && tree.children.some(({bytes}) => bytes > 0) ?
-    [new Treemap(tree, {now, first: facts?.shares && facts.volumes[0]?.path, key: 'folder_usage.place', entered: list}).element, place] : (list(tree), [place]);
+  if (!tree.children.some(({bytes}) => bytes > 0)) {
+    list(tree);
+    return [place];
+  }
+  // Where it presses most is what a reader wants to see.
+  const first = facts?.shares && facts.volumes[0]?.path;
+  return [new Treemap(tree, {now, first, key: 'folder_usage.place', entered: list}).element, place];
 }
 
 // The drawing of the shares alone, where nothing is known of folders.

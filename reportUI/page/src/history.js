@@ -115,9 +115,11 @@ class Chart {
 
   // `wall`: milliseconds of the server's clock. The words for the point.
   point(wall) {
-    const found = wall === undefined ? this.points.at(-1) : this.points.reduce((best, each) =>
-      Math.abs(format.wallClock(each.date) - wall) < Math.abs(format.wallClock(best.date) - wall) ? each : best);
-    this.said.textContent = `${wall === undefined ? '' : `${format.day(found.date)}: `}${format.percent(found.percent)}`;
+    const distance = ({date}) => Math.abs(format.wallClock(date) - wall);
+    const found = wall === undefined ? this.points.at(-1) : this.points.reduce(
+      (best, each) => distance(each) < distance(best) ? each : best);
+    const day = wall === undefined ? '' : `${format.day(found.date)}: `;
+    this.said.textContent = day + format.percent(found.percent);
     this.drawn?.point(found);
     return `${shownPlain(this.path)} ${format.percent(found.percent)}`;
   }

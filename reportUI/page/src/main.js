@@ -182,6 +182,16 @@ function watchPlaces() {
   main.querySelectorAll('section').forEach(section => seen.observe(section));
 }
 
+// A section that can't be drawn takes none of the others along.
+function fillOrSay(name, about) {
+  try {
+    fillSection(written.get(name), name, about);
+  } catch (error) {
+    console.error(error);
+    written.get(name).append(h('p', {class: 'note'}, format.say('unknown')));
+  }
+}
+
 const pause = () => new Promise(resolve => setTimeout(resolve));
 let turn = 0;
 
@@ -213,8 +223,7 @@ async function render() {
     if (mine !== turn) {
       return;
     }
-    fillSection(written.get(name), name, {data: read(name), facts, emptyReports: empty,
-                                          mark: marks.get(name), others});
+    fillOrSay(name, {data: read(name), facts, emptyReports: empty, mark: marks.get(name), others});
   }
   watchPlaces();
   document.body.dataset.ready = '';
@@ -264,8 +273,9 @@ document.addEventListener('click', ({target}) => target.closest('.long')?.classL
 const renderAt = id => render().then(() => id && document.getElementById(id)?.scrollIntoView());
 const place = readAddress();
 window.addEventListener('hashchange', () => {
-  if (followAnchor()) {
-    renderAt(decodeURIComponent(location.hash.slice(1).replace(/\?.*/s, '')));
+  const id = followAnchor();
+  if (id) {
+    renderAt(id);
   }
 });
 renderAt(place);

@@ -58,8 +58,9 @@ export function owners(rows, facts, {heading, csv}) {
       name, String(bytes), String(files), ...grows ? [String(grown?.week?.bytes ?? ''),
         String(grown?.month?.bytes ?? '')] : []]), 1);
   const named = new Map(all.map(owner => [owner.name, owner]));
+  const isOnVolumes = all.some(({places}) => places.some(({volume}) => volume));
   return [table(columns, lines, {key: 'file_owner', caption: heading, csv, sorted: 1,
                                  detail: ([name]) => placesTable(named.get(name))}),
           sumsBy(all, 'share', format.say('byShare', {name: heading})),
-          ...all.some(({places}) => places.some(({volume}) => volume)) ? [sumsBy(all, 'volume', format.say('byVolume', {name: heading}))] : []];
+          isOnVolumes ? sumsBy(all, 'volume', format.say('byVolume', {name: heading})) : null];
 }

@@ -73,7 +73,8 @@ function shares(data, facts, {heading, csv}) {
   const known = new Map(facts?.shares?.map(share => [share.name, share]));
   const grows = [...known.values()].some(({grown}) => grown?.month);
   const drawn = [...known.values()].some(({samples}) => samples.length > 1);
-  const trend = share => ({order: share?.samples.length > 1 ? share.samples.at(-1).used - share.samples[0].used : NaN,
+  const trend = share => ({
+    order: share?.samples.length > 1 ? share.samples.at(-1).used - share.samples[0].used : NaN,
     make: () => share ? sparkline(share.samples, {width: 90, height: 22, now: facts.finished}) : null});
   const rows = rowsOf(data).map(([name, id, bytes]) => [
     name, bytes, ...grows ? [String(known.get(name)?.grown?.month?.bytes ?? '')] : [],
@@ -232,7 +233,8 @@ export function fillSection(section, name, {data, facts, emptyReports, mark, oth
   const known = facts?.reports.get(name);
   const heading = format.nameOf('reports', data?.heading ?? name);
   const csv = report?.hasCsv && !(known && known.csv === undefined) ? `csv/${name}.csv` : undefined;
-  const beyond = csv && known && report.limitOf === 'rows' && !report.noted ? Math.max(0, known.rows - known.shown) : 0;
+  const isTold = csv && known && report.limitOf === 'rows' && !report.noted;
+  const beyond = isTold ? Math.max(0, known.rows - known.shown) : 0;
   section.replaceChildren(
     h('h2', {id: `${name}-heading`}, name === 'volume_usage' ? format.say('history') : heading,
       mark ? levelElement(mark, false) : null),

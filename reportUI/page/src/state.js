@@ -6,7 +6,11 @@ let anchor = '';
 
 export function readAddress() {
   const [name, words = ''] = location.hash.slice(1).split(/\?(.*)/s);
-  anchor = decodeURIComponent(name);
+  try {
+    anchor = decodeURIComponent(name);
+  } catch {  // somebody else's address
+    anchor = '';
+  }
   for (const [key, value] of new URLSearchParams(words)) {
     state.set(key, value);
   }
@@ -34,12 +38,12 @@ export function keep(key, value, section = anchor) {
   }
 }
 
-// A link within the page brings its own anchor, and loses the rest.
+// A link within the page brings its own anchor, and loses the rest. The anchor, if it brought more.
 export function followAnchor() {
   const hasWords = location.hash.includes('?');
   readAddress();
   if (!hasWords) {
     writeAddress();
   }
-  return hasWords;
+  return hasWords ? anchor : undefined;
 }

@@ -70,8 +70,8 @@ const KINDS = {
   name: {cell: value => h('span', {class: 'long'}, shown(value)), header: true, text: String},
   // A share and a folder in it.
   place: {
-    cell: ([share, folder]) => h('span', {class: 'long'}, folder === '.' ? null : h('span', {class: 'in'}, shown(share), ' / '),
-                                 shown(folder === '.' ? share : folder)),
+    cell: ([share, folder]) => h('span', {class: 'long'}, ...folder === '.' ? [shown(share)] :
+      [h('span', {class: 'in'}, shown(share), ' / '), shown(folder)]),
     text: ([share, folder]) => folder === '.' ? share : `${share}/${folder}`, header: true
   },
   type: {cell: value => typeName(value), text: value => typeName(value), header: true},

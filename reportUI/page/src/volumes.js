@@ -74,7 +74,8 @@ function causeElement(cause, most, {text, volume, sections}) {
   const href = wayTo(cause, volume, sections);
   return h('li', {}, h('span', {class: 'kind', title: format.say(key)}, sign(shape),
                        h('span', {class: 'unseen'}, format.say(key))),
-           barElement(bytes / most * 100, [h(href ? 'a' : 'span', {href}, shown(who)), ' ', sizeElement(bytes, null, text(bytes))]));
+           barElement(bytes / most * 100, [h(href ? 'a' : 'span', {href}, shown(who)), ' ',
+                                           sizeElement(bytes, null, text(bytes))]));
 }
 
 function causes(heading, list, way) {
