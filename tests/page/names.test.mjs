@@ -32,7 +32,7 @@ test('names are shown exactly and do nothing', () => withPage(fileOf('hostile'),
 test('a folder of any name can be gone into, and has an address', () => withPage(withFacts(withBlock(
   read('hostile'), 'vornFolderUsageData', `[\n${['.', 'a ?#%\\udcff', 'a ?#%\\udcff/b'].map(
     (folder, i) => `[ 's', '${folder}', '${9 - i}', '1', '1700000000' ]`).join(',\n')}\n];\n</script>\n`), facts({
-  volumes: [volume('/x', 9)], shares: [{name: 's', path: '/x/s', volume: '/x', files: 1, bytes: 9, samples: []}]})), async page => {
+  volumes: [volume('/x', 9, {size: 18})], shares: [{name: 's', path: '/x/s', volume: '/x', files: 1, bytes: 9, samples: []}]})), async page => {
   await page.locator('.box.way', {hasText: 's: 9'}).press('Enter');
   await page.locator('.box.way', {hasText: 'a ?#%'}).press('Enter');
   assert.equal(await page.locator('.go').getAttribute('href'), 'file:///x/s/a%20%3F%23%25%ff');
