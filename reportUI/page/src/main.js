@@ -5,7 +5,7 @@ import {hasBlock, piecesOf, readReport, readVariable} from './data.js';
 import {readFacts} from './facts.js';
 import * as format from './format.js';
 import {fillSection, REPORTS} from './sections.js';
-import {followAnchor, keep, readAddress, stateOf} from './state.js';
+import {anchorOf, followAnchor, keep, readAddress, stateOf} from './state.js';
 import {attention, glance, incidents, marksOf, next} from './summary.js';
 import {forgetTables, foundIn, isSought, seek} from './table.js';
 import {cards, levelElement} from './volumes.js';
@@ -270,12 +270,12 @@ format.callVolumes(facts?.volumes ?? []);
 setTheme(remember.get('theme') ?? 'system');
 document.addEventListener('copy', copyOriginals);
 document.addEventListener('click', ({target}) => target.closest('.long')?.classList.toggle('open'));
-const renderAt = id => render().then(() => id && document.getElementById(id)?.scrollIntoView());
-const place = readAddress();
+// Goes where the address leads, also if that has changed meanwhile.
+const renderAtAnchor = () => render().then(() => document.getElementById(anchorOf())?.scrollIntoView());
+readAddress();
 window.addEventListener('hashchange', () => {
-  const id = followAnchor();
-  if (id) {
-    renderAt(id);
+  if (followAnchor()) {
+    renderAtAnchor();
   }
 });
-renderAt(place);
+renderAtAnchor();

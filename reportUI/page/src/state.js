@@ -14,8 +14,8 @@ export function readAddress() {
   for (const [key, value] of new URLSearchParams(words)) {
     state.set(key, value);
   }
-  return anchor;
 }
+export const anchorOf = () => anchor;
 
 function writeAddress() {
   const words = new URLSearchParams([...state].filter(([, value]) => value)).toString();
@@ -38,12 +38,12 @@ export function keep(key, value, section = anchor) {
   }
 }
 
-// A link within the page brings its own anchor, and loses the rest. The anchor, if it brought more.
+// A link within the page brings its own anchor, and loses the rest. Whether it brought more.
 export function followAnchor() {
   const hasWords = location.hash.includes('?');
   readAddress();
   if (!hasWords) {
     writeAddress();
   }
-  return hasWords ? anchor : undefined;
+  return hasWords;
 }
