@@ -72,6 +72,7 @@ export async function withPage(where, work, {address, silent = true, ...options}
   };
   try {
     Object.entries(listeners).forEach(([name, listener]) => page.on(name, listener));
+    await page.mouse.move(0, 0);  // what lies below the pointer would answer to it
     await page.goto(url);
     if (options.javaScriptEnabled !== false) {
       await isReady(page);
