@@ -4,7 +4,7 @@
 # To build, try and package the product.
 build_packages=(
   g++ cmake ninja-build pkg-config
-  libsqlite3-dev libcurl4-openssl-dev libmount-dev libssl-dev libxxhash-dev
+  libsqlite3-dev libcurl4-openssl-dev zlib1g-dev libmount-dev libssl-dev libxxhash-dev
   libcli11-dev nlohmann-json3-dev
   bubblewrap dpkg-dev
 )
@@ -13,6 +13,7 @@ test_packages=(
   libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota samba-common-bin
   lintian systemd systemd-container cron strace glusterfs-server glusterfs-client iproute2
   prometheus zsh bash-completion
+  clickhouse-server clickhouse-client
 )
 
 # npm bundles the page. Where it came with another Node.js, Debian's stays away: they conflict.

@@ -20,6 +20,7 @@
 #include "config/profile.hpp"
 #include "outcome/course.hpp"
 #include "outcome/metrics.hpp"
+#include "outcome/run_outcome.hpp"
 #include "outcome/tell.hpp"
 #include "report_format/facts_file.hpp"
 #include "report_format/reports.hpp"
@@ -249,6 +250,12 @@ int clean(const std::string& profile, const VLIBCSzHash* hash) {
 }
 
 }  // namespace
+
+bool end_report(const ReportRun& run, bool is_made) {
+  return outcome_of(run, is_made ? report_format::kSuccess : report_format::kFail).status.word ==
+         report_format::kSuccess;
+}
+
 }  // namespace host
 
 int VornQazProfileRunning(const char* profile) {

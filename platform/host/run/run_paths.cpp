@@ -77,17 +77,6 @@ bool name_exists(const std::string& path) {
   return lstat(path.c_str(), &status) == 0;
 }
 
-// The first run name at this time that nothing stands for, neither finished nor unfinished.
-ReportRun unused_run(const std::string& profile, const std::string& folder) {
-  const ErrnoKeeper keeper;
-  const std::string base = local_time_name();
-  ReportRun run = run_named(profile, folder, base);
-  for (int n = 2; name_exists(run.finished) || name_exists(run.unfinished); ++n) {
-    run = run_named(profile, folder, base + "-" + std::to_string(n));
-  }
-  return run;
-}
-
 // --- Preparing a report run ---------------------------------------------------------------------
 
 // An incident for each share that the profile selects and that can't be used: one whose section is
@@ -331,6 +320,16 @@ std::optional<std::vector<std::string>> unfinished_reports(const std::string& fo
   }
   errno = saved_errno;
   return found;
+}
+
+ReportRun unused_run(const std::string& profile, const std::string& folder) {
+  const ErrnoKeeper keeper;
+  const std::string base = local_time_name();
+  ReportRun run = run_named(profile, folder, base);
+  for (int n = 2; name_exists(run.finished) || name_exists(run.unfinished); ++n) {
+    run = run_named(profile, folder, base + "-" + std::to_string(n));
+  }
+  return run;
 }
 
 std::optional<ReportRun>& report_run() {

@@ -57,6 +57,9 @@ struct ReportRun {
 
 std::optional<ReportRun>& report_run();
 
+// The first run at this time in `folder` whose name nothing has, neither finished nor unfinished.
+ReportRun unused_run(const std::string& profile, const std::string& folder);
+
 }  // namespace host
 
 #endif

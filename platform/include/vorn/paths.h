@@ -4,6 +4,7 @@
 
 #define VORN_PATH_CONFIG "/usr/vorn/etc/vornreport.conf"
 #define VORN_PATH_SHARES "/usr/vorn/etc/share.conf"
+#define VORN_PATH_FLEET "/usr/vorn/etc/fleet.conf"
 #define VORN_PATH_HISTORY_DB "/usr/vorn/etc/vornreport.db"
 #define VORN_PATH_HISTORY_SCHEMA "/usr/vorn/vornreport/sql/vornreport.sql"
 #define VORN_PATH_TEMPLATE_SCRIPT "/usr/vorn/vornreport/reportUI/build-template.sh"

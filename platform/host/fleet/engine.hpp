@@ -1,0 +1,53 @@
+// The fleet's engine over its HTTP interface. Every wait is bounded; redirects and proxies are
+// never followed; a server's certificate is always verified.
+#ifndef VORN_HOST_FLEET_ENGINE_HPP
+#define VORN_HOST_FLEET_ENGINE_HPP
+
+#include <cstddef>
+#include <functional>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "fleet/fleet_conf.hpp"
+
+namespace host {
+
+class Engine {
+ public:
+  explicit Engine(const FleetConf& conf);
+  Engine(const Engine&) = delete;
+  Engine& operator=(const Engine&) = delete;
+  ~Engine();
+
+  // A row's fields, each ended by a NUL; null for an absent value. False ends the reading.
+  using OnRow = std::function<bool(std::vector<char*>& fields)>;
+  // Runs a statement that gives rows. None is handed out before the engine has all of them, so that
+  // what fails half-way isn't taken for less; they arrive one by one. False when it failed, or
+  // `on_row` was false. Other nodes are tried while none was handed out.
+  bool select(const std::string& sql, const OnRow& on_row);
+
+  // Fills `out` with the next bytes of rows in the TabSeparated format; 0 at their end.
+  using Source = std::function<std::size_t(char* out, std::size_t size)>;
+  // Sends rows to `table`, compressed. All of them are in its place when it returns true; after
+  // false nobody knows how many are. Another node is tried as long as nothing was asked of
+  // `source`.
+  bool insert(const std::string& table, const Source& source);
+
+  // Runs a statement on one node, outside of the configured database.
+  bool execute(std::size_t node, const std::string& sql);
+  bool select_on(std::size_t node, const std::string& sql, const OnRow& on_row);
+  std::size_t nodes() const;
+  const FleetConf& conf() const;
+
+  // What the last failure was, as one sentence without an end.
+  const std::string& problem() const;
+
+ private:
+  class Transfer;
+  std::unique_ptr<Transfer> transfer_;
+};
+
+}  // namespace host
+
+#endif

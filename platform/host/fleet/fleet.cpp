@@ -1,0 +1,86 @@
+// The fleet as the program has it.
+#include "vorn/fleet.h"
+
+#include <exception>
+#include <memory>
+#include <string>
+
+#include "fleet/engine.hpp"
+#include "fleet/fleet_conf.hpp"
+
+struct VORNFleet {
+  std::unique_ptr<host::Engine> engine;  // null when it can't be worked with
+  std::string problem;
+};
+
+namespace {
+
+// Runs `call` with the engine. 0, or -1 with the problem kept.
+template <typename Call>
+int with_engine(VORNFleet* fleet, Call&& call) {
+  if (fleet == nullptr || !fleet->engine) {
+    return -1;
+  }
+  try {
+    if (call(*fleet->engine)) {
+      return 0;
+    }
+    fleet->problem = fleet->engine->problem();
+  } catch (const std::exception& error) {
+    fleet->problem = error.what();
+  }
+  return -1;
+}
+
+}  // namespace
+
+int VORNFleetOpen(VORNFleet** fleet) {
+  if (fleet == nullptr) {
+    return -1;
+  }
+  *fleet = nullptr;
+  try {
+    host::FleetReading reading = host::read_fleet_conf();
+    if (!reading.conf && reading.problem.empty()) {
+      return 1;
+    }
+    auto made = std::make_unique<VORNFleet>();
+    made->problem = std::move(reading.problem);
+    if (reading.conf) {
+      made->engine = std::make_unique<host::Engine>(*reading.conf);
+    }
+    *fleet = made.release();
+    return (*fleet)->engine ? 0 : -1;
+  } catch (const std::exception&) {
+    return -1;
+  }
+}
+
+void VORNFleetClose(VORNFleet* fleet) {
+  delete fleet;
+}
+
+const char* VORNFleetServer(const VORNFleet* fleet) {
+  return fleet != nullptr && fleet->engine ? fleet->engine->conf().server.c_str() : "";
+}
+
+const char* VORNFleetProblem(const VORNFleet* fleet) {
+  return fleet != nullptr ? fleet->problem.c_str() : "there is no memory for it";
+}
+
+int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetSource source, void* context) {
+  return with_engine(fleet, [&](host::Engine& engine) {
+    return engine.insert(table,
+                         [&](char* out, std::size_t size) { return source(context, out, size); });
+  });
+}
+
+int VORNFleetSelect(VORNFleet* fleet, const char* sql, VORNFleetRow row, void* context) {
+  return with_engine(fleet, [&](host::Engine& engine) {
+    char* no_names[1] = {};
+    return engine.select(sql, [&](std::vector<char*>& fields) {
+      return row(context, static_cast<int>(fields.size()), fields.data(),
+                 static_cast<char**>(no_names)) == 0;
+    });
+  });
+}
