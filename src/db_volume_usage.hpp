@@ -29,6 +29,7 @@ struct VolumeUsageNode {
   FixedText<32> name;          // mount path; empty for a stored volume that is no longer mounted
   int32_t days;                // until it is full; -1: no estimate
   VolumeUsageSample* samples;  // owned
+  std::string fleet_name;      // of a server of the fleet: "server:/path"; `name` is empty then
 };
 
 // The node of a list element.

@@ -6,6 +6,8 @@
 
 #include "facts/run_facts.hpp"
 #include "vornreport/error_log.hpp"
+#include "vornreport/fleet_rows.hpp"
+#include "vornreport/fleet_source.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
 
@@ -39,6 +41,15 @@ void write_csv(FILE* csv, const ListedReport& report, std::span<const ListedRow>
   }
 }
 
+int add_row(void* context, int columns, char** values, char** /*names*/) noexcept {
+  ListedRow row;
+  for (int i = 0; i < columns; ++i) {
+    row.emplace_back(values[i] != nullptr ? values[i] : "");
+  }
+  static_cast<std::vector<ListedRow>*>(context)->push_back(std::move(row));
+  return 0;
+}
+
 }  // namespace
 
 int32_t run_listed_report(const ListedReport& report, const ReportArgs* args,
@@ -49,6 +60,9 @@ int32_t run_listed_report(const ListedReport& report, const ReportArgs* args,
   if (csv_dir == nullptr) {
     REPORT_LOG_ERR_NESTED(report.module, __LINE__, "get csv dir failed");
     return -1;
+  }
+  for (const ListedRow& row : rows) {
+    keep_fleet_row(report.format.name, row);
   }
   const size_t shown = within(report.format.page_limit, rows.size());
   const std::span<const ListedRow> all(rows);
@@ -73,6 +87,13 @@ int32_t run_listed_report(const ListedReport& report, const ReportArgs* args,
   }
   finish_csv(report.format, csv_path.c_str());
   return 0;
+}
+
+int32_t run_fleet_report(const ListedReport& report, const ReportArgs* args) {
+  std::vector<ListedRow> rows;
+  const bool found = run_over_fleet(*args->fleet, report.fleet_sql, add_row, &rows, report.module);
+  const int32_t result = run_listed_report(report, args, rows);
+  return found ? result : -1;
 }
 
 }  // namespace vornreport

@@ -27,12 +27,18 @@ struct ListedReport {
   const char* module;                         // in log lines
   const char* csv_header;                     // without line feed
   std::span<const ListedColumn> columns;
+  // The same over a fleet, out of the rows that its servers have sent of this report.
+  const char* fleet_sql = nullptr;
 };
 
-using ListedRow = std::vector<std::string>;  // a text for each column
+// A text for each column; what stands behind them is for the fleet alone.
+using ListedRow = std::vector<std::string>;
 
 // Writes the block, the CSV file and the counts of rows. 0; -1 on failure, which is logged.
 int32_t run_listed_report(const ListedReport& report, const ReportArgs* args,
                           const std::vector<ListedRow>& rows);
+
+// The same with the rows of the fleet that `args` names.
+int32_t run_fleet_report(const ListedReport& report, const ReportArgs* args);
 
 }  // namespace vornreport

@@ -17,7 +17,11 @@ constexpr ListedReport kReport{
     .format = report_format::kCoverage,
     .module = kModule,
     .csv_header = "Volume\tShare\tFile Count\tSize(Byte)\tAllocated(Byte)\tUnreadable\tOther",
-    .columns = kColumns};
+    .columns = kColumns,
+    .fleet_sql =
+        "select concat(server, ':', value[8]), concat(server, ':', value[2]), value[3], value[4], "
+        "value[5], value[6], value[7] from report_row where {runs} and report = 'coverage' "
+        "order by server, profile, position"};
 
 // As other reports call it; the path of one that has no identifier.
 std::string id_of(const std::string& volume) {
@@ -33,6 +37,9 @@ std::string id_of(const std::string& volume) {
 
 // By volume; on each the share with the most first.
 int32_t coverage(ReportArgs* args) {
+  if (args->fleet != nullptr) {
+    return run_fleet_report(kReport, args);
+  }
   struct Part {
     const ShareTally* share;
     const VolumeTally* volume;
@@ -53,7 +60,8 @@ int32_t coverage(ReportArgs* args) {
   for (const auto& [share, volume] : parts) {
     rows.push_back({id_of(volume->volume), share->name(), std::to_string(volume->total.files),
                     std::to_string(volume->total.bytes), std::to_string(volume->allocated),
-                    std::to_string(volume->unreadable), std::to_string(volume->other)});
+                    std::to_string(volume->unreadable), std::to_string(volume->other),
+                    volume->volume});
   }
   return run_listed_report(kReport, args, rows);
 }

@@ -18,6 +18,7 @@
 
 #include <sqlite3.h>
 
+#include <array>
 #include <optional>
 #include <string>
 #include <utility>
@@ -28,6 +29,7 @@
 #include "vorn/user.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
+#include "vornreport/fleet_source.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
 #include "vornreport/statements_ahead.hpp"
@@ -38,6 +40,10 @@ namespace {
 
 constexpr char kModule[] = "src/rep_file_group";
 constexpr char kOfAllFiles[] = "select ext,share,sum(size) from file_stat group by ext, share;";
+
+constexpr char kOverFleet[] =
+    "select ext, concat(server, ':', share), {sum} from file where {runs} "
+    "group by ext, server, share order by ext, server, share";
 
 // The section of the last row written, for the life of the process; none for all files.
 std::optional<std::string> g_previous_user;
@@ -62,8 +68,9 @@ struct GroupReport {
 
 // Opens all that the queries need and writes the CSV header. False, logged, on failure.
 bool open_report(const ReportArgs& args, GroupReport& report) {
-  report.db = VORNReportDBInit(args.profile_hash);
-  if (!report.db) {
+  report.ctx.fleet = args.fleet;
+  report.db = args.fleet != nullptr ? nullptr : VORNReportDBInit(args.profile_hash);
+  if (!report.db && args.fleet == nullptr) {
     REPORT_LOG_ERR_NESTED(kModule, __LINE__, "open db failed");
     return false;
   }
@@ -89,6 +96,23 @@ bool open_report(const ReportArgs& args, GroupReport& report) {
   report.ctx.csv_limit = report_format::kFileGroup.csv_limit;
   report.ctx.profile_hash = args.profile_hash;
   return true;
+}
+
+// A row whose names are other people's.
+int write_fleet_row(void* context, int columns, char** values, char** names) noexcept {
+  std::array<std::array<char, 1024>, 2> escaped{};
+  std::array<char*, 3> row{escaped[0].data(), escaped[1].data(), nullptr};
+  if (columns != static_cast<int>(row.size())) {
+    return -1;
+  }
+  for (size_t i = 0; i < escaped.size(); ++i) {
+    if (values[i] == nullptr ||
+        VornQazEscChar(values[i], escaped[i].data(), escaped[i].size(), '\'') < 0) {
+      return -1;
+    }
+  }
+  row.back() = values[escaped.size()];
+  return FileGroupRowWriter(context, columns, row.data(), names);
 }
 
 bool run_query(GroupReport& report, const char* sql) {
@@ -155,14 +179,16 @@ bool write_users(GroupReport& report, const char* limit_user) {
 }
 
 bool write_sections(GroupReport& report, const VLIBCSzHash* profile_hash) {
-  if (!run_query(report, kOfAllFiles)) {
+  const FleetSource* fleet = report.ctx.fleet;
+  if (fleet != nullptr ? !run_over_fleet(*fleet, kOverFleet, write_fleet_row, &report.ctx, kModule)
+                       : !run_query(report, kOfAllFiles)) {
     return false;
   }
   if (report.ctx.row_count != 0) {
     report_trace(kModule, __LINE__, "print end\n");
     std::fputs("]\n", report.ctx.data_fp);
   }
-  const char* limit_user = set_value(profile_hash, "limit_user");
+  const char* limit_user = fleet == nullptr ? set_value(profile_hash, "limit_user") : nullptr;
   if (limit_user != nullptr && !write_users(report, limit_user)) {
     return false;
   }

@@ -8,6 +8,9 @@ namespace {
 constexpr ReportColumn kColumns[] = {owner_column(0), field_column(1), field_column(2),
                                      field_column(3)};
 
+constexpr ReportColumn kFleetColumns[] = {path_column(0), path_column(1), field_column(2),
+                                          field_column(3)};
+
 constexpr StatisticsReport kFileOwnerReport{
     .format = report_format::kFileOwner,
     .module = "src/rep_file_owner",
@@ -17,6 +20,11 @@ constexpr StatisticsReport kFileOwnerReport{
     .csv_header = "Owner\tShare\tFile Count\tSize(Byte)",
     .share_paths = SharePaths::kLeftOut,
     .columns = kColumns,
+    .fleet_sql =
+        "select owner_name, concat(server, ':', share), count() as c, {sum} as s from file "
+        "where {runs} and owner_name != '' group by owner, owner_name, server, share "
+        "order by owner, s desc, c desc, server, share",
+    .fleet_columns = kFleetColumns,
 };
 
 }  // namespace

@@ -19,10 +19,22 @@ namespace vornreport {
 namespace {
 
 constexpr std::array kColumns{kName, kName, kName, kName, kName, kName};
+// Of each since and kind the greatest of all servers, in the order of greatest_changes().
+constexpr char kOverFleet[] =
+    "select value[1], value[2], concat(server, ':', value[3]), value[4], value[5], value[6] "
+    "from (select server, profile, position, value, "
+    "indexOf(['last', 'week', 'month'], value[1]) as since, "
+    "indexOf(['share', 'owner', 'type', 'folder'], replaceOne(value[2], '_at_least', '')) "
+    "as kind, abs(toInt64OrZero(value[6])) as bytes, abs(toInt64OrZero(value[5])) as files "
+    "from report_row where {runs} and report = 'growth' "
+    "order by since, kind, bytes desc, files desc, server, profile, position "
+    "limit 200 by since, kind) "
+    "order by since, kind, bytes desc, files desc, server, profile, position";
 constexpr ListedReport kReport{.format = report_format::kGrowth,
                                .module = "src/rep_growth",
                                .csv_header = "Since\tKind\tShare\tName\tFile Count\tSize(Byte)",
-                               .columns = kColumns};
+                               .columns = kColumns,
+                               .fleet_sql = kOverFleet};
 
 // An account may have gone, or been left out of the profile, since the set was made.
 void forget_owners(Snapshot& set, const VLIBCSzHash* users) {
@@ -83,6 +95,9 @@ std::vector<ListedRow> rows_of(const Growth& growth) {
 }  // namespace
 
 int32_t growth(ReportArgs* args) {
+  if (args != nullptr && args->fleet != nullptr) {
+    return run_fleet_report(kReport, args);
+  }
   const char* report_list =
       args_are_complete(args) ? set_value(args->profile_hash, "report_list") : nullptr;
   if (report_list == nullptr) {

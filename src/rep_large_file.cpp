@@ -7,6 +7,8 @@ namespace {
 
 constexpr ReportColumn kColumns[] = {raw_column(0), path_column(1), field_column(2)};
 
+constexpr ReportColumn kFleetColumns[] = {path_column(0), path_column(1), field_column(2)};
+
 constexpr StatisticsReport kLargeFileReport{
     .format = report_format::kLargeFile,
     .module = "src/rep_large_file",
@@ -14,6 +16,10 @@ constexpr StatisticsReport kLargeFileReport{
     .csv_header = "Share\tFile\tSize(Byte)",
     .share_paths = SharePaths::kImported,
     .columns = kColumns,
+    .fleet_sql =
+        "select concat(server, ':', share), path, size from file where {runs} "
+        "order by size desc, id, server, profile limit 10000",
+    .fleet_columns = kFleetColumns,
 };
 
 }  // namespace

@@ -8,6 +8,9 @@ namespace {
 constexpr ReportColumn kColumns[] = {raw_column(0), path_column(1), field_column(2),
                                      time_column(3)};
 
+constexpr ReportColumn kFleetColumns[] = {path_column(0), path_column(1), field_column(2),
+                                          time_column(3)};
+
 constexpr StatisticsReport kLeastModifyReport{
     .format = report_format::kLeastModify,
     .module = "src/rep_modify_time",
@@ -17,6 +20,11 @@ constexpr StatisticsReport kLeastModifyReport{
     .csv_header = "Share\tFile\tSize(Byte)\tModify Time",
     .share_paths = SharePaths::kLeftOut,
     .columns = kColumns,
+    .fleet_sql =
+        "select concat(server, ':', share), path, size, mtime from file where {runs} and "
+        "mtime < toInt64(intDiv(run, 1000000)) - 60*60*24*90 "
+        "order by mtime, id, server, profile limit 10000",
+    .fleet_columns = kFleetColumns,
 };
 
 constexpr StatisticsReport kMostModifyReport{
@@ -28,6 +36,11 @@ constexpr StatisticsReport kMostModifyReport{
     .csv_header = "Share\tFile\tSize(Byte)\tModify Time",
     .share_paths = SharePaths::kImported,
     .columns = kColumns,
+    .fleet_sql =
+        "select concat(server, ':', share), path, size, mtime from file where {runs} and "
+        "mtime > toInt64(intDiv(run, 1000000)) - 60*60*24*7 "
+        "order by mtime desc, id, server, profile limit 10000",
+    .fleet_columns = kFleetColumns,
 };
 
 }  // namespace

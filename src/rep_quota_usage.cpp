@@ -1,5 +1,6 @@
 #include "rep_quota_usage.hpp"
 
+#include <algorithm>
 #include <array>
 #include <cstdlib>
 #include <cstring>
@@ -13,6 +14,8 @@
 #include "vorn/report.h"
 #include "vorn/volume.h"
 #include "vornreport/error_log.hpp"
+#include "vornreport/fleet_rows.hpp"
+#include "vornreport/fleet_source.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
 
@@ -108,7 +111,16 @@ bool read_line(FILE* stream, std::string& line) {
 
 // --- The page's blocks --------------------------------------------------------------------------
 
-using VolumeId = std::array<char, 64>;
+using VolumeId = std::array<char, 1024>;
+using UserText = std::array<char, 1024>;
+
+// A user of another server may have any name.
+const char* user_text(const QuotaVolume& volume, const std::string& name, UserText& buffer) {
+  if (volume.fleet_name.empty()) {
+    return name.c_str();
+  }
+  return VornQazEscChar(name.c_str(), buffer.data(), buffer.size(), '\'') < 0 ? "" : buffer.data();
+}
 
 // Writes one block: an object with an entry for each volume.
 template <typename WriteEntry>
@@ -120,7 +132,11 @@ void write_block(FILE* data, const QAZLLNode* list, const char* opening, const c
     before = separator;
     VolumeId id{};
     const QuotaVolume& volume = *quota_volume_of(list);
-    if (VornQazVolumeGetId(volume.name.c_str(), id.data(), id.size()) < 0) {
+    if (!volume.fleet_name.empty()) {
+      if (VornQazEscChar(volume.fleet_name.c_str(), id.data(), id.size(), '\'') < 0) {
+        id[0] = '\0';
+      }
+    } else if (VornQazVolumeGetId(volume.name.c_str(), id.data(), id.size()) < 0) {
       // The same volume again, without end: the platform has an identifier for every volume that
       // it enumerated.
       REPORT_LOG_ERR_NESTED(kModule, __LINE__, "cannot get volume id, volume=%s",
@@ -161,7 +177,8 @@ void write_data_entry(FILE* data, const QuotaVolume& volume, const char* id) {
   std::fputs("\tlabels : [\n", data);
   const char* separator = "";
   for (const auto& [used, user] : volume.users) {
-    std::fprintf(data, "%s\t\t'%s'\n", separator, user.name.c_str());
+    UserText name{};
+    std::fprintf(data, "%s\t\t'%s'\n", separator, user_text(volume, user.name, name));
     separator = "\t\t,\n";
   }
   std::fputs("\t]\n", data);
@@ -174,10 +191,66 @@ void write_table_entry(FILE* data, const QuotaVolume& volume, const char* id) {
     const double percent = user.quota == 0 ? -1.0
                                            : static_cast<double>(static_cast<float>(used)) * 100.0 /
                                                  static_cast<double>(user.quota);
-    std::fprintf(data, "%s['%s', %llu, %llu, %.1f]", separator, user.name.c_str(),
+    UserText name{};
+    std::fprintf(data, "%s['%s', %llu, %llu, %.1f]", separator, user_text(volume, user.name, name),
                  print_u64(user.quota * kKiB), print_u64(used * kKiB), percent);
     separator = ",\n";
   }
+}
+
+// --- The fleet ----------------------------------------------------------------------------------
+
+void keep_for_fleet(const QuotaVolume& volume, const char* path) {
+  for (const auto& [used, user] : volume.users) {
+    keep_fleet_row(report_format::kQuotaUsage.name,
+                   {path, std::to_string(volume.totalKiB), std::to_string(volume.maxQuota),
+                    std::to_string(volume.maxUserUsed), std::to_string(volume.filteredUsers),
+                    user.name, std::to_string(used), std::to_string(user.quota)});
+  }
+}
+
+constexpr char kOverFleet[] =
+    "select concat(server, ':', value[1]), value[2], value[3], value[4], value[5], value[6], "
+    "value[7], value[8] from report_row where {runs} and report = 'quota_usage' and "
+    "(server, run) global in (select server, max(run) from report_row "
+    "where {runs} and report = 'quota_usage' group by server) order by server, position";
+
+int add_fleet_user(void* context, int columns, char** values, char** /*names*/) noexcept {
+  enum Column { kVolume, kTotal, kMaxQuota, kMaxUsed, kUsers, kUser, kUsedKiB, kQuotaKiB, kCount };
+  if (columns != kCount ||
+      std::any_of(values, values + kCount, [](const char* value) { return value == nullptr; })) {
+    return -1;
+  }
+  const auto number = [&](Column column) { return std::strtoull(values[column], nullptr, 10); };
+  auto& list = *static_cast<QAZLLNode**>(context);
+  if (list == nullptr || quota_volume_of(list->last)->fleet_name != values[kVolume]) {
+    std::unique_ptr<QuotaVolume> volume(new (std::nothrow) QuotaVolume{});
+    if (!volume || QAZLLadd(&list, volume.get(), nullptr) < 0) {
+      return -1;
+    }
+    volume->fleet_name = values[kVolume];
+    volume->totalKiB = number(kTotal);
+    volume->maxQuota = number(kMaxQuota);
+    volume->maxUserUsed = number(kMaxUsed);
+    volume->filteredUsers = number(kUsers);
+    static_cast<void>(volume.release());
+  }
+  QuotaVolume& volume = *quota_volume_of(list->last);
+  volume.users.emplace(number(kUsedKiB),
+                       QuotaUser{values[kUser], number(kUsedKiB), number(kQuotaKiB)});
+  return 0;
+}
+
+bool read_fleet(const FleetSource& fleet, QAZLLNode** list) {
+  if (!run_over_fleet(fleet, kOverFleet, add_fleet_user, list, kModule)) {
+    return false;
+  }
+  RowCounts& rows = run_facts().rows[report_format::kQuotaUsage.name];
+  for (const QAZLLNode* node = *list; node != nullptr; node = node->next) {
+    rows.rows += quota_volume_of(node)->filteredUsers;
+    rows.shown += quota_volume_of(node)->users.size();
+  }
+  return true;
 }
 
 // --- Running the tool ---------------------------------------------------------------------------
@@ -238,6 +311,7 @@ void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSz
   const bool is_whole = std::fclose(output.release()) == 0 && was_read;
   if (is_whole && volume != nullptr && QAZLLadd(list, volume->data, nullptr) == 0) {
     note_volume(*quota_volume_of(volume));
+    keep_for_fleet(*quota_volume_of(volume), record.path);
     QAZLLfree(&volume, [](void* /*data*/) {});
   } else {
     QAZLLfree(&volume, QuotaFreeVolume);
@@ -353,7 +427,9 @@ int32_t quota_usage(ReportArgs* args) {
   run_facts().rows[report_format::kQuotaUsage.name] = {};
   QAZLLNode* list = nullptr;
   int32_t result = -1;
-  if (QuotaUsageGetData(args->profile, args->profile_hash, &list, args->user_hash) == 0 &&
+  if ((args->fleet != nullptr
+           ? read_fleet(*args->fleet, &list)
+           : QuotaUsageGetData(args->profile, args->profile_hash, &list, args->user_hash) == 0) &&
       list != nullptr) {
     result = QuotaUsageWrite(args->profile, args->profile_hash, list, args->user_hash);
   } else {

@@ -34,6 +34,7 @@ struct QuotaVolume {
   QuotaUsers users;
   uint64_t filteredUsers;  // of which `users` are the smallest
   QuotaTally tally;        // of those of them that may be told of
+  std::string fleet_name;  // of a server of the fleet: "server:/path"; `name` is empty then
 };
 
 // The volume of a list element.

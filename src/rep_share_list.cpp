@@ -7,6 +7,8 @@ namespace {
 
 constexpr ReportColumn kColumns[] = {raw_column(0), share_volume_column(0), field_column(1)};
 
+constexpr ReportColumn kFleetColumns[] = {path_column(0), path_column(1), field_column(2)};
+
 constexpr StatisticsReport kShareListReport{
     .format = report_format::kShareList,
     .module = "src/rep_share_list",
@@ -15,6 +17,14 @@ constexpr StatisticsReport kShareListReport{
     .csv_header = "Share\tSize",
     .share_paths = SharePaths::kLeftOut,
     .columns = kColumns,
+    .fleet_sql =
+        "select concat(server, ':', share), concat(server, ':', volume), s from "
+        "(select server, profile, share, {sum} as s from file where {runs} "
+        "group by server, profile, share) any inner join "
+        "(select server, profile, value[1] as share, value[3] as volume from report_row "
+        "where {runs} and report = 'share' and value[3] != '') using server, profile, share "
+        "order by s desc, server, share, profile",
+    .fleet_columns = kFleetColumns,
 };
 
 }  // namespace

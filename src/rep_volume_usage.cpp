@@ -14,6 +14,8 @@
 #include "report_frame.hpp"
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
+#include "vornreport/fleet_rows.hpp"
+#include "vornreport/fleet_source.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
 
@@ -21,7 +23,7 @@ namespace vornreport {
 namespace {
 
 constexpr char kModule[] = "src/rep_volume_usage";
-using VolumeId = std::array<char, 64>;
+using VolumeId = std::array<char, 1024>;
 
 // Owns the list head of one call.
 struct VolumeList {
@@ -52,6 +54,9 @@ void fill_state(const VORNMountVolInfo& volume, VolumeUsageSample& sample) {
 
 // False, logged, when the volume has no identifier and is left out.
 bool volume_id(const VolumeUsageNode& node, VolumeId& id) {
+  if (!node.fleet_name.empty()) {
+    return VornQazEscChar(node.fleet_name.c_str(), id.data(), id.size(), '\'') >= 0;
+  }
   if (VornQazVolumeGetId(node.name.c_str(), id.data(), id.size()) >= 0) {
     return true;
   }
@@ -123,7 +128,12 @@ bool breaks_csv(std::string_view text) {
 void write_csv_row(FILE* csv, const VolumeUsageNode& node) {
   VolumeId id{};
   const char* name = node.name.c_str();
-  if (breaks_csv(name)) {
+  if (!node.fleet_name.empty()) {
+    if (VornQazFormatCsvString(node.fleet_name.c_str(), id.data(), id.size()) < 0) {
+      return;
+    }
+    name = id.data();
+  } else if (breaks_csv(name)) {
     if (!volume_id(node, id)) {
       return;
     }
@@ -135,6 +145,62 @@ void write_csv_row(FILE* csv, const VolumeUsageNode& node) {
   const std::string days = node.days == -1 ? "-" : std::to_string(node.days);
   std::fprintf(csv, "\"%s\", \"%llu\" ,\"%s%%\", \"%s\"\n", name, size, now.percent.c_str(),
                days.c_str());
+}
+
+// What the fleet gets of a volume: its row, and the samples behind the current one.
+void keep_for_fleet(const QAZLLNode* list) {
+  for (; keeps_fleet_rows() && list != nullptr; list = list->next) {
+    const VolumeUsageNode& node = *volume_of(list);
+    if (node.samples == nullptr) {
+      continue;
+    }
+    for (const VolumeUsageSample* sample = node.samples; sample != nullptr; sample = sample->next) {
+      keep_fleet_row(report_format::kVolumeUsage.name,
+                     {node.name.c_str(), std::to_string(node.days), sample->sampleDate.c_str(),
+                      sample->sizeUse.c_str(), sample->sizeFree.c_str(), sample->percent.c_str()});
+    }
+  }
+}
+
+// Of two profiles of a server the newer run's rows. A volume's first is the current one.
+constexpr char kOverFleet[] =
+    "select concat(server, ':', value[1]), value[2], value[3], value[4], value[5], value[6] "
+    "from report_row where {runs} and report = 'volume_usage' and (server, run) global in "
+    "(select server, max(run) from report_row where {runs} and report = 'volume_usage' "
+    "group by server) order by server, position";
+
+int add_fleet_sample(void* context, int columns, char** values, char** /*names*/) noexcept {
+  enum Column { kVolume, kDays, kDate, kUsed, kFree, kPercent, kCount };
+  if (columns != kCount ||
+      std::any_of(values, values + kCount, [](const char* value) { return value == nullptr; })) {
+    return -1;
+  }
+  auto& list = *static_cast<QAZLLNode**>(context);
+  std::unique_ptr<VolumeUsageSample> sample(new (std::nothrow) VolumeUsageSample{});
+  if (!sample) {
+    return -1;
+  }
+  sample->sampleDate.format("%s", values[kDate]);
+  sample->sizeUse.format("%s", values[kUsed]);
+  sample->sizeFree.format("%s", values[kFree]);
+  sample->percent.format("%s", values[kPercent]);
+  if (list != nullptr && volume_of(list->last)->fleet_name == values[kVolume]) {
+    VolumeUsageSample* end = volume_of(list->last)->samples;
+    while (end->next != nullptr) {
+      end = end->next;
+    }
+    end->next = sample.release();
+    return 0;
+  }
+  std::unique_ptr<VolumeUsageNode> node(new (std::nothrow) VolumeUsageNode{});
+  if (!node || QAZLLadd(&list, node.get(), keep_order) < 0) {
+    return -1;
+  }
+  node->fleet_name = values[kVolume];
+  node->days = static_cast<int32_t>(std::strtol(values[kDays], nullptr, 10));
+  node->samples = sample.release();
+  static_cast<void>(node.release());
+  return 0;
 }
 
 bool wants_history(const VLIBCSzHash* profile_hash) {
@@ -298,19 +364,23 @@ int32_t volume_usage(ReportArgs* args) {
   const char* profile = args->profile;
   report_trace(kModule, __LINE__, "run volume usage , p=%s\n\n", profile);
   VolumeList volumes;
-  if (VolumeUsageGather(profile, args->profile_hash, &volumes.head) < 0 ||
-      volumes.head == nullptr) {
+  const FleetSource* fleet = args->fleet;
+  if (fleet != nullptr
+          ? !run_over_fleet(*fleet, kOverFleet, add_fleet_sample, &volumes.head, kModule)
+          : VolumeUsageGather(profile, args->profile_hash, &volumes.head) < 0 ||
+                volumes.head == nullptr) {
     REPORT_LOG_ERR(kModule, __LINE__, "volume usage get data failed, profile=%s\n", profile);
     return -1;
   }
-  const bool with_history = wants_history(args->profile_hash);
-  if (with_history) {
+  const bool with_history = fleet != nullptr || wants_history(args->profile_hash);
+  if (with_history && fleet == nullptr) {
     report_trace(kModule, __LINE__, "run get data hisotry\n\n");
     if (VornQazDBVolumeUsageSelect(profile, &volumes.head) < 0) {
       REPORT_LOG_ERR(kModule, __LINE__, "get volume usage data history failed\n");
       return -1;
     }
   }
+  keep_for_fleet(volumes.head);
   const int32_t shown = VolumeUsageWriteCurrent(profile, args->profile_hash, volumes.head);
   const auto rows = static_cast<uint64_t>(std::max(shown, 0));
   run_facts().rows[report_format::kVolumeUsage.name] = {rows, rows};

@@ -13,6 +13,7 @@
 #include "vorn/volume.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
+#include "vornreport/fleet_source.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
 #include "vornreport/statements_ahead.hpp"
@@ -79,10 +80,14 @@ const char* column_value(const report_row_ctx& ctx, const ReportColumn& column, 
   return value;
 }
 
+std::span<const ReportColumn> columns_of(const report_row_ctx& ctx) {
+  return ctx.fleet != nullptr ? ctx.report->fleet_columns : ctx.report->columns;
+}
+
 // False when the row is left out.
 bool resolve_values(const report_row_ctx& ctx, char* const* query_values, RowValues& row) {
   size_t place = 0;
-  for (const ReportColumn& column : ctx.report->columns) {
+  for (const ReportColumn& column : columns_of(ctx)) {
     const char* given = query_values[column.index];
     const char* value = column_value(ctx, column, given != nullptr ? given : "", row);
     if (value == nullptr) {
@@ -101,12 +106,12 @@ void write_data_row(const report_row_ctx& ctx, const RowValues& row) {
     std::fputs(",\n", ctx.data_fp);
   }
   write_data_fields(
-      ctx.data_fp, ctx.report->columns, [&](size_t i) { return row.text[i]; }, ctx.report->module);
+      ctx.data_fp, columns_of(ctx), [&](size_t i) { return row.text[i]; }, ctx.report->module);
 }
 
 void write_csv_row(const report_row_ctx& ctx, const RowValues& row) {
   write_csv_fields(
-      ctx.csv_fp, ctx.report->columns, [&](size_t i) { return row.text[i]; }, ctx.report->module);
+      ctx.csv_fp, columns_of(ctx), [&](size_t i) { return row.text[i]; }, ctx.report->module);
 }
 
 bool has_volume_column(const StatisticsReport& report) {
@@ -160,22 +165,33 @@ report_row_ctx make_context(const StatisticsReport& report, const ReportArgs& ar
   ctx.dup_list = args.dup_list;
   ctx.dup_group_list = args.dup_group_list;
   ctx.report = &report;
+  ctx.fleet = args.fleet;
   return ctx;
+}
+
+// Runs the query over the statistics database. False, logged, when it failed.
+bool run_query(const StatisticsReport& report, sqlite3* db, report_row_ctx& ctx) {
+  VornQazSetEnv();
+  char* message = nullptr;
+  const int result = run_statement(db, report.sql, report.row_writer, &ctx, &message);
+  if (result == SQLITE_OK) {
+    return true;
+  }
+  const SqliteText owned(message);
+  REPORT_LOG_ERR(report.module, __LINE__, "Exec sql:[%s] error: %s\n\n", report.sql,
+                 message != nullptr ? message : "");
+  if (is_storage_failure(result)) {
+    mark_report_data_lost();
+  }
+  return false;
 }
 
 // Runs the query and closes the block. 0 or -1.
 int32_t write_rows(const StatisticsReport& report, sqlite3* db, report_row_ctx& ctx,
                    bool is_embedded) {
-  VornQazSetEnv();
-  char* message = nullptr;
-  const int result = run_statement(db, report.sql, report.row_writer, &ctx, &message);
-  if (result != SQLITE_OK) {
-    const SqliteText owned(message);
-    REPORT_LOG_ERR(report.module, __LINE__, "Exec sql:[%s] error: %s\n\n", report.sql,
-                   message != nullptr ? message : "");
-    if (is_storage_failure(result)) {
-      mark_report_data_lost();
-    }
+  if (ctx.fleet != nullptr
+          ? !run_over_fleet(*ctx.fleet, report.fleet_sql, report.row_writer, &ctx, report.module)
+          : !run_query(report, db, ctx)) {
     return -1;
   }
   if (ctx.row_count != 0) {
@@ -266,8 +282,8 @@ int32_t run_statistics_report(const StatisticsReport& report, const ReportArgs* 
     REPORT_LOG_ERR_NESTED(report.module, __LINE__, "Bad Parameter");
     return -1;
   }
-  SqliteHandle db = VORNReportDBInit(args->profile_hash);
-  if (!db) {
+  SqliteHandle db = args->fleet != nullptr ? nullptr : VORNReportDBInit(args->profile_hash);
+  if (!db && args->fleet == nullptr) {
     REPORT_LOG_ERR_NESTED(report.module, __LINE__, "open db failed");
     return -1;
   }

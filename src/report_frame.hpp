@@ -88,6 +88,10 @@ struct StatisticsReport {
   SharePaths share_paths;
   std::span<const ReportColumn> columns;
   RowWriter row_writer = report_row_writer;
+  // The same over a fleet (vornreport/fleet_source.hpp). What names come from there are other
+  // people's, so all of them are escaped.
+  const char* fleet_sql = nullptr;
+  std::span<const ReportColumn> fleet_columns = {};
 };
 
 // The context of a row writer, which SQLite hands through.
@@ -106,6 +110,7 @@ struct report_row_ctx {
   QAZLLNode** dup_group_list;
   const StatisticsReport* report;  // the record whose rows are written
   uint64_t shown_count;            // rows written to the data file
+  const FleetSource* fleet;        // where they come from, for a report over a fleet
 };
 
 // Runs one report. 0; -1 on failure, which is logged: what was written by then stays, and the CSV

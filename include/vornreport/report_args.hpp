@@ -10,6 +10,8 @@ struct QAZLLNode;  // the platform's linked list; only the duplicate file report
 
 namespace vornreport {
 
+struct FleetSource;
+
 // Filled afresh for every report, so that what a report changes does not reach the next one. The
 // hashes belong to the driver and outlive the call.
 struct ReportArgs {
@@ -21,6 +23,9 @@ struct ReportArgs {
   QAZLLNode** dup_list;             // null but inside the duplicate file report
   QAZLLNode** dup_group_list;       // null but inside the duplicate file report
   int embedded;  // non-zero: the caller writes CSV header, closing tag and CSV finishing itself
+  // Null for a server's own report. Otherwise the rows come from there, and the names of shares and
+  // volumes, those of the hashes included, begin with their server's.
+  const FleetSource* fleet = nullptr;
 };
 
 // Appends the report's block to the report data file and writes its CSV file. 0 or -1.

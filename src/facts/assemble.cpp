@@ -94,8 +94,7 @@ std::vector<report_format::VolumeFacts> volumes_of(const RunFacts& run, const Ta
       explain(volumes.back(), volume.path, tallies);
     }
   }
-  std::stable_sort(volumes.begin(), volumes.end(),
-                   [](const auto& one, const auto& two) { return pressure(one) > pressure(two); });
+  put_pressing_first(volumes);
   return volumes;
 }
 
@@ -228,7 +227,12 @@ std::vector<report_format::AgeFacts> ages_of(const Tallies& tallies) {
   return ages;
 }
 
-// --- Reports ------------------------------------------------------------------------------------
+}  // namespace
+
+void put_pressing_first(std::vector<report_format::VolumeFacts>& volumes) {
+  std::stable_sort(volumes.begin(), volumes.end(),
+                   [](const auto& one, const auto& two) { return pressure(one) > pressure(two); });
+}
 
 std::vector<report_format::ReportFacts> reports_of(const RunFacts& run, const FactsSource& source) {
   std::vector<report_format::ReportFacts> reports;
@@ -252,8 +256,6 @@ std::vector<report_format::ReportFacts> reports_of(const RunFacts& run, const Fa
   }
   return reports;
 }
-
-}  // namespace
 
 Facts assemble_facts(const RunFacts& run, const Tallies& tallies, const FactsSource& source) {
   Facts facts;

@@ -27,4 +27,8 @@ struct FactsSource {
 report_format::Facts assemble_facts(const RunFacts& run, const Tallies& tallies,
                                     const FactsSource& source);
 
+// Parts of it, for facts that are made of others.
+void put_pressing_first(std::vector<report_format::VolumeFacts>& volumes);
+std::vector<report_format::ReportFacts> reports_of(const RunFacts& run, const FactsSource& source);
+
 }  // namespace vornreport

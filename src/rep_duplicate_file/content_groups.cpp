@@ -20,6 +20,7 @@
 #include "vorn/report.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/fixed_text.hpp"
+#include "vornreport/fleet_rows.hpp"
 #include "vornreport/handles.hpp"
 #include "vornreport/report_data.hpp"
 
@@ -39,6 +40,8 @@ void count_groups(const QAZLLNode* groups) {
   for (; groups != nullptr; groups = groups->next) {
     const uint64_t size = file_of(groups)->size;
     for (const dup_file_node* file = file_of(groups); file != nullptr; file = file->next) {
+      keep_content_member(file == file_of(groups), file->share, file->path.c_str(), file->size,
+                          file->mtime);
       g_tally.file(file->share_folder, file->path.c_str());
       ++g_rows.rows;
     }

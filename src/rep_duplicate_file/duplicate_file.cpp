@@ -8,6 +8,7 @@
 #include "content_groups.hpp"
 #include "facts/duplicate_tally.hpp"
 #include "facts/run_facts.hpp"
+#include "fleet_content.hpp"
 #include "module.hpp"
 #include "report_format/reports.hpp"
 #include "report_format/values.hpp"
@@ -109,6 +110,10 @@ bool within(uint64_t limit) {
 constexpr ReportColumn kColumns[] = {raw_column(0), field_column(0), path_column(1),
                                      field_column(2), time_column(3)};
 
+// The shares of a fleet have names that others give.
+constexpr ReportColumn kFleetColumns[] = {raw_column(0), path_column(0), path_column(1),
+                                          field_column(2), time_column(3)};
+
 auto texts_of(char* const* values) {
   return [values, number = std::to_string(g_grouping.number)](size_t place) {
     return place == 0 ? number.c_str() : text_of(values, static_cast<Column>(place - 1));
@@ -123,7 +128,9 @@ void write_data_row(const report_row_ctx& ctx, char* const* values) {
   } else {
     std::fputs(",\n", ctx.data_fp);
   }
-  write_data_fields(ctx.data_fp, kColumns, texts_of(values), kDuplicateModule);
+  ctx.fleet == nullptr
+      ? write_data_fields(ctx.data_fp, kColumns, texts_of(values), kDuplicateModule)
+      : write_data_fields(ctx.data_fp, kFleetColumns, texts_of(values), kDuplicateModule);
 }
 
 int duplicate_row_writer(void* context, int /*columns*/, char** values, char** names) noexcept {
@@ -142,7 +149,10 @@ int duplicate_row_writer(void* context, int /*columns*/, char** values, char** n
     return 0;
   }
   number_row(values);
-  if (g_tally) {
+  if (g_tally && ctx->fleet != nullptr) {
+    // Where it lies none but its server can look.
+    g_tally->file(nullptr, (text_of(values, kShare) + std::string(text_of(values, kPath))).c_str());
+  } else if (g_tally) {
     g_tally->file(VLIBCSzHashGetValue(ctx->share_path_hash, text_of(values, kShare)),
                   text_of(values, kPath));
   }
@@ -170,6 +180,13 @@ constexpr StatisticsReport kByNameAndSize{
     .share_paths = SharePaths::kImported,
     .columns = {},
     .row_writer = duplicate_row_writer,
+    // Names are compared by a hash, so that the pairs of a billion files fit into memory.
+    .fleet_sql =
+        "select concat(server, ':', share), path, size, mtime, filename from file where {runs} and "
+        "(size, sipHash64(filename, filename_number)) global in "
+        "(select size, sipHash64(filename, filename_number) from file where {runs} "
+        "group by size, sipHash64(filename, filename_number) having count() > 1) "
+        "order by size desc, filename_number, filename, server, share, path, mtime",
 };
 
 constexpr StatisticsReport kBySize{
@@ -239,8 +256,10 @@ int32_t duplicate_file(ReportArgs* args) {
   QAZLLNode* groups = nullptr;
   args->dup_list = &candidates;
   args->dup_group_list = &groups;
-  const int32_t result = compares_content(args->profile_hash) ? report_by_content(*args)
-                                                              : report_by_name_and_size(*args);
+  const bool by_content = compares_content(args->profile_hash);
+  const int32_t result = !by_content              ? report_by_name_and_size(*args)
+                         : args->fleet != nullptr ? report_fleet_content(*args)
+                                                  : report_by_content(*args);
   release_bucket(&groups, &candidates);
   args->dup_list = nullptr;
   args->dup_group_list = nullptr;

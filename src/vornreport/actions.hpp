@@ -2,6 +2,7 @@
 // the profile name, a null pointer ends them) or null; main ignores the results.
 #pragma once
 
+#include "report_format/facts.hpp"
 #include "vorn/text.h"
 #include "vornreport/fixed_text.hpp"
 
@@ -32,6 +33,8 @@ void drop_snapshot();
 // Closes the facts of the run: writes them as a block of the data file and as report.json into the
 // dated working folder. False, logged, when a part of that failed; the run's data is lost then.
 bool close_facts(const VLIBCSzHash* profile_hash, const char* data_path);
+// Writes facts as the block and as the file in the folder. False, logged, when not both are there.
+bool write_facts(const report_format::Facts& facts, const char* date_dir, const char* data_path);
 // Completes the page and moves it into the dated working folder. The number of selected reports;
 // 0 when none is known; -1 on failure.
 int build_report_html(const char* profile, const VLIBCSzHash* profile_hash, const char* data_path);

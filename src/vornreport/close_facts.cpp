@@ -84,6 +84,15 @@ bool write_text(const char* path, const char* mode, const std::string& text) {
 
 }  // namespace
 
+bool write_facts(const report_format::Facts& facts, const char* date_dir, const char* data_path) {
+  const std::string line = report_format::to_line(facts);
+  PathText path;
+  path.format("%s/%s", date_dir, report_format::kFactsFile);
+  const std::string block = std::string("<script type='text/javascript'>\nvar ") +
+                            report_format::kFactsVariable + " = " + line + ";\n</script>\n";
+  return write_text(data_path, "a", block) && write_text(path.c_str(), "w", line + "\n");
+}
+
 bool close_facts(const VLIBCSzHash* profile_hash, const char* data_path) {
   const char* date_dir = set_value(profile_hash, "real_path_date");
   const char* report_list = set_value(profile_hash, "report_list");
@@ -93,12 +102,7 @@ bool close_facts(const VLIBCSzHash* profile_hash, const char* data_path) {
   measure_when_old(report_list);
   // The history comes first: that it can't be read is a fact as well.
   const FactsSource source = source_of(report_list);
-  const std::string line = report_format::to_line(assemble_facts(run_facts(), tallies(), source));
-  PathText path;
-  path.format("%s/%s", date_dir, report_format::kFactsFile);
-  const std::string block = std::string("<script type='text/javascript'>\nvar ") +
-                            report_format::kFactsVariable + " = " + line + ";\n</script>\n";
-  return write_text(data_path, "a", block) && write_text(path.c_str(), "w", line + "\n");
+  return write_facts(assemble_facts(run_facts(), tallies(), source), date_dir, data_path);
 }
 
 }  // namespace vornreport

@@ -13,6 +13,7 @@
 #include "facts/run_facts.hpp"
 #include "facts/tallies.hpp"
 #include "file_gathering/file_gathering.hpp"
+#include "fleet/ship.hpp"
 #include "module.hpp"
 #include "out_of_memory.hpp"
 #include "profile.hpp"
@@ -23,6 +24,7 @@
 #include "vorn/report.h"
 #include "vorn/volume.h"
 #include "vornreport/error_log.hpp"
+#include "vornreport/fleet_rows.hpp"
 #include "vornreport/registry.hpp"
 #include "vornreport/report_data.hpp"
 #include "vornreport/statements_ahead.hpp"
@@ -179,6 +181,7 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash, bool& has_
     keep_snapshot();
   }
   progress_phase(report_format::Phase::kPublishing);
+  ship_run(set_value(profile_hash, "real_path_report_final"));
   publish_report(profile, profile_hash);
   return 0;
 }
@@ -234,6 +237,7 @@ int create_report_data(const char* profile, const VLIBCSzHash* profile_hash, cha
   if (report_format::is_selected(report_format::kFileOwner.name, report_list)) {
     note_owner_names(look_ups.users.get());
   }
+  ship_rows(profile_hash, {look_ups.users.get(), look_ups.volumes.get(), look_ups.shares.get()});
   return result;
 }
 
@@ -274,6 +278,7 @@ int report_action(char** args) {
   remove_when_terminated(stat_db, profile);
   end_without_memory(profile, hash.get());
   begin_facts(profile, hash.get());
+  begin_fleet_rows(hash.get());
   progress_begin(profile, count_selected(hash.get()));
   bool has_snapshot = false;
   const int result = end_run(profile, hash.get(), make_report(profile, hash.get(), has_snapshot));

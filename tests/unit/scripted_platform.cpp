@@ -8,6 +8,7 @@
 
 #include "base/text_containers.hpp"
 #include "vorn/config.h"
+#include "vorn/fleet.h"
 #include "vorn/report.h"
 #include "vorn/share.h"
 #include "vorn/user.h"
@@ -258,6 +259,33 @@ int VornQazGetHostName(char* out, size_t size) {
 
 int VornQazGetTimeZone(char* out, size_t size) {
   return copied("Europe/Berlin", out, size);
+}
+
+// No fleet is configured.
+int VORNFleetOpen(VORNFleet** fleet) {
+  *fleet = nullptr;
+  return 1;
+}
+void VORNFleetClose(VORNFleet* /*fleet*/) {}
+const char* VORNFleetServer(const VORNFleet* /*fleet*/) {
+  return "";
+}
+const char* VORNFleetProblem(const VORNFleet* /*fleet*/) {
+  return "";
+}
+int VORNFleetInsert(VORNFleet* /*fleet*/, const char* /*table*/, VORNFleetSource /*source*/,
+                    void* /*context*/) {
+  return -1;
+}
+int VORNFleetSelect(VORNFleet* /*fleet*/, const char* /*sql*/, VORNFleetRow /*row*/,
+                    void* /*context*/) {
+  return -1;
+}
+int VORNFleetReportBegin(const char* /*folder*/, VLIBCSzHash** /*hash*/) {
+  return -1;
+}
+int VORNFleetReportEnd(int /*is_made*/) {
+  return -1;
 }
 
 int VornQazProgressUpdate(const char* /*profile*/, const char* text) {

@@ -52,6 +52,7 @@ inline constexpr IncidentKind kIncidentKinds[] = {
     {"history_lost", IncidentLevel::kWarning, false},
     {"compare_stopped", IncidentLevel::kError, false},
     {"fleet_unreachable", IncidentLevel::kWarning, false},
+    {"server_overdue", IncidentLevel::kWarning, false},
     {"index_refused", IncidentLevel::kWarning, false},
 };
 // Null for an unknown kind.

@@ -1,0 +1,357 @@
+#include "ship.hpp"
+
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <chrono>
+#include <functional>
+#include <limits>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <utility>
+#include <vector>
+
+#include "db_snapshots.hpp"
+#include "facts/run_facts.hpp"
+#include "facts/tallies.hpp"
+#include "report_format/facts_file.hpp"
+#include "report_format/fleet.hpp"
+#include "report_format/reports.hpp"
+#include "vorn/fleet.h"
+#include "vorn/user.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/fleet_rows.hpp"
+#include "vornreport/fleet_source.hpp"
+#include "vornreport/statistics_db.hpp"
+
+namespace vornreport {
+namespace {
+
+constexpr char kModule[] = "src/fleet";
+constexpr size_t kRowsOfBatch = 100'000;
+constexpr int kAttempts = 2;
+
+using report_format::append_fleet_text;
+
+// A sent run that waits for its line.
+struct Sent {
+  FleetHandle fleet;
+  std::string prefix;    // what each row begins with: server, profile and run
+  int64_t interval = 0;  // seconds since the run before; 0 when that isn't known
+};
+std::optional<Sent> g_sent;
+
+// The number under which one attempt's rows stand; see report_format/fleet.hpp.
+uint64_t new_run_number() {
+  const auto now = std::chrono::duration_cast<std::chrono::microseconds>(
+      std::chrono::system_clock::now().time_since_epoch());
+  return static_cast<uint64_t>(run_facts().started) * report_format::kRunsInSecond +
+         static_cast<uint64_t>(now.count()) % report_format::kRunsInSecond;
+}
+
+std::string prefix_of(const VORNFleet* fleet) {
+  std::string prefix;
+  append_fleet_text(prefix, VORNFleetServer(fleet));
+  prefix += '\t';
+  append_fleet_text(prefix, run_facts().profile);
+  return prefix + '\t' + std::to_string(new_run_number()) + '\t';
+}
+
+void append_number(std::string& out, int64_t value) {
+  std::array<char, 24> digits;
+  out.append(digits.data(), std::to_chars(digits.data(), digits.data() + digits.size(), value).ptr);
+}
+
+// --- Rows, one after another ---------------------------------------------------------------------
+
+enum class Next : uint8_t { kRow, kEnd, kFailed };
+// Appends the next row to `out`, with its line end.
+using NextRow = std::function<Next(std::string& out)>;
+
+// A batch of rows as the bytes that the platform asks for.
+class Batch {
+ public:
+  explicit Batch(const NextRow& next) : next_(next) {}
+
+  size_t read(char* out, size_t size) {
+    pending_.erase(0, std::exchange(at_, 0));  // less than a row is left of the last time
+    while (pending_.size() < size && last_ == Next::kRow && rows_ < kRowsOfBatch) {
+      last_ = next_(pending_);
+      rows_ += last_ == Next::kRow ? 1 : 0;
+    }
+    at_ = pending_.copy(out, size);
+    return at_;
+  }
+  // Puts the row in front of what is read: it was asked for to see whether there is one.
+  void begin_with(std::string row) {
+    pending_ = std::move(row);
+    rows_ = 1;
+  }
+  Next last() const { return last_; }
+
+ private:
+  const NextRow& next_;
+  std::string pending_;
+  size_t at_ = 0;  // what of it has been read
+  size_t rows_ = 0;
+  Next last_ = Next::kRow;
+};
+
+// All rows, batch by batch. An engine that takes a batch takes all of it.
+bool send(VORNFleet* fleet, const char* table, const NextRow& next) {
+  for (;;) {
+    std::string first;
+    if (const Next found = next(first); found != Next::kRow) {
+      return found == Next::kEnd;
+    }
+    Batch batch(next);
+    batch.begin_with(std::move(first));
+    const auto source = [](void* context, char* out, size_t size) {
+      return static_cast<Batch*>(context)->read(out, size);
+    };
+    const bool was_sent = VORNFleetInsert(fleet, table, source, &batch) == 0;
+    if (!was_sent || batch.last() != Next::kRow) {
+      return was_sent && batch.last() == Next::kEnd;
+    }
+  }
+}
+
+// --- Files ---------------------------------------------------------------------------------------
+
+using Statement = std::unique_ptr<sqlite3_stmt, ReleaseWith<&sqlite3_finalize>>;
+
+// The rows of the statistics database in their order.
+class FileRows {
+ public:
+  FileRows(const VLIBCSzHash* profile_hash, const VLIBCSzHash* users, const std::string& prefix)
+      : users_(users), prefix_(prefix) {
+    const char* list = set_value(profile_hash, "report_list");
+    tells_owners_ =
+        list != nullptr && report_format::is_selected(report_format::kFileOwner.name, list);
+    const char* path = set_value(profile_hash, "real_path_stat_db");
+    is_absent_ = path == nullptr || access(path, F_OK) != 0;
+    db_ = is_absent_ ? nullptr : open_further(path);
+    sqlite3_stmt* made = nullptr;
+    if (db_ &&
+        sqlite3_prepare_v2(
+            db_.get(), "select id, owner, mtime, size, share, path, filename, ext from file_stat",
+            -1, &made, nullptr) != SQLITE_OK) {
+      REPORT_LOG_ERR(kModule, __LINE__, "%s\n", sqlite3_errmsg(db_.get()));
+    }
+    rows_.reset(made);
+  }
+
+  Next next(std::string& out) {
+    if (is_absent_) {
+      return Next::kEnd;  // nothing was gathered
+    }
+    const int result = rows_ ? sqlite3_step(rows_.get()) : SQLITE_ERROR;
+    if (result != SQLITE_ROW) {
+      if (result != SQLITE_DONE) {
+        REPORT_LOG_ERR(kModule, __LINE__, "rows can't be read: %s\n",
+                       db_ ? sqlite3_errmsg(db_.get()) : "no database");
+      }
+      return result == SQLITE_DONE ? Next::kEnd : Next::kFailed;
+    }
+    append(out);
+    return Next::kRow;
+  }
+
+ private:
+  enum Column { kId, kOwner, kTime, kSize, kShare, kPath, kName, kType };
+
+  void append(std::string& out) {
+    out += prefix_;
+    number(out, kId);
+    number(out, kOwner);
+    out += owner_name(sqlite3_column_int64(rows_.get(), kOwner));
+    out += '\t';
+    number(out, kTime);
+    number(out, kSize);
+    text(out, kShare, '\t');
+    text(out, kPath, '\t');
+    const int type = sqlite3_column_type(rows_.get(), kName);
+    const double value = type == SQLITE_INTEGER || type == SQLITE_FLOAT
+                             ? sqlite3_column_double(rows_.get(), kName)
+                             : std::numeric_limits<double>::infinity();
+    text(out, kName, '\t');
+    std::array<char, 32> digits;
+    out.append(digits.data(),
+               std::to_chars(digits.data(), digits.data() + digits.size(), value).ptr);
+    out += '\t';
+    text(out, kType, '\n');
+  }
+
+  void number(std::string& out, Column column) {
+    append_number(out, sqlite3_column_int64(rows_.get(), column));
+    out += '\t';
+  }
+
+  void text(std::string& out, Column column, char end) {
+    const auto* bytes = sqlite3_column_text(rows_.get(), column);
+    append_fleet_text(out, {reinterpret_cast<const char*>(bytes),
+                            static_cast<size_t>(sqlite3_column_bytes(rows_.get(), column))});
+    out += end;
+  }
+
+  // Escaped; empty for one that reports don't tell.
+  const std::string& owner_name(int64_t id) {
+    const auto [place, is_new] = names_.try_emplace(id);
+    VORNUser* user = nullptr;
+    if (is_new && tells_owners_ && VORNUserGetByUID(static_cast<uid_t>(id), &user) >= 0) {
+      const UserHandle owned(user);
+      if (user != nullptr && !is_unset(user->name) &&
+          VLIBCSzHashGetValue(users_, user->name) != nullptr) {
+        append_fleet_text(place->second, user->name);
+      }
+    }
+    return place->second;
+  }
+
+  const VLIBCSzHash* users_;
+  const std::string& prefix_;
+  bool tells_owners_ = false, is_absent_ = false;
+  SqliteHandle db_;
+  Statement rows_;
+  std::unordered_map<int64_t, std::string> names_;
+};
+
+// --- What was kept -------------------------------------------------------------------------------
+
+NextRow lines_of(FILE* file, const std::string& prefix) {
+  return [file, &prefix](std::string& out) {
+    const size_t before = out.size();
+    out += prefix;
+    std::array<char, 4096> piece;
+    while (std::fgets(piece.data(), static_cast<int>(piece.size()), file) != nullptr) {
+      out += piece.data();
+      if (out.back() == '\n') {
+        return Next::kRow;
+      }
+    }
+    out.resize(before);
+    return std::ferror(file) != 0 ? Next::kFailed : Next::kEnd;
+  };
+}
+
+// What the names of the shares stand for.
+void keep_shares(const ShipLookUps& look_ups) {
+  for (const ShareTally& share : tallies().shares()) {
+    const char* folder = VLIBCSzHashGetValue(look_ups.shares, share.name().c_str());
+    const char* volume = VLIBCSzHashGetValue(look_ups.volumes, share.name().c_str());
+    keep_fleet_row(
+        "share", {share.name(), folder != nullptr ? folder : "", volume != nullptr ? volume : ""});
+  }
+}
+
+// --- A run ---------------------------------------------------------------------------------------
+
+bool send_rows(VORNFleet* fleet, const std::string& prefix, const VLIBCSzHash* profile_hash,
+               const VLIBCSzHash* users) {
+  FILE* rows = kept_report_rows();
+  FILE* members = kept_content_members();
+  if (rows == nullptr || members == nullptr) {
+    return false;
+  }
+  FileRows files(profile_hash, users, prefix);
+  return send(fleet, report_format::kFleetFile.name,
+              [&](std::string& out) { return files.next(out); }) &&
+         send(fleet, report_format::kFleetRow.name, lines_of(rows, prefix)) &&
+         send(fleet, report_format::kFleetContent.name, lines_of(members, prefix));
+}
+
+void tell(const VORNFleet* fleet) {
+  const std::string problem = VORNFleetProblem(fleet);
+  record_incident("fleet_unreachable", "fleet",
+                  "this run is missing from the fleet: " +
+                      (problem.empty() ? "its rows can't be read; the log says why" : problem));
+}
+
+// The longest time that has lately passed between two of the profile's runs; 0 for its first.
+int64_t interval_of_runs() {
+  constexpr size_t kLooksBack = 3;
+  std::vector<int64_t> times = SnapshotTimes(run_facts().profile).value_or(std::vector<int64_t>{});
+  std::erase_if(times, [](int64_t time) { return time >= run_facts().started; });
+  times.push_back(run_facts().started);
+  int64_t longest = 0;
+  for (size_t i = times.size() - 1; i > 0 && i + kLooksBack >= times.size(); --i) {
+    longest = std::max(longest, times[i] - times[i - 1]);
+  }
+  return longest;
+}
+
+// The one row of the run's line.
+NextRow line_of(std::string row) {
+  return [row = std::move(row), is_done = false](std::string& out) mutable {
+    if (std::exchange(is_done, true)) {
+      return Next::kEnd;
+    }
+    out += row;
+    return Next::kRow;
+  };
+}
+
+}  // namespace
+
+void ship_rows(const VLIBCSzHash* profile_hash, const ShipLookUps& look_ups) {
+  if (!keeps_fleet_rows()) {
+    return;
+  }
+  keep_shares(look_ups);
+  VORNFleet* opened = nullptr;
+  const int found = VORNFleetOpen(&opened);
+  FleetHandle fleet(opened);
+  if (found > 0) {
+    record_incident("fleet_unreachable", "fleet",
+                    "this run is missing from the fleet: no engine is configured; run vornctl "
+                    "fleet set, or remove fleet = true from the profile");
+    return;
+  }
+  for (int attempt = 0; found == 0 && attempt < kAttempts; ++attempt) {
+    const std::string prefix = prefix_of(fleet.get());
+    if (send_rows(fleet.get(), prefix, profile_hash, look_ups.users)) {
+      g_sent = Sent{std::move(fleet), prefix, interval_of_runs()};
+      return;
+    }
+  }
+  tell(fleet.get());
+}
+
+void ship_run(const char* facts_path) {
+  if (!g_sent) {
+    return;
+  }
+  const std::string path = facts_path;
+  const auto facts = report_format::read_facts(path.substr(0, path.rfind('/')));
+  if (!facts) {
+    return;  // the run fails over it
+  }
+  uint64_t files = 0;
+  uint64_t bytes = 0;
+  for (const ShareTally& share : tallies().shares()) {
+    files += share.total().files;
+    bytes += share.total().bytes;
+  }
+  std::string row = g_sent->prefix;
+  for (const int64_t value : {facts->started, facts->finished, static_cast<int64_t>(files),
+                              static_cast<int64_t>(bytes), g_sent->interval}) {
+    append_number(row, value);
+    row += '\t';
+  }
+  append_fleet_text(row, report_format::to_line(*facts));
+  row += '\n';
+  for (int attempt = 0; attempt < kAttempts; ++attempt) {
+    if (send(g_sent->fleet.get(), report_format::kFleetRun.name, line_of(row))) {
+      return;
+    }
+  }
+  REPORT_LOG_ERR(kModule, __LINE__, "this run is missing from the fleet: %s\n",
+                 VORNFleetProblem(g_sent->fleet.get()));
+}
+
+}  // namespace vornreport

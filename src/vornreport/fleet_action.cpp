@@ -1,0 +1,321 @@
+#include "fleet_action.hpp"
+
+#include <csignal>
+#include <cstdlib>
+#include <ctime>
+#include <optional>
+#include <set>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "actions.hpp"
+#include "facts/fleet_facts.hpp"
+#include "facts/run_facts.hpp"
+#include "module.hpp"
+#include "out_of_memory.hpp"
+#include "report_format/fleet.hpp"
+#include "report_format/reports.hpp"
+#include "shell.hpp"
+#include "sigterm.hpp"
+#include "vorn/paths.h"
+#include "vorn/report.h"
+#include "vornreport/error_log.hpp"
+#include "vornreport/fleet_source.hpp"
+#include "vornreport/registry.hpp"
+#include "vornreport/report_data.hpp"
+
+namespace vornreport {
+namespace {
+
+using report_format::fleet_literal;
+
+constexpr char kProfile[] = "fleet";  // on the page, and in the facts
+
+void complain(const std::string& text) {
+  std::fprintf(stderr, "vornfleet: %s\n", report_format::facts_text(text).c_str());
+}
+
+// --- Which runs ----------------------------------------------------------------------------------
+
+struct Run {
+  std::string server, profile, number;
+  int64_t started = 0, interval = 0;
+};
+
+int add_run(void* context, int columns, char** values, char** /*names*/) noexcept {
+  enum Column { kServer, kProfileName, kNumber, kStarted, kInterval, kCount };
+  if (columns != kCount || values[kServer] == nullptr || values[kProfileName] == nullptr) {
+    return -1;
+  }
+  static_cast<std::vector<Run>*>(context)->push_back(
+      {values[kServer], values[kProfileName], values[kNumber],
+       std::strtoll(values[kStarted], nullptr, 10), std::strtoll(values[kInterval], nullptr, 10)});
+  return 0;
+}
+
+std::set<std::string, std::less<>> words_of(std::string_view list) {
+  std::set<std::string, std::less<>> words;
+  while (!list.empty()) {
+    std::string_view word = list.substr(0, list.find(','));
+    list.remove_prefix(std::min(word.size() + 1, list.size()));
+    word.remove_prefix(std::min(word.find_first_not_of(' '), word.size()));
+    word = word.substr(0, word.find_last_not_of(' ') + 1);
+    if (!word.empty()) {
+      words.emplace(word);
+    }
+  }
+  return words;
+}
+
+// The newest complete ones of the servers asked for; none, after a complaint, when one has none.
+std::vector<Run> choose_runs(VORNFleet* fleet, const std::string& servers) {
+  constexpr char kNewest[] =
+      "select server, profile, toString(max(run)), argMax(started, run), argMax(since_last, run) "
+      "from run group by server, profile order by server, profile";
+  std::vector<Run> runs;
+  if (VORNFleetSelect(fleet, kNewest, add_run, &runs) < 0) {
+    complain(VORNFleetProblem(fleet));
+    return {};
+  }
+  const auto wanted = words_of(servers);
+  std::set<std::string, std::less<>> found;
+  std::erase_if(runs, [&](const Run& run) {
+    found.insert(run.server);
+    return !wanted.empty() && !wanted.contains(run.server);
+  });
+  for (const std::string& name : wanted) {
+    if (!found.contains(name)) {
+      complain("the fleet has no complete run of server " + name +
+               "; vornctl fleet status lists its servers");
+      return {};
+    }
+  }
+  if (runs.empty()) {
+    complain("no server has sent a run; set fleet = true in a profile and run it");
+  }
+  return runs;
+}
+
+std::string key_of(const Run& run) {
+  return "(" + fleet_literal(run.server) + ", " + fleet_literal(run.profile) + ", " + run.number +
+         ")";
+}
+
+std::string condition_of(const std::vector<Run>& runs) {
+  std::string condition = "(server, profile, run) in (";
+  for (const Run& run : runs) {
+    condition += (condition.ends_with(')') ? ", " : "") + key_of(run);
+  }
+  return condition + ")";
+}
+
+int take_text(void* context, int columns, char** values, char** /*names*/) noexcept {
+  if (columns != 1 || values[0] == nullptr) {
+    return -1;
+  }
+  *static_cast<std::string*>(context) = values[0];
+  return 0;
+}
+
+// What each run has found out; a run whose facts can't be understood fails the report.
+std::optional<std::vector<FleetMember>> read_members(VORNFleet* fleet,
+                                                     const std::vector<Run>& runs) {
+  std::vector<FleetMember> members;
+  for (const Run& run : runs) {
+    std::string text;
+    const std::string sql =
+        "select report from run where (server, profile, run) = " + key_of(run) + " limit 1";
+    if (VORNFleetSelect(fleet, sql.c_str(), take_text, &text) < 0) {
+      complain(VORNFleetProblem(fleet));
+      return std::nullopt;
+    }
+    auto facts = report_format::facts_of(text);
+    if (!facts) {
+      complain("the facts of server " + run.server + " can't be understood; run its profile " +
+               run.profile + " again, or vornctl fleet forget it");
+      return std::nullopt;
+    }
+    members.push_back({run.server, std::move(*facts)});
+  }
+  return members;
+}
+
+// --- What the report says about the fleet itself -------------------------------------------------
+
+void tell_overdue(const std::vector<Run>& runs, int64_t now) {
+  for (const Run& run : runs) {
+    if (report_format::is_overdue(run.started, run.interval, now)) {
+      const std::string name = run.server + " (" + run.profile + ")";
+      record_incident(
+          "server_overdue", name,
+          "server " + name + " is overdue: see to its runs, or vornctl fleet forget " + run.server,
+          AlreadyLogged::kYes);
+    }
+  }
+}
+
+// A share that two profiles of a server report counts twice.
+void tell_repeated_shares(const std::vector<FleetMember>& members) {
+  std::set<std::string> seen;
+  for (const FleetMember& member : members) {
+    if (!member.facts.shares) {
+      continue;
+    }
+    for (const report_format::ShareFacts& share : *member.facts.shares) {
+      const std::string name = fleet_name(member.server, share.name);
+      if (!seen.insert(name).second) {
+        record_incident("share_overlap", name,
+                        "share " + name +
+                            " was sent by two profiles of its server, so sums count "
+                            "it twice; take fleet = true from one of them",
+                        AlreadyLogged::kYes);
+      }
+    }
+  }
+}
+
+// --- The report ----------------------------------------------------------------------------------
+
+struct FleetRun {
+  FleetSource source;
+  std::vector<FleetMember> members;
+  HashHandle profile, users, volumes, shares;
+};
+
+HashHandle new_hash() {
+  return HashHandle(VLIBCSzHashAlloc(kPlatformSlots));
+}
+
+bool set(HashHandle& hash, const char* key, const std::string& value) {
+  return with_address(hash, [&](VLIBCSzHash** raw) {
+           return VLIBCSzHashSetValue(raw, key, value.c_str());
+         }) == 0;
+}
+
+// By content where every server that looked for duplicates compared contents.
+bool all_by_content(const std::vector<FleetMember>& members) {
+  bool found = false;
+  for (const FleetMember& member : members) {
+    if (member.facts.duplicates) {
+      found = true;
+      if (!member.facts.duplicates->by_content) {
+        return false;
+      }
+    }
+  }
+  return found;
+}
+
+bool prepare(const FleetOrder& order, FleetRun& run) {
+  run.profile = new_hash();
+  run.users = new_hash();
+  run.volumes = new_hash();
+  run.shares = new_hash();
+  if (!run.profile || !run.users || !run.volumes || !run.shares ||
+      !set(run.profile, "report_list", order.reports) ||
+      !set(run.profile, "language", order.language) ||
+      !set(run.profile, "duplicate_compare", all_by_content(run.members) ? "true" : "false")) {
+    return false;
+  }
+  for (const FleetMember& member : run.members) {
+    if (!member.facts.shares) {
+      continue;
+    }
+    for (const report_format::ShareFacts& share : *member.facts.shares) {
+      set(run.shares, fleet_name(member.server, share.name).c_str(), share.path);
+    }
+  }
+  return with_address(run.profile, [&](VLIBCSzHash** hash) {
+           return VORNFleetReportBegin(order.folder.c_str(), hash);
+         }) == 0;
+}
+
+void run_reports(FleetRun& run, const std::string& report_list) {
+  for (const ReportEntry& entry : report_registry()) {
+    if (!is_selected(entry, report_list.c_str())) {
+      continue;
+    }
+    ReportArgs args{kProfile,         run.profile.get(), run.users.get(), run.volumes.get(),
+                    run.shares.get(), nullptr,           nullptr,         0,
+                    &run.source};
+    if (entry.report(&args) < 0) {
+      const bool lacks_quotas = entry.name == std::string_view(report_format::kQuotaUsage.name) &&
+                                run_facts().rows[entry.name].rows == 0;
+      if (!lacks_quotas) {
+        tell_failed_report(entry.name);
+      }
+    }
+  }
+}
+
+FactsSource facts_source(const FleetOrder& order) {
+  std::array<char, 256> text{};
+  FactsSource source;
+  source.host = VornQazGetHostName(text.data(), text.size()) < 0 ? "" : text.data();
+  source.time_zone = VornQazGetTimeZone(text.data(), text.size()) < 0 ? "" : text.data();
+  source.now = std::time(nullptr);
+  source.report_list = order.reports;
+  source.has_walked = true;
+  return source;
+}
+
+// False, logged, when there is no whole page.
+bool make_page(const FleetOrder& order, FleetRun& run) {
+  const PathText data_path = report_data_path();
+  run_command(kDriverModule, __LINE__, VORN_PATH_TEMPLATE_SCRIPT " header %s", data_path.c_str());
+  std::array<char, 8> language{};
+  if (VornQazImportLang(run.profile.get(), language.data(), language.size()) < 0) {
+    return false;
+  }
+  run_facts().language = language.data();
+  run_command(kDriverModule, __LINE__, VORN_PATH_TEMPLATE_SCRIPT " lang %s %s", data_path.c_str(),
+              language.data());
+  run_reports(run, order.reports);
+  const char* date_dir = set_value(run.profile.get(), "real_path_date");
+  return date_dir != nullptr && !report_data_lost() &&
+         write_facts(fleet_facts(std::move(run.members), run_facts(), facts_source(order)),
+                     date_dir, data_path.c_str()) &&
+         build_report_html(kProfile, run.profile.get(), data_path.c_str()) > 0 &&
+         !report_data_lost() && correct_report_dir(kProfile, run.profile.get()) == 0 &&
+         !report_data_lost();
+}
+
+}  // namespace
+
+std::string fleet_report(const FleetOrder& order) {
+  end_without_memory(nullptr, nullptr);
+  VornQazSetEnv();
+  setup_signal(SIGTERM);
+  listen_for_incidents();
+  run_facts().profile = kProfile;
+  run_facts().started = std::time(nullptr);
+  VORNFleet* opened = nullptr;
+  const int found = VORNFleetOpen(&opened);
+  const FleetHandle fleet(opened);
+  if (found != 0) {
+    complain(found > 0 ? "no fleet is configured; run vornctl fleet set --url URL"
+                       : VORNFleetProblem(fleet.get()));
+    return "";
+  }
+  const std::vector<Run> runs = choose_runs(fleet.get(), order.servers);
+  auto members = runs.empty() ? std::nullopt : read_members(fleet.get(), runs);
+  if (!members) {
+    return "";
+  }
+  FleetRun run{{fleet.get(), condition_of(runs)}, std::move(*members), {}, {}, {}, {}};
+  tell_overdue(runs, run_facts().started);
+  tell_repeated_shares(run.members);
+  take_over_incidents(run.members);
+  if (!prepare(order, run)) {
+    return "";
+  }
+  const bool is_made = make_page(order, run);
+  if (VORNFleetReportEnd(is_made ? 1 : 0) < 0) {
+    return "";
+  }
+  const char* page = set_value(run.profile.get(), "real_path_report_final");
+  return page != nullptr ? page : "";
+}
+
+}  // namespace vornreport
