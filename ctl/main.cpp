@@ -12,6 +12,7 @@
 #include "base/ctl.hpp"
 #include "config/commands.hpp"
 #include "doctor/commands.hpp"
+#include "fleet/commands.hpp"
 #include "run/commands.hpp"
 #include "schedule/commands.hpp"
 #include "vorn/admin/messages.hpp"
@@ -68,6 +69,7 @@ void run(int argc, char** argv) {
   ctl::add_status_command(app);
   ctl::add_reports_command(app);
   ctl::add_log_command(app);
+  ctl::add_fleet_commands(app);
   ctl::add_doctor_command(app);
 
   // Hidden, and asked for before anything is parsed: what it is asked about is no command yet.

@@ -52,30 +52,34 @@ PROGRAM = 'facts ground format api'
 # stand further down, so that no arrow runs back up. What stands in brackets tells the files of a
 # room apart: each report sees its own only.
 ROOMS = {
-    'main': (r'src/main\.cpp', 'driver'),
+    'main': (r'src/(?:fleet_)?main\.cpp', 'driver'),
     'registry': (r'src/vornreport/registry\.cpp', 'driver report ' + PROGRAM),
     'driver': (r'src/vornreport/.*|include/vornreport/registry\.hpp',
-               'global gathering history ' + PROGRAM),
+               'global gathering fleet history ' + PROGRAM),
     'global': (r'src/global\.cpp|include/vornreport/global\.hpp', 'report ' + PROGRAM),
     'report': (r'src/rep_([a-z_]+)[./].*', 'frame history ' + PROGRAM),
     'frame': (r'src/(?:report_frame|listed_report)\..*', PROGRAM),
     'gathering': (r'src/file_gathering/.*', PROGRAM),
+    'fleet': (r'src/fleet/.*', 'history ' + PROGRAM),
     'history': (r'src/(?:history_db|db_volume_usage|db_snapshots)\..*', PROGRAM),
     'facts': (r'src/facts/.*', 'ground format api'),
-    'ground': (r'src/(?:shell|below_share|error_log|report_data|signals_blocked|statements_ahead|'
-               r'thread_count)\..*|include/vornreport/.*', 'format api'),
+    'ground': (r'src/(?:shell|below_share|error_log|fleet_rows|fleet_source|report_data|'
+               r'signals_blocked|statements_ahead|thread_count)\..*|include/vornreport/.*', 'format api'),
 
-    'ctl-main': (r'ctl/main\.cpp', 'doctor run config schedule ctl-base ' + CONTRACTS),
+    'ctl-main': (r'ctl/main\.cpp', 'doctor ctl-fleet run config schedule ctl-base ' + CONTRACTS),
     'doctor': (r'ctl/doctor/.*', 'run config schedule ctl-base ' + CONTRACTS),
+    'ctl-fleet': (r'ctl/fleet/.*', 'run ctl-base ' + CONTRACTS),
     'run': (r'ctl/run/.*', 'schedule ctl-base ' + CONTRACTS),
     'config': (r'ctl/config/.*', 'schedule ctl-base ' + CONTRACTS),
     'schedule': (r'ctl/schedule/.*', 'ctl-base ' + CONTRACTS),
     'ctl-base': (r'ctl/base/.*', CONTRACTS),
 
     'admin': (r'platform/host/admin/(?!include/).*',
-              'host-outcome host-schedule host-mail host-run host-machine host-config host-base ' +
-              CONTRACTS),
+              'host-fleet host-outcome host-schedule host-mail host-run host-machine host-config '
+              'host-base ' + CONTRACTS),
     'admin-contract': (r'platform/host/admin/include/.*', 'format'),
+    'host-fleet': (r'platform/host/fleet/.*', 'host-outcome host-run host-config host-base format '
+                   'base-contract api'),
     'host-outcome': (r'platform/host/outcome/.*', 'host-schedule host-mail host-run host-config '
                      'host-base format base-contract api'),
     'host-schedule': (r'platform/host/schedule/.*', 'base-contract api'),

@@ -1,0 +1,152 @@
+#!/usr/bin/python3
+"""Measures a fleet on two engines on this machine (as root: packages clickhouse-server, -client).
+
+    bench/fleet.py FOLDER [--ship FILES] [--rows N] [--servers N] [--build DIR]
+
+    ship    a run over a tree of FILES files, without a fleet and with one: what the sending costs,
+            and the peak memory of both
+    report  N rows of as many servers as --servers, on two shards: bytes a row on disk, and the time
+            of each of the reports over the fleet and of all nine
+"""
+import argparse
+import os
+import re
+import statistics
+import subprocess
+import sys
+import tempfile
+import time
+import unittest
+from pathlib import Path
+
+ROOT = Path(__file__).resolve().parents[1]
+sys.path.insert(0, str(ROOT / 'tests/e2e'))
+sys.path.insert(0, str(ROOT / 'bench'))
+NINE = ('quota_usage', 'file_owner', 'volume_usage', 'share_list', 'file_group', 'duplicate_file',
+        'large_file', 'least_modify', 'most_modify')
+BATCH = 1_000_000
+
+
+def machine(folder, build, name):
+    from harness import Machine
+    base = Path(tempfile.mkdtemp(prefix='vorn-', dir=folder))
+    subprocess.run(['cmake', '--install', str(build)], check=True, stdout=subprocess.DEVNULL,
+                   env=os.environ | {'DESTDIR': str(base / 'built')})
+    made = Machine(base, base / 'built')
+    made.log = made.new_log()
+    return made
+
+
+def timed(made, *command):
+    """Seconds, and the greatest memory in MiB, of a program in the product's place."""
+    from reports import WATCH
+    done = subprocess.run(made.sandbox(made.log) + ['--', sys.executable, '-c', WATCH, *command],
+                          stdout=subprocess.PIPE, check=True, text=True)
+    seconds, _, memory = map(float, done.stdout.split()[-3:])
+    return seconds, memory
+
+
+def ship(options, shards):
+    import gather
+    tree = options.folder / 'vornreport-bench-tree'
+    gather.make_tree(tree, options.ship)
+    made = machine(options.folder, options.build, 'ship')
+    made.share('files', tree)
+    lists = ','.join(name for name in NINE) + ',folder_usage,file_age,coverage'
+    made.profile('alone', report_list=lists)
+    made.profile('fleet', report_list=lists, fleet='true')
+    ctl(made, 'fleet', 'set', '--url', shards.urls, '--cluster', 'shards')
+    ctl(made, 'fleet', 'init')
+    found = {name: [] for name in ('alone', 'fleet')}
+    for _ in range(options.rounds + 1):
+        for name, results in found.items():
+            results.append(timed(made, '/usr/vorn/bin/vornreport', '--report', name))
+    medians = {name: statistics.median(r[0] for r in results[1:]) for name, results in found.items()}
+    memory = {name: max(r[1] for r in results[1:]) for name, results in found.items()}
+    print(f"a run over {options.ship} files: {medians['alone']:.2f} s, {memory['alone']:.0f} MiB; with "
+          f"a fleet {medians['fleet']:.2f} s, {memory['fleet']:.0f} MiB: "
+          f"{100 * (medians['fleet'] / medians['alone'] - 1):.0f} % more time")
+
+
+def ctl(made, *arguments):
+    done = subprocess.run(made.sandbox(made.log) + ['--', '/usr/vorn/bin/vornctl', *map(str, arguments)],
+                          text=True, capture_output=True)
+    if done.returncode not in (0, 3):
+        sys.exit(done.stdout + done.stderr)
+    return done.stdout
+
+
+def fill(options, shards):
+    """Rows as a walk has them: paths in folders, sizes of all kinds, one file in five a duplicate."""
+    rows = options.rows // options.servers
+    for server in range(options.servers):
+        for first in range(0, rows, BATCH):
+            count = min(BATCH, rows - first)
+            shards.ask(f"""insert into file select 'server{server}', 'weekly', {10 ** 15 + server},
+                toInt64(n), 1000 + cityHash64(n, {server}) % 20, concat('user', toString(1000 +
+                cityHash64(n, {server}) % 20)), toInt64(1600000000 + cityHash64(n, 7, {server}) % 160000000),
+                toInt64(if(n % 5 = 0, 4096 + n % 100000, exp2(cityHash64(n, {server}, 3) % 300 / 10) +
+                cityHash64(n, 5) % 4096)), concat('share', toString(n % 8)),
+                concat('/srv/share', toString(n % 8), '/project-', toString(intDiv(n, 4000)), '/folder-',
+                toString(intDiv(n, 40)), '/', name), name, inf, concat('reportUI_file_type_', arrayElement(
+                ['image', 'document', 'video', 'archive', 'text', 'other'], 1 + n % 6))
+                from (select number + {first} as n, concat(arrayElement(['report', 'IMG', 'draft',
+                'model', 'notes'], 1 + number % 5), '_', toString(if((number + {first}) % 5 = 0,
+                (number + {first}) % 100000, cityHash64(number + {first}, {server}) % 10000000)),
+                arrayElement(['.jpg', '.pdf', '.mp4', '.zip', '.txt', ''], 1 + number % 6)) as name
+                from numbers({count}))""")
+        now = int(time.time())
+        facts = '{"format": 1, "shares": [' + ', '.join(
+            f'{{"name": "share{i}", "path": "/srv/share{i}"}}' for i in range(8)) + ']}'
+        for i in range(8):
+            shards.ask(f"""insert into report_row values ('server{server}', 'weekly',
+                {10 ** 15 + server}, 'share', {i}, ['share{i}', '/srv/share{i}', '/srv'])""")
+        shards.ask(f"""insert into run values ('server{server}', 'weekly', {10 ** 15 + server}, {now},
+            {now}, {rows}, 0, 0, '{facts}')""")
+    time.sleep(2)  # for what goes from shard to shard
+
+
+def report(options, shards):
+    made = machine(options.folder, options.build, 'report')
+    ctl(made, 'fleet', 'set', '--url', shards.urls, '--cluster', 'shards')
+    ctl(made, 'fleet', 'init')
+    fill(options, shards)
+    on_disk = [engine.ask("select sum(bytes_on_disk), sum(rows) from system.parts where active and "
+                          "table = 'file_part'").split() for engine in shards.engines]
+    size, rows = (sum(int(one[i]) for one in on_disk) for i in (0, 1))
+    print(f"{rows} rows on {len(shards.engines)} shards ({', '.join(one[1] for one in on_disk)}): "
+          f"{size / rows:.0f} bytes a row")
+    for names in (*((name,) for name in NINE), NINE):
+        seconds = []
+        for _ in range(options.rounds):
+            begin = time.monotonic()
+            ctl(made, 'fleet', 'report', made.base / 'reports', '--reports', ','.join(names))
+            seconds.append(time.monotonic() - begin)
+        print(f"{names[0] if len(names) == 1 else 'all nine'}: {statistics.median(seconds):.2f} s",
+              flush=True)
+
+
+class Bench(unittest.TestCase):
+    """The engines end with it."""
+    options = None
+
+    def test(self):
+        from engine import Shards
+        shards = Shards(self)
+        if self.options.ship:
+            ship(self.options, shards)
+        if self.options.rows:
+            report(self.options, shards)
+
+
+if __name__ == '__main__':
+    parser = argparse.ArgumentParser()
+    parser.add_argument('folder', type=Path)
+    parser.add_argument('--ship', type=int, default=1_000_000)
+    parser.add_argument('--rows', type=int, default=10_000_000)
+    parser.add_argument('--servers', type=int, default=10)
+    parser.add_argument('--rounds', type=int, default=3)
+    parser.add_argument('--build', type=Path, default=ROOT / 'build')
+    Bench.options = parser.parse_args()
+    os.environ['VORN_BUILD'] = str(Bench.options.build)
+    unittest.main(argv=sys.argv[:1])

@@ -1,0 +1,100 @@
+"""Real engines of a fleet on loopback: each is a server of its own with folders of its own, and all
+of them are the shards of the cluster "shards"."""
+import socket
+import subprocess
+import tempfile
+import time
+import urllib.error
+import urllib.parse
+import urllib.request
+from pathlib import Path
+
+START = 60  # seconds that no start comes near
+PASSWORD = "s'ecret \\ \"1"
+
+
+def free_ports(count):
+    sockets = [socket.socket() for _ in range(count)]
+    for one in sockets:
+        one.bind(('127.0.0.1', 0))
+    ports = [one.getsockname()[1] for one in sockets]
+    for one in sockets:
+        one.close()
+    return ports
+
+
+def text(value):
+    return str(value).replace('&', '&amp;').replace('<', '&lt;')
+
+
+class Engine:
+    """One server. `peers`: the ports of all shards for each other."""
+
+    def __init__(self, folder, ports, peers):
+        self.folder, (self.http, self.tcp, self.between) = Path(folder), ports
+        self.process = None
+        self.folder.mkdir()
+        shards = ''.join(f'<shard><replica><host>127.0.0.1</host><port>{port}</port></replica></shard>'
+                         for port in peers)
+        (self.folder / 'config.xml').write_text(f'''<yandex>
+<logger><level>warning</level><log>{self.folder}/log</log><errorlog>{self.folder}/errors</errorlog>
+</logger><http_port>{self.http}</http_port><tcp_port>{self.tcp}</tcp_port>
+<interserver_http_port>{self.between}</interserver_http_port>
+<listen_host>127.0.0.1</listen_host><path>{self.folder}/data/</path>
+<tmp_path>{self.folder}/tmp/</tmp_path><format_schema_path>{self.folder}/schemas/</format_schema_path>
+<users_config>{self.folder}/users.xml</users_config><mark_cache_size>67108864</mark_cache_size>
+<default_profile>default</default_profile><default_database>default</default_database>
+<remote_servers><shards>{shards}</shards></remote_servers></yandex>''')
+        (self.folder / 'users.xml').write_text(f'''<yandex><profiles><default>
+<max_memory_usage>4000000000</max_memory_usage></default></profiles><quotas><default/></quotas>
+<users><default><password></password><networks><ip>127.0.0.1</ip></networks>
+<profile>default</profile><quota>default</quota></default>
+<careful><password>{text(PASSWORD)}</password><networks><ip>127.0.0.1</ip></networks>
+<profile>default</profile><quota>default</quota></careful></users></yandex>''')
+        self.url = f'http://127.0.0.1:{self.http}/'
+
+    def start(self, prefix=()):
+        self.process = subprocess.Popen(
+            [*prefix, 'clickhouse-server', f'--config-file={self.folder}/config.xml'],
+            cwd=self.folder, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+            stderr=subprocess.DEVNULL)
+        end = time.monotonic() + START
+        while True:
+            try:
+                if self.ask('select 1') == '1\n':
+                    return self
+            except (urllib.error.URLError, OSError) as error:
+                if self.process.poll() is not None or time.monotonic() > end:
+                    raise AssertionError((self.folder / 'errors').read_text()) from error
+            time.sleep(0.05)
+
+    def ask(self, sql, database='default'):
+        query = urllib.parse.urlencode({'database': database})
+        with urllib.request.urlopen(f'{self.url}?{query}', sql.encode(), START) as answer:
+            return answer.read().decode(errors='surrogateescape')
+
+    def stop(self):
+        if self.process is not None:
+            self.process.kill()
+            self.process.wait()
+            self.process = None
+
+
+class Shards:
+    """Two started engines that are one cluster, for a test or a class of tests. `folders`: where
+    they keep their data, if not in a folder of theirs."""
+
+    def __init__(self, test, folders=(None, None)):
+        base = tempfile.TemporaryDirectory(prefix='vorn-engine-', dir='/var/tmp')
+        at_end = test.addClassCleanup if isinstance(test, type) else test.addCleanup
+        at_end(base.cleanup)
+        ports = free_ports(3 * len(folders))
+        self.engines = [Engine(Path(folder or base.name, str(i)), ports[3 * i:3 * i + 3], ports[1::3])
+                        for i, folder in enumerate(folders)]
+        for engine in self.engines:
+            at_end(engine.stop)
+            engine.start()
+        self.urls = ','.join(engine.url for engine in self.engines)
+
+    def ask(self, sql, database='vornreport'):
+        return self.engines[0].ask(sql, database)

@@ -1,0 +1,362 @@
+"""A fleet on real engines: two shards on loopback, and the data of several servers."""
+import json
+import os
+import signal
+import socket
+import subprocess
+import time
+import unittest
+
+from engine import PASSWORD, Shards
+from expected import DAY, Tree, csv, facts, local_time, totals
+from harness import ALL, ProductTest, make_files, needs_root, private_mounts, wait_for
+
+RUNS = 'select server, count() from run group by server order by server'
+
+ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002}
+
+
+def names_aside(text, server, volumes):
+    """A fleet's CSV file with the names that its one server has for itself."""
+    for path, name in volumes.items():
+        text = text.replace(f'"{server}:{path}"'.encode(), f'"{name}"'.encode())
+    return text.replace(f'{server}:'.encode(), b'')
+
+
+class Fleet(ProductTest):
+    @classmethod
+    def setUpClass(cls):
+        super().setUpClass()
+        cls.shards = Shards(cls)
+
+    def setUp(self):
+        super().setUp()
+        self.shards.ask('drop database if exists vornreport', 'default')
+        self.shards.engines[1].ask('drop database if exists vornreport')
+
+    def ctl(self, machine, *arguments, status=0):
+        done = machine.shell('exec /usr/vorn/bin/vornctl "$@"' if not arguments else
+                             'exec /usr/vorn/bin/vornctl ' + ' '.join(
+                                 "'" + str(a).replace("'", "'\\''") + "'" for a in arguments))
+        self.assertEqual(done.status, status, done.out + done.err)
+        return done
+
+    def server(self, name, machine=None, **keys):
+        """A machine that takes part in the fleet as `name`."""
+        machine = machine or self.new_machine()
+        machine.accounts(ACCOUNTS)
+        machine.profile('daily', report_list=ALL, fleet='true', **keys)
+        self.ctl(machine, 'fleet', 'set', '--url', self.shards.urls, '--cluster', 'shards',
+                 '--server', name)
+        return machine
+
+    def send(self, machine):
+        before = machine.report_folders('daily')
+        done = machine.run('--report', 'daily')
+        self.assertEqual((done.status, machine.status('daily')), (0, 'success'), done.log_lines)
+        self.assertEqual(machine.leftovers(), [])
+        folder = [path for path in machine.report_folders('daily') if path not in before][-1]
+        self.assertEqual(facts(folder)['incidents'], [])
+        return folder
+
+    def report(self, machine, *arguments, status=0):
+        done = self.ctl(machine, 'fleet', 'report', machine.base / 'fleet', *arguments,
+                        status=status)
+        folder = os.path.dirname(done.out.splitlines()[-1])
+        self.assertTrue(folder.startswith(f'{machine.base}/fleet/2'), done.out)
+        return type(machine.base)(folder)
+
+    def fill(self, machine, seed=0):
+        tree = Tree(machine)
+        for i in range(40):
+            tree.add('photos', f'{i % 7}/IMG_{i}.JPG', 1000 + i % 5 * 100 + seed, 'image',
+                     3001 + i % 2, i * 9)
+            tree.add('backup', f'copies/IMG_{i}.JPG', 1000 + i % 3 * 100, 'image', 3001, i * 2)
+        for name in ('007', '7', '1e3', '1000', "it's", 'tab\there', 'line\nbreak', 'b\\n', 'ü\udcff',
+                     '=1+1', '12345678901234567890', '12345678901234567891'):
+            tree.add('photos', 'odd/' + name, 3, 'other', 0)
+            tree.add('backup', 'odd/' + name, 3, 'other', 0, 200)
+        return tree
+
+    @needs_root
+    def test_fleet_of_one_is_the_server(self):
+        for keys in ({}, {'duplicate_compare': 'true'}):
+            with self.subTest(**keys):
+                name = f'files{len(keys)}'
+                m = self.server(name, volume_history='true', **keys)
+                self.fill(m)
+                self.ctl(m, 'fleet', 'init')
+                self.send(m)
+                make_files(m.base / 'shares/photos', {'new.iso': 1 << 20})
+                own = self.send(m)
+                made = self.report(m, '--servers', name)
+                volumes = {v['path']: v['id'] for v in facts(own)['volumes']}
+                self.assertEqual(sorted(p.name for p in (made / 'csv').iterdir()),
+                                 sorted(p.name for p in (own / 'csv').iterdir()))
+                for path in (own / 'csv').iterdir():
+                    # The report on volumes calls them by their paths.
+                    known = {} if path.stem == 'volume_usage' else volumes
+                    self.assertEqual(
+                        names_aside((made / 'csv' / path.name).read_bytes(), name, known),
+                        path.read_bytes(), path.name)
+
+
+    @needs_root
+    def test_fleet_of_three_is_their_union(self):
+        servers = {}
+        for number, name in enumerate(('alpha', 'b-2', 'c.example')):
+            machine = self.server(name)
+            if not servers:
+                self.ctl(machine, 'fleet', 'init')
+            servers[name] = (machine, self.fill(machine, number))
+        for machine, _ in servers.values():
+            self.send(machine)
+        first = servers['alpha'][0]
+        made = self.report(first)
+        files = [(f'{name}:{share}', *rest) for name, (_, tree) in servers.items()
+                 for share, *rest in tree.files]
+        now = time.time()
+        expected = {
+            'large_file': ('Share\tFile\tSize(Byte)', [
+                (share, path, size) for share, path, size, *_ in files]),
+            'least_modify': ('Share\tFile\tSize(Byte)\tModify Time', [
+                (*file[:3], local_time(file[3])) for file in files if file[3] < now - 90 * DAY]),
+            'most_modify': ('Share\tFile\tSize(Byte)\tModify Time', [
+                (*file[:3], local_time(file[3])) for file in files if file[3] > now - 7 * DAY]),
+            'file_owner': ('Owner\tShare\tFile Count\tSize(Byte)', [
+                (owner, share, *amount) for (owner, share), amount in totals(
+                    (({uid: name for name, uid in ACCOUNTS.items()}[file[4]], file[0]), file[2])
+                    for file in files).items()]),
+        }
+        for report, (header, rows) in expected.items():
+            lines = (made / f'csv/{report}.csv').read_bytes().splitlines()
+            wanted = csv(header, rows).splitlines()
+            self.assertEqual((lines[0], sorted(lines[1:])), (wanted[0], sorted(wanted[1:])), report)
+        # By size, and by time in both directions.
+        for report, column, step in (('large_file', 2, -1), ('least_modify', 3, 1),
+                                     ('most_modify', 3, -1)):
+            values = [line.split(b'\t')[column].strip(b'"') for line in
+                      (made / f'csv/{report}.csv').read_bytes().splitlines()[1:]]
+            values = [int(value) if column == 2 else value for value in values]
+            self.assertEqual(values, sorted(values, reverse=step < 0), report)
+        # Groups of one name and size, whatever server they lie on; 007 is 7.
+        groups = {}
+        for share, path, size, *_ in files:
+            name = os.path.basename(path)
+            name = {'007': '7', '1e3': '1000', '12345678901234567890': '1.2e19',
+                    '12345678901234567891': '1.2e19'}.get(name, name)
+            groups.setdefault((size, name), set()).add((share, path))
+        lines = (made / 'csv/duplicate_file.csv').read_bytes().splitlines()[1:]
+        found = {}
+        for line in lines:
+            number, share = line.split(b'\t')[:2]
+            found.setdefault(number, []).append(share)
+        self.assertEqual(sorted(len(group) for group in found.values()),
+                         sorted(len(group) for group in groups.values() if len(group) > 1))
+        # The facts: everything of all, by the names that the fleet gives.
+        told = facts(made)
+        own = [facts(machine.report_folders('daily')[-1]) for machine, _ in servers.values()]
+        for key in ('shares', 'types', 'owners'):
+            self.assertEqual(sum(entry['bytes'] for entry in told[key]),
+                             sum(entry['bytes'] for facts_ in own for entry in facts_[key]), key)
+        self.assertEqual({share['name'] for share in told['shares']},
+                         {f'{name}:{share}' for name in servers for share in ('photos', 'backup')})
+        self.assertEqual({volume['path'].split(':')[0] for volume in told['volumes']}, set(servers))
+        self.assertEqual(told['incidents'], [])
+        # Some of the servers only; and what isn't there.
+        only = self.report(first, '--servers', 'b-2', '--reports', 'large_file,share_list')
+        self.assertEqual([path.name for path in sorted((only / 'csv').iterdir())],
+                         ['large_file.csv', 'share_list.csv'])
+        self.assertEqual(facts(only)['owners'], None)
+        self.assertIn('no complete run of server nobody', self.ctl(
+            first, 'fleet', 'report', first.base / 'fleet', '--servers', 'nobody', status=1).err)
+        # A server that goes.
+        self.ctl(first, 'fleet', 'forget', 'b-2')
+        self.assertEqual(self.shards.ask("select count() from file where server = 'b-2'"), '0\n')
+        listed = json.loads(self.ctl(first, 'fleet', 'status', '--json').out)
+        self.assertEqual([(run['server'], run['files']) for run in listed],
+                         [(name, len(servers[name][1].files)) for name in ('alpha', 'c.example')])
+
+    @needs_root
+    def test_only_complete_runs_are_seen_and_the_newest_counts(self):
+        m = self.server('seen')
+        self.fill(m)
+        self.ctl(m, 'fleet', 'init')
+        self.send(m)
+        before = self.shards.ask('select server, max(run) from run group by server')
+        # Killed between its rows and its line.
+        m.stop_at('body 2')
+        run = m.start('--report', 'daily')
+        m.stopped_pid()
+        os.kill(run.pid(), signal.SIGKILL)
+        m.go_on()
+        run.finish()
+        self.assertEqual(self.shards.ask('select uniq(run) from file'), '2\n')
+        self.assertEqual(self.shards.ask('select server, max(run) from run group by server'), before)
+        files = json.loads(self.ctl(m, 'fleet', 'status', '--json').out)[0]['files']
+        made = self.report(m, '--reports', 'large_file')
+        self.assertEqual(len((made / 'csv/large_file.csv').read_bytes().splitlines()), files + 1)
+        # The newest counts, once; others go when nobody can be reading them any more.
+        self.send(m)
+        made = self.report(m, '--reports', 'large_file')
+        self.assertEqual(len((made / 'csv/large_file.csv').read_bytes().splitlines()), files + 1)
+        for table in ('run', 'file'):
+            self.shards.ask(f'insert into {table} (server, profile, run) values '
+                            f"('seen', 'daily', 1), ('gone', 'daily', 1), ('seen', 'other', 1)")
+            time.sleep(.3)
+        self.shards.ask("insert into run (server, profile, run, finished, started) values "
+                        "('seen', 'daily', 99999999999999999, 1, 1)")
+        time.sleep(.3)
+        done = self.ctl(m, 'fleet', 'status', '--json')
+        listed = {(run['server'], run['profile']): run['overdue'] for run in json.loads(done.out)}
+        self.assertEqual(listed[('seen', 'daily')], True)
+        self.assertEqual(self.shards.ask("select uniq(run) from file where server = 'seen' and "
+                                         "profile = 'daily'"), '0\n')
+
+    @needs_root
+    def test_an_engine_in_trouble_costs_the_report_nothing(self):
+        silent = socket.create_server(('127.0.0.1', 0))
+        self.addCleanup(silent.close)
+        m = self.server('trouble')
+        self.fill(m)
+        self.ctl(m, 'fleet', 'init')
+        conf = m.vorn / 'etc/fleet.conf'
+        secret = m.vorn / 'etc/secret'
+        secret.write_text('wrong\n')
+        secret.chmod(0o600)
+        good = conf.read_text()
+        url = self.shards.engines[0].url
+        for what, text, words in (
+                ('nobody listens', '[fleet]\nurl = http://127.0.0.1:1/\n', "can't be used"),
+                ('silence', f'[fleet]\nurl = http://127.0.0.1:{silent.getsockname()[1]}/\n',
+                 "can't be used"),
+                ('wrong password', f'[fleet]\nurl = {url}\nuser = careful\n'
+                                   'password_file = /usr/vorn/etc/secret\n', 'password'),
+                ('no tables', f'[fleet]\nurl = {url}\ndatabase = nothing\n', 'refused'),
+                ('not understood', '[fleet]\nurls = x\n', 'urls is unknown'),
+                ('none', '', 'no engine is configured')):
+            with self.subTest(what):
+                conf.write_text(text)
+                begin = time.monotonic()
+                run = m.start('--report', 'daily')
+                out, err = run.process.communicate(timeout=120)
+                self.assertEqual((run.process.returncode, m.status('daily')), (0, 'success'), err)
+                self.assertLess(time.monotonic() - begin, 60)  # bounded, however slow the machine
+                told = facts(m.report_folders('daily')[-1])['incidents']
+                self.assertEqual([entry['kind'] for entry in told], ['fleet_unreachable'])
+                self.assertIn(words, told[0]['text'])
+                self.assertEqual(m.leftovers(), [])
+        conf.write_text(good)
+        secret.write_text(PASSWORD + '\n')
+        self.ctl(m, 'fleet', 'set', '--user', 'careful', '--password-file', '/usr/vorn/etc/secret')
+        self.send(m)
+
+    @needs_root
+    def test_a_shard_that_is_down_or_full(self):
+        private_mounts()
+        disk = self.m.base / 'disk'
+        disk.mkdir()
+        subprocess.run(['mount', '-t', 'tmpfs', '-o', 'size=24m', 'tmpfs', disk], check=True)
+        self.addCleanup(subprocess.run, ['umount', '-l', disk], check=True)
+        shards = Shards(self, folders=[None, disk])
+        servers = {}
+        for name in ('one', 'two', 'three', 'four', 'five', 'six'):
+            m = servers[name] = self.server(name)
+            self.ctl(m, 'fleet', 'set', '--url', shards.urls)
+            self.fill(m)
+        self.ctl(m, 'fleet', 'init')
+        for m in servers.values():
+            self.send(m)
+        second = [name for name in servers if f'{name}\n' in shards.engines[1].ask(
+            'select distinct server from run_part', 'vornreport')]
+        self.assertTrue(0 < len(second) < len(servers), second)
+        # No room: half a run isn't there, and the report says so.
+        (disk / 'ballast').write_bytes(bytes(1 << 20))
+        with open(disk / 'ballast', 'ab') as ballast, self.assertRaises(OSError):
+            while True:
+                ballast.write(bytes(1 << 16))
+                ballast.flush()
+        m = servers[second[0]]
+        run = m.run('--report', 'daily')
+        told = facts(m.report_folders('daily')[-1])['incidents']
+        self.assertEqual([entry['kind'] for entry in told], ['fleet_unreachable'], run.log_lines)
+        (disk / 'ballast').unlink()
+        self.report(m)
+        # A shard that is down: no report of what is left, and no run of its servers.
+        shards.engines[1].stop()
+        first = next(name for name in servers if name not in second)
+        self.send(servers[first])
+        m.run('--report', 'daily')
+        told = facts(m.report_folders('daily')[-1])['incidents']
+        self.assertEqual([entry['kind'] for entry in told], ['fleet_unreachable'])
+        self.assertIn('the report over the fleet failed', self.ctl(
+            m, 'fleet', 'report', m.base / 'fleet', status=1).err)
+        shards.engines[1].start()
+        self.send(m)
+        self.report(m)
+
+    @needs_root
+    def test_names_are_data_everywhere(self):
+        hostile = [f"{a}{b}{c}" for a in ("'", '"', '\\', '`', "');") for b in (
+            ' or 1=1 --', '\\n', '\n', '<script>x', '{runs}', '?a=b&c', ' drop table run; ')
+            for c in ('', '\udcff')][:60]
+        self.assertEqual(len(set(hostile)), 60)
+        m = self.server("srv {runs} %27 & ü")
+        tree = Tree(m)
+        for name in hostile:
+            tree.add('odd', name, 5)
+        self.ctl(m, 'fleet', 'init')
+        own = self.send(m)
+        made = self.report(m)
+        for path in (own / 'csv').iterdir():
+            if path.stem not in ('volume_usage', 'coverage', 'share_list'):
+                self.assertEqual((made / 'csv' / path.name).read_bytes().replace(
+                    'srv {runs} %27 & ü:'.encode(), b''), path.read_bytes())
+        # What other servers have written is theirs: it stays text, and can be forgotten.
+        for number, name in enumerate(hostile):
+            if '\udcff' in name:
+                continue
+            text = name.replace('\\', '\\\\').replace("'", "\\'").replace('\n', '\\n')
+            where = f"'{text}', 'daily', {number + 1}"
+            self.shards.ask(f"insert into file (server, profile, run, share, path, size, owner_name) "
+                            f"values ({where}, '{text}', '/{text}', 7, '{text}')")
+            self.shards.ask('insert into run (server, profile, run, started, report) select server, '
+                            f"profile, toUInt64({number + 1}), started, report from run where "
+                            f"server like 'srv%' limit 1") if False else self.shards.ask(
+                f"insert into run (server, profile, run, started, report) values ({where}, "
+                f"{int(time.time())}, '{{\"format\": 1}}')")
+        wait_for(lambda: int(self.shards.ask('select uniq(server) from run')) == 31, 'the rows')
+        page = (self.report(m) / 'report.html').read_text(errors='surrogateescape')
+        self.assertNotIn('<script>x', page)
+        for name in hostile:
+            if '\udcff' not in name:
+                self.ctl(m, 'fleet', 'forget', name)
+        self.assertEqual(self.shards.ask('select uniq(server) from run'), '1\n')
+
+    @needs_root
+    def test_a_password_stays_on_this_machine(self):
+        m = self.server('careful')
+        secret = m.vorn / 'etc/secret'
+        secret.write_text(PASSWORD + '\n')
+        # An address of this machine that isn't loopback's.
+        with socket.socket(socket.AF_INET, socket.SOCK_DGRAM) as probe:
+            probe.connect(('192.0.2.1', 9))
+            address = probe.getsockname()[0]
+        listening = socket.create_server((address, 0))
+        self.addCleanup(listening.close)
+        listening.setblocking(False)
+        options = ('--user', 'careful', '--password-file', '/usr/vorn/etc/secret', '--cluster', '')
+        url = f'http://{address}:{listening.getsockname()[1]}/'
+        for mode, addressed, words in ((0o644, self.shards.engines[0].url, 'read or changed'),
+                                       (0o600, url, "the password isn't sent")):
+            secret.chmod(mode)
+            before = (m.vorn / 'etc/fleet.conf').read_text()
+            self.assertIn(words, self.ctl(m, 'fleet', 'set', '--url', addressed, *options,
+                                          status=1).err)
+            self.assertEqual((m.vorn / 'etc/fleet.conf').read_text(), before)
+        with self.assertRaises(BlockingIOError):
+            listening.accept()
+
+
+if __name__ == '__main__':
+    unittest.main()
