@@ -103,7 +103,6 @@ def fill(options, shards):
                 {10 ** 15 + server}, 'share', {i}, ['share{i}', '/srv/share{i}', '/srv'])""")
         shards.ask(f"""insert into run values ('server{server}', 'weekly', {10 ** 15 + server}, {now},
             {now}, {rows}, 0, 0, '{facts}')""")
-    time.sleep(2)  # for what goes from shard to shard
 
 
 def report(options, shards):

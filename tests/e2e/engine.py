@@ -68,8 +68,8 @@ class Engine:
                     raise AssertionError((self.folder / 'errors').read_text()) from error
             time.sleep(0.05)
 
-    def ask(self, sql, database='default'):
-        query = urllib.parse.urlencode({'database': database})
+    def ask(self, sql, database='default', **settings):
+        query = urllib.parse.urlencode({'database': database} | settings)
         with urllib.request.urlopen(f'{self.url}?{query}', sql.encode(), START) as answer:
             return answer.read().decode(errors='surrogateescape')
 
@@ -97,4 +97,5 @@ class Shards:
         self.urls = ','.join(engine.url for engine in self.engines)
 
     def ask(self, sql, database='vornreport'):
-        return self.engines[0].ask(sql, database)
+        """What is inserted is in its place afterwards."""
+        return self.engines[0].ask(sql, database, insert_distributed_sync=1)

@@ -1,6 +1,7 @@
 """A fleet on real engines: two shards on loopback, and the data of several servers."""
 import json
 import os
+import re
 import signal
 import socket
 import subprocess
@@ -9,9 +10,7 @@ import unittest
 
 from engine import PASSWORD, Shards
 from expected import DAY, Tree, csv, facts, local_time, totals
-from harness import ALL, ProductTest, make_files, needs_root, private_mounts, wait_for
-
-RUNS = 'select server, count() from run group by server order by server'
+from harness import ALL, ROOT, ProductTest, make_files, needs_root, private_mounts
 
 ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002}
 
@@ -203,10 +202,8 @@ class Fleet(ProductTest):
         for table in ('run', 'file'):
             self.shards.ask(f'insert into {table} (server, profile, run) values '
                             f"('seen', 'daily', 1), ('gone', 'daily', 1), ('seen', 'other', 1)")
-            time.sleep(.3)
         self.shards.ask("insert into run (server, profile, run, finished, started) values "
                         "('seen', 'daily', 99999999999999999, 1, 1)")
-        time.sleep(.3)
         done = self.ctl(m, 'fleet', 'status', '--json')
         listed = {(run['server'], run['profile']): run['overdue'] for run in json.loads(done.out)}
         self.assertEqual(listed[('seen', 'daily')], True)
@@ -282,10 +279,8 @@ class Fleet(ProductTest):
         self.assertEqual([entry['kind'] for entry in told], ['fleet_unreachable'], run.log_lines)
         (disk / 'ballast').unlink()
         self.report(m)
-        # A shard that is down: no report of what is left, and no run of its servers.
+        # A shard that is down: no report of what is left, and no further run.
         shards.engines[1].stop()
-        first = next(name for name in servers if name not in second)
-        self.send(servers[first])
         m.run('--report', 'daily')
         told = facts(m.report_folders('daily')[-1])['incidents']
         self.assertEqual([entry['kind'] for entry in told], ['fleet_unreachable'])
@@ -320,12 +315,8 @@ class Fleet(ProductTest):
             where = f"'{text}', 'daily', {number + 1}"
             self.shards.ask(f"insert into file (server, profile, run, share, path, size, owner_name) "
                             f"values ({where}, '{text}', '/{text}', 7, '{text}')")
-            self.shards.ask('insert into run (server, profile, run, started, report) select server, '
-                            f"profile, toUInt64({number + 1}), started, report from run where "
-                            f"server like 'srv%' limit 1") if False else self.shards.ask(
-                f"insert into run (server, profile, run, started, report) values ({where}, "
-                f"{int(time.time())}, '{{\"format\": 1}}')")
-        wait_for(lambda: int(self.shards.ask('select uniq(server) from run')) == 31, 'the rows')
+            self.shards.ask('insert into run (server, profile, run, started, report) values '
+                            f"({where}, {int(time.time())}, '{{\"format\": 1}}')")
         page = (self.report(m) / 'report.html').read_text(errors='surrogateescape')
         self.assertNotIn('<script>x', page)
         for name in hostile:
@@ -340,7 +331,10 @@ class Fleet(ProductTest):
         secret.write_text(PASSWORD + '\n')
         # An address of this machine that isn't loopback's.
         with socket.socket(socket.AF_INET, socket.SOCK_DGRAM) as probe:
-            probe.connect(('192.0.2.1', 9))
+            try:
+                probe.connect(('192.0.2.1', 9))  # which sends nothing
+            except OSError:
+                self.skipTest('this machine has no address but loopback')
             address = probe.getsockname()[0]
         listening = socket.create_server((address, 0))
         self.addCleanup(listening.close)
@@ -356,6 +350,22 @@ class Fleet(ProductTest):
             self.assertEqual((m.vorn / 'etc/fleet.conf').read_text(), before)
         with self.assertRaises(BlockingIOError):
             listening.accept()
+
+    @needs_root
+    def test_readme_leads_to_a_fleet(self):
+        section = (ROOT / 'README.md').read_text().split('\n## Many servers\n')[1].split('\n## ')[0]
+        lines = re.findall(r'^    # vornctl (.*?)(?: +#.*)?$', section, re.MULTILINE)
+        self.assertEqual(len(lines), 5)
+        m = self.m
+        (m.base / 'srv').mkdir()
+        m.options += ['--bind', m.base / 'srv', '/srv']
+        m.profile('weekly', report_list=ALL)
+        self.fill(m)
+        for line in lines:
+            line = line.replace('http://127.0.0.1:8123/', self.shards.engines[0].url)
+            done = m.shell('exec /usr/vorn/bin/vornctl ' + line)
+            self.assertEqual(done.status, 0, done.err)
+        self.assertRegex(done.out, r'^/srv/fleet/[-_0-9]+/report\.html\n$')
 
 
 if __name__ == '__main__':
