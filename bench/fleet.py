@@ -69,8 +69,8 @@ def ship(options, shards):
 
 
 def ctl(made, *arguments):
-    done = subprocess.run(made.sandbox(made.log) + ['--', '/usr/vorn/bin/vornctl', *map(str, arguments)],
-                          text=True, capture_output=True)
+    command = ['--', '/usr/vorn/bin/vornctl', *map(str, arguments)]
+    done = subprocess.run(made.sandbox(made.log) + command, text=True, capture_output=True)
     if done.returncode not in (0, 3):
         sys.exit(done.stdout + done.stderr)
     return done.stdout
@@ -82,19 +82,22 @@ def fill(options, shards):
     for server in range(options.servers):
         for first in range(0, rows, BATCH):
             count = min(BATCH, rows - first)
-            shards.ask(f"""insert into file select 'server{server}', 'weekly', {10 ** 15 + server},
-                toInt64(n), 1000 + cityHash64(n, {server}) % 20, concat('user', toString(1000 +
-                cityHash64(n, {server}) % 20)), toInt64(1600000000 + cityHash64(n, 7, {server}) % 160000000),
-                toInt64(if(n % 5 = 0, 4096 + n % 100000, exp2(cityHash64(n, {server}, 3) % 300 / 10) +
-                cityHash64(n, 5) % 4096)), concat('share', toString(n % 8)),
-                concat('/srv/share', toString(n % 8), '/project-', toString(intDiv(n, 4000)), '/folder-',
-                toString(intDiv(n, 40)), '/', name), name, inf, concat('reportUI_file_type_', arrayElement(
-                ['image', 'document', 'video', 'archive', 'text', 'other'], 1 + n % 6))
-                from (select number + {first} as n, concat(arrayElement(['report', 'IMG', 'draft',
-                'model', 'notes'], 1 + number % 5), '_', toString(if((number + {first}) % 5 = 0,
-                (number + {first}) % 100000, cityHash64(number + {first}, {server}) % 10000000)),
-                arrayElement(['.jpg', '.pdf', '.mp4', '.zip', '.txt', ''], 1 + number % 6)) as name
-                from numbers({count}))""")
+            random = f'cityHash64(n, {server}, %d)'
+            shards.ask(f"""insert into file select 'server{server}', 'weekly',
+                {10 ** 15 + server}, toInt64(n), 1000 + {random % 1} % 20,
+                concat('user', toString({random % 1} % 20)),
+                toInt64(1600000000 + {random % 2} % 160000000),
+                if(n % 5 = 0, toInt64(4096 + n % 100000),
+                   toInt64(exp2({random % 3} % 300 / 10)) + toInt64({random % 4} % 4096)),
+                concat('share', toString(n % 8)),
+                concat('/srv/share', toString(n % 8), '/project-', toString(intDiv(n, 4000)),
+                       '/folder-', toString(intDiv(n, 40)), '/', name),
+                name, inf, concat('reportUI_file_type_', kind)
+                from (select number + {first} as n, concat(word, '_', toString(
+                        if(n % 5 = 0, n % 100000, {random % 5} % 10000000)), '.', kind) as name,
+                    arrayElement(['report', 'IMG', 'draft', 'model', 'notes'], 1 + n % 5) as word,
+                    arrayElement(['image', 'text', 'video', 'archive', 'other'], 1 + n % 3) as kind
+                    from numbers({count}))""")
         now = int(time.time())
         facts = '{"format": 1, "shares": [' + ', '.join(
             f'{{"name": "share{i}", "path": "/srv/share{i}"}}' for i in range(8)) + ']}'

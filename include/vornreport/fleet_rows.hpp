@@ -1,6 +1,6 @@
 // What a run keeps for its fleet besides the files of its statistics database: the rows of the
-// reports that are made of something else, in a file without a name, so that they take no memory and
-// nobody has to remove them. Without a fleet nothing is kept, and each call costs nothing.
+// reports that are made of something else, in a file without a name, so that they take no memory
+// and nobody has to remove them. Without a fleet nothing is kept, and each call costs nothing.
 #pragma once
 
 #include <cstdint>
