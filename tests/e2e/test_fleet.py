@@ -45,8 +45,9 @@ class Fleet(ProductTest):
         machine = machine or self.new_machine()
         machine.accounts(ACCOUNTS)
         machine.profile('daily', report_list=ALL, fleet='true', **keys)
-        self.ctl(machine, 'fleet', 'set', '--url', self.shards.urls, '--cluster', 'shards',
-                 '--server', name)
+        # By an address that isn't taken for this machine's, rows are compressed as for others.
+        urls = self.shards.urls.replace('127.0.0.1', '127.1') if name == 'alpha' else self.shards.urls
+        self.ctl(machine, 'fleet', 'set', '--url', urls, '--cluster', 'shards', '--server', name)
         return machine
 
     def send(self, machine):

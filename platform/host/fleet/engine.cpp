@@ -50,23 +50,42 @@ bool is_loopback(const sockaddr& address) {
           (IN6_IS_ADDR_V4MAPPED(&six.sin6_addr) && six.sin6_addr.s6_addr[12] == 127));
 }
 
-// Bytes of a source, compressed as they are asked for.
-class Gzip {
+// Whether the node is this machine's by its literal address. On the way there is nothing to save by
+// compressing, which would cost both sides more than all else.
+bool is_here(std::string_view url) {
+  for (const std::string_view here : {"http://127.0.0.1", "http://[::1]"}) {
+    if (url.starts_with(here) &&
+        (url.size() == here.size() || url[here.size()] == ':' || url[here.size()] == '/')) {
+      return true;
+    }
+  }
+  return false;
+}
+
+// Bytes of a source as they are asked for, compressed or as they are.
+class Upload {
  public:
-  explicit Gzip(const Engine::Source& source) : source_(source) {
+  explicit Upload(const Engine::Source& source) : source_(source) {
     constexpr int kFast = 1;
     constexpr int kGzip = 15 + 16;
     constexpr int kMemory = 8;
     ok_ = deflateInit2(&stream_, kFast, Z_DEFLATED, kGzip, kMemory, Z_DEFAULT_STRATEGY) == Z_OK;
   }
-  Gzip(const Gzip&) = delete;
-  Gzip& operator=(const Gzip&) = delete;
-  ~Gzip() { deflateEnd(&stream_); }
+  Upload(const Upload&) = delete;
+  Upload& operator=(const Upload&) = delete;
+  ~Upload() { deflateEnd(&stream_); }
 
   bool ok() const { return ok_; }
   bool has_begun() const { return has_begun_; }
 
+  // Before the first byte is read.
+  void compress(bool is_wanted) { is_compressed_ = is_wanted; }
+
   std::size_t read(char* out, std::size_t size) {
+    if (!is_compressed_) {
+      has_begun_ = true;
+      return source_(out, size);
+    }
     stream_.next_out = reinterpret_cast<Bytef*>(out);
     stream_.avail_out = static_cast<uInt>(size);
     while (stream_.avail_out == size && !is_done_) {
@@ -85,7 +104,7 @@ class Gzip {
   const Engine::Source& source_;
   std::array<char, kChunk> in_{};
   z_stream stream_{};
-  bool ok_ = false, has_begun_ = false, is_last_ = false, is_done_ = false;
+  bool ok_ = false, is_compressed_ = true, has_begun_ = false, is_last_ = false, is_done_ = false;
 };
 
 // Rows out of the bytes of a TabSeparated answer, one in memory at a time.
@@ -164,18 +183,22 @@ class Engine::Transfer {
     return perform(node, query, {}, &rows);
   }
 
-  bool insert(std::size_t node, const std::string& query, Gzip& gzip) {
+  bool insert(std::size_t node, const std::string& query, Upload& upload) {
     set(CURLOPT_POSTFIELDS, static_cast<char*>(nullptr));
     set(CURLOPT_POSTFIELDSIZE_LARGE, curl_off_t{-1});
     set(CURLOPT_READFUNCTION, &Transfer::on_read);
-    set(CURLOPT_READDATA, &gzip);
+    set(CURLOPT_READDATA, &upload);
     set(CURLOPT_TIMEOUT, kInsertSeconds);
     set(CURLOPT_LOW_SPEED_LIMIT, 1L);
     set(CURLOPT_LOW_SPEED_TIME, kSilentSeconds);
-    return perform(node, query,
-                   {"Transfer-Encoding: chunked", "Content-Encoding: gzip",
-                    "Content-Type: application/octet-stream"},
-                   nullptr);
+    constexpr const char* kChunked = "Transfer-Encoding: chunked";
+    constexpr const char* kBytes = "Content-Type: application/octet-stream";
+    if (is_here(conf_.urls[node])) {
+      upload.compress(false);
+      return perform(node, query, {kChunked, kBytes}, nullptr);
+    }
+    upload.compress(true);
+    return perform(node, query, {kChunked, kBytes, "Content-Encoding: gzip"}, nullptr);
   }
 
   std::string escaped(const std::string& text) const {
@@ -252,8 +275,8 @@ class Engine::Transfer {
     return socket(address->family, address->socktype | SOCK_CLOEXEC, address->protocol);
   }
 
-  static size_t on_read(char* out, size_t size, size_t count, void* gzip) {
-    return static_cast<Gzip*>(gzip)->read(out, size * count);
+  static size_t on_read(char* out, size_t size, size_t count, void* upload) {
+    return static_cast<Upload*>(upload)->read(out, size * count);
   }
 
   static size_t on_answer(char* bytes, size_t size, size_t count, void* self) {
@@ -312,18 +335,18 @@ bool Engine::select(const std::string& sql, const OnRow& on_row) {
 
 bool Engine::insert(const std::string& table, const Source& source) {
   Transfer& transfer = *transfer_;
-  Gzip gzip(source);
+  Upload upload(source);
   const std::string query = "database=" + transfer.conf_.database +
                             "&insert_distributed_sync=1&query=" +
                             transfer.escaped("INSERT INTO " + table + " FORMAT TabSeparated");
   std::string before;
-  for (std::size_t tried = 0; tried < nodes() && gzip.ok(); ++tried) {
+  for (std::size_t tried = 0; tried < nodes() && upload.ok(); ++tried) {
     const std::size_t node = (transfer.node_ + tried) % nodes();
-    if (transfer.insert(node, query, gzip)) {
+    if (transfer.insert(node, query, upload)) {
       transfer.node_ = node;
       return true;
     }
-    if (gzip.has_begun()) {
+    if (upload.has_begun()) {
       // What comes next goes elsewhere, unless it is the engine that didn't want it.
       transfer.node_ = transfer.is_refused_ ? node : (node + 1) % nodes();
       break;
