@@ -196,8 +196,7 @@ constexpr ProfileKey kKeys[] = {
      false, admin::metrics_file_problem},
     {"metrics_users", "--metrics-users", kTruth, "true tells users' quotas there", false,
      truth_problem},
-    {"fleet", "--fleet", kTruth, "true sends what runs find to the fleet", false,
-     truth_problem},
+    {"fleet", "--fleet", kTruth, "true sends what runs find to the fleet", false, truth_problem},
     {"schedule_collect_id", nullptr, "", "Identifier of the schedule", false, schedule_problem},
 };
 
