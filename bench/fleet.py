@@ -10,7 +10,7 @@
 """
 import argparse
 import os
-import re
+import shutil
 import statistics
 import subprocess
 import sys
@@ -27,10 +27,11 @@ NINE = ('quota_usage', 'file_owner', 'volume_usage', 'share_list', 'file_group',
 BATCH = 1_000_000
 
 
-def machine(folder, build, name):
+def machine(options):
     from harness import Machine
-    base = Path(tempfile.mkdtemp(prefix='vorn-', dir=folder))
-    subprocess.run(['cmake', '--install', str(build)], check=True, stdout=subprocess.DEVNULL,
+    base = Path(tempfile.mkdtemp(prefix='vorn-', dir=options.folder))
+    options.test.addCleanup(shutil.rmtree, base)
+    subprocess.run(['cmake', '--install', str(options.build)], check=True, stdout=subprocess.DEVNULL,
                    env=os.environ | {'DESTDIR': str(base / 'built')})
     made = Machine(base, base / 'built')
     made.log = made.new_log()
@@ -50,7 +51,7 @@ def ship(options, shards):
     import gather
     tree = options.folder / 'vornreport-bench-tree'
     gather.make_tree(tree, options.ship)
-    made = machine(options.folder, options.build, 'ship')
+    made = machine(options)
     made.share('files', tree)
     lists = ','.join(name for name in NINE) + ',folder_usage,file_age,coverage'
     made.profile('alone', report_list=lists)
@@ -109,7 +110,7 @@ def fill(options, shards):
 
 
 def report(options, shards):
-    made = machine(options.folder, options.build, 'report')
+    made = machine(options)
     ctl(made, 'fleet', 'set', '--url', shards.urls, '--cluster', 'shards')
     ctl(made, 'fleet', 'init')
     fill(options, shards)
@@ -134,6 +135,7 @@ class Bench(unittest.TestCase):
 
     def test(self):
         from engine import Shards
+        self.options.test = self
         shards = Shards(self)
         if self.options.ship:
             ship(self.options, shards)
