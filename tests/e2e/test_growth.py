@@ -62,13 +62,13 @@ class Growth(ProductTest):
                 os.fsencode(row[3])))
         return rows
 
-    def report(self, bases, log=''):
+    def report(self, bases, log='', err=''):
         """Runs the report, whose rows must be the changes since `bases`; its facts."""
         time.sleep(1.1)  # its folder and snapshot are called by the second
         run = self.m.run('--report', 'p')
         self.assertRegex(''.join(run.log_lines), f'^{log}\n*$')
         run.log_lines = []
-        self.assertSucceeded(run, 'p')
+        self.assertSucceeded(run, 'p', err)
         folder = self.m.report_folders('p')[-1]
         now = self.sums()
         rows = self.rows(bases, now)
@@ -142,7 +142,7 @@ class Growth(ProductTest):
         os.link(self.top / 'one/a/1', self.top / f'one/{long}/linked')
         make_files(self.top / 'one', {'sparse': 1 << 41, f'{long}/{long}/{long}': 6, 'a/new': 1})
         overlap = '.*shares inner and one hold the same files.*'
-        found, _ = self.report([('last', first)], overlap)
+        found, _ = self.report([('last', first)], overlap, overlap + '\n')
         self.assertEqual([(each['kind'], each['what']) for each in found['incidents']],
                          [('share_overlap', 'inner, one')])
         # As if that report had been made tomorrow: it counts for nothing until then.
@@ -177,5 +177,5 @@ class Growth(ProductTest):
                 run.finish()
                 self.assertEqual((self.times('valid = 1'), len(self.times('valid = 0'))),
                                  (kept, int(is_killed)))
-        self.report([('last', before)])
+        self.report([('last', before)], err='.* did not finish: it was killed.*\n')
         self.assertEqual(len(self.times()), 2)

@@ -73,7 +73,7 @@ class Reports(ProductTest):
         self.m.accounts(ACCOUNTS)
         self.tree = Tree(self.m)
 
-    def report(self, profile, log=(), **keys):
+    def report(self, profile, log=(), err='', **keys):
         """Runs a report that logs exactly lines that match `log`; its folder."""
         if keys:
             self.m.profile(profile, **keys)
@@ -82,7 +82,7 @@ class Reports(ProductTest):
         for line, pattern in zip(self.done.log_lines, log):
             self.assertRegex(line, f'^{pattern}\\n+$')
         del self.done.log_lines[:]
-        return self.assertSucceeded(self.done, profile)
+        return self.assertSucceeded(self.done, profile, err)
 
     def assertHolds(self, folder, blocks, **csv_files):
         """A whole page with the blocks, the CSV files, the facts, and nothing else."""
@@ -186,7 +186,8 @@ class Reports(ProductTest):
                 run.finish()
                 self.m.go_on()
                 self.assertNotEqual(self.m.leftovers(), [])
-                self.assertHolds(self.report('all', log), expected, **csv_files)
+                self.assertHolds(self.report('all', log, '.* did not finish: it was killed.*\n'),
+                                 expected, **csv_files)
 
     def test_selected_shares_and_reports(self):
         self.tree.folders['empty'] = self.m.share('empty')
