@@ -104,7 +104,7 @@ def run(options=()):
                           stdout=subprocess.PIPE, stderr=subprocess.STDOUT, timeout=LIMIT)
     if not status.exists() or status.read_text().split('\n')[0] != 'success':
         return None, True, done.stdout
-    folder, = [entry for entry in reports.iterdir() if entry.name != 'template']
+    folder, = [entry for entry in reports.iterdir() if entry.name[0].isdigit()]
     shown, facts = contents(folder)
     return shown, bool(facts['incidents']), done.stdout
 

@@ -18,6 +18,7 @@ usage: build-template.sh header FILE          starts the page in FILE
        build-template.sh body FILE            starts the body in FILE
        build-template.sh body FILE REPORT     adds the section of REPORT
        build-template.sh tail FILE            ends the body and the page
+       build-template.sh index                makes the list of reports of the data on its input
 USAGE
   exit 2
 }
@@ -63,10 +64,8 @@ fingerprint() { # FILE
   printf "'sha256-%s'" "$(printf "$octal" | base64)"
 }
 
-# The data blocks follow in a template element, whose content a browser neither runs nor shows: the
-# page reads them as text. So no file's name can become a script, whatever it holds.
-start_page() {
-  script=$(fingerprint "$here/report.js")
+start_head() { # NAME TITLE
+  script=$(fingerprint "$here/$1.js")
   style=$(fingerprint "$here/report.css")
   cat <<HTML
 <!DOCTYPE html>
@@ -76,11 +75,19 @@ start_page() {
 <meta name="viewport" content="width=device-width, initial-scale=1">
 <meta http-equiv="Content-Security-Policy" content="default-src 'none'; script-src $script; style-src $style; base-uri 'none'; form-action 'none'">
 <meta name="referrer" content="no-referrer">
-<title>Storage report</title>
+<meta name="generator" content="vornreport $1">
+<title>$2</title>
 HTML
   printf '<style>'
   cat "$here/report.css"
-  printf '</style>\n<template id="data">\n'
+  printf '</style>\n'
+}
+
+# The data blocks follow in a template element, whose content a browser neither runs nor shows: the
+# page reads them as text. So no file's name can become a script, whatever it holds.
+start_page() {
+  start_head report 'Storage report'
+  echo '<template id="data">'
 }
 
 language() { # CODE
@@ -154,14 +161,31 @@ dictionaries() {
   done
 }
 
-finish_page() {
+finish_page() { # NAME
   printf '</main>\n'
   dictionaries
   printf '<script>'
-  cat "$here/report.js"
+  cat "$here/$1.js"
   printf '</script>\n</body>\n</html>\n'
 }
 
+# The list of all reports around its data, one line of JSON without any '<'. Whoever puts it in the
+# place of an older one knows that by its generator.
+index_page() {
+  start_head index 'Storage reports'
+  printf '</head>\n<body>\n<header>\n'
+  printf '<h1>Storage reports</h1>\n<noscript><p>This page needs JavaScript to list the reports. '
+  printf 'Each is a folder beside it; <a href="latest/report.html">the newest</a>.</p></noscript>\n'
+  printf '</header>\n<main id="report">\n<script type="application/json" id="data">'
+  cat
+  printf '</script>\n'
+  finish_page index
+}
+
+if [ "$*" = index ]; then
+  index_page
+  exit
+fi
 [ $# -ge 2 ] || usage "a sub-command and a file are needed"
 command=$1 file=$2 word=${3-}
 [ $# -le 3 ] || usage "too many arguments"
@@ -202,6 +226,6 @@ case $command$# in
     ;;
   tail2)
     require_part "$file" '</section>' '<main'
-    finish_page >>"$file"
+    finish_page report >>"$file"
     ;;
 esac

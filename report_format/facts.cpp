@@ -8,6 +8,10 @@
 
 namespace report_format {
 
+Level worst_level(const Facts& facts) {
+  return facts.attention.empty() ? Level::kOk : facts.attention.front().level;
+}
+
 const char* word_of(Level level) {
   constexpr std::array kWords{"ok", "warning", "critical"};
   return kWords[static_cast<std::size_t>(level)];

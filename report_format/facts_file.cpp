@@ -7,11 +7,23 @@
 
 namespace report_format {
 
-std::optional<Facts> read_facts(const std::string& report_folder) {
+namespace {
+
+std::optional<Facts> read_facts_at(int folder, const char* path) {
   const host::ErrnoKeeper keeper;
-  const host::Fd file = host::open_regular(AT_FDCWD, (report_folder + "/" + kFactsFile).c_str());
+  const host::Fd file = host::open_regular(folder, path);
   const auto text = file ? host::read_start(file.get(), kLargestFacts + 1) : std::nullopt;
   return text && text->size() <= kLargestFacts ? facts_of(*text) : std::nullopt;
+}
+
+}  // namespace
+
+std::optional<Facts> read_facts(const std::string& report_folder) {
+  return read_facts_at(AT_FDCWD, (report_folder + "/" + kFactsFile).c_str());
+}
+
+std::optional<Facts> read_facts(int report_folder) {
+  return read_facts_at(report_folder, kFactsFile);
 }
 
 std::optional<std::int64_t> read_started(int report_folder) {

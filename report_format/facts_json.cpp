@@ -384,13 +384,16 @@ Json to_json(const Facts& facts) {
   return json;
 }
 
-std::string to_line(const Facts& facts) {
+std::string line_of(const Json& json) {
   std::string line;
-  for (const char c :
-       to_json(facts).dump(-1, ' ', /*ensure_ascii=*/true, Json::error_handler_t::replace)) {
+  for (const char c : json.dump(-1, ' ', /*ensure_ascii=*/true, Json::error_handler_t::replace)) {
     c == '<' ? line += "\\u003c" : line += c;
   }
   return line;
+}
+
+std::string to_line(const Facts& facts) {
+  return line_of(to_json(facts));
 }
 
 std::optional<Facts> facts_of(std::string_view text) {

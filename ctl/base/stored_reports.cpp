@@ -45,8 +45,7 @@ std::optional<report_format::Facts> facts_of(const admin::StoredReport& report) 
 }
 
 const char* level_of(const report_format::Facts& facts) {
-  return report_format::word_of(facts.attention.empty() ? report_format::Level::kOk
-                                                        : facts.attention.front().level);
+  return report_format::word_of(report_format::worst_level(facts));
 }
 
 nlohmann::ordered_json json_of(const admin::StoredReport& report,

@@ -103,6 +103,7 @@ void copy_reports(const std::string& folder, const std::string& to) {
     host::remove_tree(to);
     throw;
   }
+  admin::update_index(to);  // it names the profile
 }
 
 constexpr const char* kMetricsKey = "metrics_file";

@@ -137,6 +137,9 @@ void remove(const Options& options, const std::string& folder, const Reports& do
     bytes += report.size;
     ++removed;
   }
+  if (removed > 0 && !options.dry_run) {
+    admin::update_index(folder);
+  }
   print_line(std::to_string(removed) + (removed == 1 ? " report, " : " reports, ") +
              size_text(bytes));
   if (removed < doomed.size()) {

@@ -194,7 +194,7 @@ class Machine:
 
     def report_folders(self, profile):
         folder = self.reports / profile
-        return sorted(path for path in folder.glob('*') if path.name != 'template')
+        return sorted(folder.glob('[0-9]*'))
 
     def leftovers(self):
         """What a run that has ended must not leave: temporary files, databases, progress, partial

@@ -339,6 +339,86 @@ class Status(WeeklyTest):
                 self.assertEqual(entry['next_run']['time'][:19], expected.isoformat())
 
 
+class ListOfReports(WeeklyTest):
+    def test_it_follows_the_reports(self):
+        folder = self.m.reports / 'weekly'
+        evil = '</script><script>document.title=1</script>'
+        made = []
+
+        def run(log=()):
+            time.sleep(1.1)  # reports are called by the second
+            done = self.m.run('--report', 'weekly')
+            self.assertEqual((done.status, [re.sub(r'.*weekly/(\S+) .*', r'\1', line) for line in done.log_lines]),
+                             (0, list(log)))
+            made[:] = [path.name for path in self.m.report_folders('weekly')]
+
+        def facts(name, change):
+            file = folder / name / 'report.json'
+            file.write_text(change(json.loads(file.read_text())))
+
+        def hostile(json_):
+            volume = json_['volumes'][0]
+            return json.dumps(json_ | {'host': evil, 'started': 2 ** 62, 'attention': [
+                {'level': 'critical'}], 'volumes': [volume | {'path': evil, 'used': 2 ** 64 - 1},
+                                                    *[volume | {'path': f'/{i}'} for i in range(200)]]})
+
+        def remove(name):
+            self.assertEqual(self.ctl('reports', 'weekly', 'remove', name).status, 0)
+            made.remove(name)
+
+        def foreign():
+            (folder / 'latest').unlink()
+            (folder / 'latest').mkdir()
+            (folder / 'index.html').write_text('mine')
+
+        def own_again():
+            (folder / 'latest').rmdir()
+            (folder / 'latest').symlink_to(self.m.base)
+            (folder / 'index.html').unlink()
+            (folder / 'index.html').symlink_to(folder / 'mine')
+            (folder / 'mine').write_text('mine')
+
+        def moved_away():
+            (folder / 'latest').unlink()
+            (folder / 'index.html').unlink()
+
+        ok, none, worst = ('ok', True), (None, False), ('critical', True)
+        for step, act, figures in (
+                ('one run', run, [ok]), ('another', run, [ok, ok]),
+                ('none to read', lambda: (facts(made[0], lambda _: '{'), run()), [none, ok, ok]),
+                ('a removed one', lambda: remove(made[1]), [none, ok]),
+                ('hostile facts', lambda: (facts(made[1], hostile), run()), [worst, none, ok]),
+                ('as many as are kept', lambda: (self.ctl(
+                    'profile', 'set', 'weekly', 'keep_reports', '2'), run()), [ok, ok]),
+                ("others' file and folder", lambda: (foreign(), run(['latest', 'index.html'])), None),
+                ("others' links", lambda: (own_again(), run(['latest', 'index.html'])), None),
+                ('nothing again', lambda: (moved_away(), run()), [ok, ok]),
+                ('the newest removed', lambda: remove(made[-1]), [ok]),
+                ('no report left', lambda: remove(made[0]), [])):
+            with self.subTest(step):
+                act()
+                if figures is None:
+                    self.assertEqual((folder / 'index.html').read_text() if step.endswith('folder') else
+                                     (folder / 'mine').read_text(), 'mine')
+                    self.assertNotIn(os.path.basename(os.path.realpath(folder / 'latest')), made)
+                    continue
+                text = (folder / 'index.html').read_text()
+                self.assertNotIn(evil, text)
+                data, = re.findall(r'<script type="application/json" id="data">(.*)</script>\n', text)
+                data = json.loads(data)
+                self.assertEqual(sorted(row['name'] for row in data['reports']), made)
+                self.assertEqual([(row.get('level'), 'used' in row) for row in data['reports']], figures)
+                # By a clock that is far ahead no report is the newest.
+                newest = [os.readlink(folder / 'latest')] if made else []
+                self.assertEqual((newest, os.path.lexists(folder / 'latest')), (made[-1:], bool(made)))
+                if ok in figures:
+                    readable = [row['made'] for row in data['reports'] if 'used' in row]
+                    self.assertEqual([made_at for made_at, used, size in data['volumes'][0]['samples']],
+                                     [made_at for made_at in readable if made_at < 2 ** 62])
+                self.assertEqual([path.name for path in folder.iterdir() if path.name.startswith('.')], [])
+        self.assertEqual((folder / 'mine').read_text(), 'mine')
+
+
 class Reports(WeeklyTest):
     def test_reports(self):
         recent = datetime.datetime.now() - datetime.timedelta(days=3)
@@ -372,8 +452,11 @@ class Reports(WeeklyTest):
                     (folder / name).mkdir()
                     (folder / name / 'report.html').write_text(WHOLE)
                 self.assertEqual(self.ctl('reports', 'weekly', *arguments).status, status)
+                listed = {'index.html', 'latest'} if removed and 'dry' not in arguments[-1] else set()
+                if removed == names:
+                    listed.discard('latest')
                 self.assertEqual({path.name for path in folder.iterdir()},
-                                 spared | set(names) - set(removed))
+                                 spared | listed | set(names) - set(removed))
                 self.assertTrue((outside / 'report.html').exists())
 
     def test_list_and_open(self):

@@ -271,13 +271,13 @@ systemctl list-timers --no-legend
             self.assertRegex(line, 'volume=/ get quota failed|^repquota: |denied')
         metrics = (metrics / 'elsewhere.prom').read_text()
         self.assertIn('last_run_success{profile="elsewhere"} 1\n', metrics)
-        page, = self.root.glob('kept/*/report.html')
+        page, = self.root.glob('kept/[0-9]*/report.html')
         text = page.read_text()
         for expected in ("['nobody', 16384, 8192, 50.0]", "'/home/share/first', 6", "[ '/mnt', "):
             self.assertIn(expected, text)
         self.assertEqual(len(data_rows(text, 'vornVolumeUsageData')), 2, text[:1000])
         self.assertEqual(len(mails.mails()), 2)  # one of them of a failure
-        page, = elsewhere.glob('elsewhere/*/report.html')
+        page, = elsewhere.glob('elsewhere/[0-9]*/report.html')
         for path in (page, page.with_name('report.json')):
             self.assertEqual((path.owner(), path.group(), path.stat().st_mode & 0o777),
                              ('root', 'users', 0o640), path)

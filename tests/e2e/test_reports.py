@@ -168,7 +168,7 @@ class Reports(ProductTest):
                      'most_modify': csv(TIME_HEADER, with_date(newest))}
         self.assertHolds(folder, expected, **csv_files)
         self.assertEqual(sorted(os.listdir(self.m.reports / 'all/template')),
-                         ['lang', 'report.css', 'report.js'])
+                         ['index.js', 'lang', 'report.css', 'report.js'])
         self.assertEqual(re.findall(r'\(src/file_gathering:\d+\)stat (.*)\n', self.done.out),
                          ['start', *(f'share={share}' for share in self.tree.folders), 'complete'])
         self.assertIn(f'(src/vornreport:134)get link=file://{folder}/report.html', self.done.out)

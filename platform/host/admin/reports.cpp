@@ -15,6 +15,7 @@
 #include "report_format/reports.hpp"
 #include "run/link.hpp"
 #include "run/old_reports.hpp"
+#include "run/report_index.hpp"
 #include "run/run_paths.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/report.h"
@@ -53,6 +54,10 @@ bool remove_report(const std::string& folder, const std::string& name) {
   return host::remove_report(folder, name);
 }
 
+void update_index(const std::string& folder) {
+  host::update_index(folder);
+}
+
 bool remove_all_reports(const std::string& folder) {
   const auto reports = host::stored_reports(folder, host::ReportSize::left_out);
   const auto is_gone = [&](const host::StoredReport& report) {
@@ -62,6 +67,9 @@ bool remove_all_reports(const std::string& folder) {
     return false;
   }
   const host::Fd opened = host::open_report_folder(folder);  // not what its name leads to by then
+  if (opened) {
+    host::remove_index(opened);
+  }
   const std::string page_parts = "/proc/self/fd/" + std::to_string(opened.get()) + "/template";
   if ((opened && !host::remove_tree(page_parts)) ||
       (rmdir(folder.c_str()) != 0 && errno != ENOENT)) {
@@ -79,6 +87,7 @@ bool move_reports(const std::string& folder, const std::string& to) {
   }
   // Above it, too, nobody else can put something in its place.
   if (renameat2(AT_FDCWD, folder.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) {
+    host::update_index(to);  // it names the profile
     return true;
   }
   host::log_line("%s can't be renamed to %s (%s); see what stands there", folder.c_str(),

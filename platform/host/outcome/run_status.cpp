@@ -27,6 +27,7 @@
 #include "report_format/run_state.hpp"
 #include "run/old_reports.hpp"
 #include "run/page.hpp"
+#include "run/report_index.hpp"
 #include "run/run_lock.hpp"
 #include "run/run_paths.hpp"
 #include "run/run_temporary.hpp"
@@ -216,9 +217,12 @@ int update_status(const std::string& profile, std::string_view word) {
   if (!is_stored) {
     return -1;
   }
-  if (!status.report.empty() && ended->keep > 0) {
-    remove_old_reports(ended->finished.substr(0, ended->finished.rfind('/')), ended->keep,
-                       status.report);
+  if (!status.report.empty()) {
+    const std::string folder = ended->finished.substr(0, ended->finished.rfind('/'));
+    if (ended->keep > 0) {
+      remove_old_reports(folder, ended->keep, status.report);
+    }
+    update_index(folder);
   }
   return status.word == word ? 0 : 1;
 }

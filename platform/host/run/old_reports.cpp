@@ -117,6 +117,29 @@ struct Dated {
   }
 };
 
+bool remove_from(const Fd& folder, const std::string& path, const std::string& name) {
+  if (!stamp_of(name) || !is_whole_report(open_report(folder, name))) {
+    log_line("%s/%s is no finished report, so it isn't removed; look into it", path.c_str(),
+             name.c_str());
+    errno = EINVAL;
+    return false;
+  }
+  const std::string removed = unfinished_name(name);
+  if (renameat(folder.get(), name.c_str(), folder.get(), removed.c_str()) == 0 &&
+      remove_tree(path_below(folder, removed))) {
+    return true;
+  }
+  log_line("old report %s/%s can't be removed (%s); remove it by hand", path.c_str(), name.c_str(),
+           std::strerror(errno));
+  return false;
+}
+
+}  // namespace
+
+bool is_report_name(std::string_view name) {
+  return stamp_of(name).has_value();
+}
+
 std::vector<StoredReport> list_reports(const Fd& folder, ReportSize size) {
   constexpr std::time_t kDay = 86400;
   const std::time_t latest = std::time(nullptr) + kDay;
@@ -145,25 +168,6 @@ std::vector<StoredReport> list_reports(const Fd& folder, ReportSize size) {
   }
   return reports;
 }
-
-bool remove_from(const Fd& folder, const std::string& path, const std::string& name) {
-  if (!stamp_of(name) || !is_whole_report(open_report(folder, name))) {
-    log_line("%s/%s is no finished report, so it isn't removed; look into it", path.c_str(),
-             name.c_str());
-    errno = EINVAL;
-    return false;
-  }
-  const std::string removed = unfinished_name(name);
-  if (renameat(folder.get(), name.c_str(), folder.get(), removed.c_str()) == 0 &&
-      remove_tree(path_below(folder, removed))) {
-    return true;
-  }
-  log_line("old report %s/%s can't be removed (%s); remove it by hand", path.c_str(), name.c_str(),
-           std::strerror(errno));
-  return false;
-}
-
-}  // namespace
 
 std::optional<std::vector<StoredReport>> stored_reports(const std::string& folder,
                                                         ReportSize size) {

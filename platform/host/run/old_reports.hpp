@@ -9,6 +9,7 @@
 #include <string_view>
 #include <vector>
 
+#include "vorn/base/file_io.hpp"
 #include "vorn/text.h"
 
 namespace host {
@@ -23,11 +24,16 @@ struct StoredReport {
 
 enum class ReportSize { left_out, measured };
 
+// Whether a run could have named its report so.
+bool is_report_name(std::string_view name);
+
 // The reports in `folder`, which belongs to one profile (report_dir and the profile's name), oldest
 // first; those dated more than a day ahead, by a clock that was wrong, come before all others. What
 // isn't named as a report, and what is a link, isn't listed. Nothing, after one log line, when
 // `folder` is a link, not this user's, or can't be read; an absent one is an empty answer.
 std::optional<std::vector<StoredReport>> stored_reports(const std::string& folder, ReportSize size);
+// The same of a folder that open_report_folder() has opened.
+std::vector<StoredReport> list_reports(const Fd& folder, ReportSize size);
 
 // Removes the whole report `name` of `folder` and follows no link on the way. It loses its name
 // first, so that a removal which is cut short leaves something that the profile's next run clears

@@ -28,16 +28,17 @@ const forecast = record({
 const cause = record({kind: text, share: text, name: text, bytes: number, since: optional(time)});
 const since = optional(record({since: time, files: number, bytes: number}));
 const grown = optional(record({last: since, week: since, month: since}));
-const sample = value => ({date: time(value?.[0]), used: number(value?.[1])});
+const sample = value => ({date: time(value?.[0]), used: number(value?.[1]), size: optional(number)(value?.[2])});
+const volumes = list(record({id: text, path: text, size: number, used: number, free: number,
+                             percent: number, level, forecast, samples: list(sample),
+                             explained: optional(number), outside: optional(number),
+                             filled_by: list(cause), grown_by: optional(list(cause))}));
 
 const readFields = record({
   host: text, profile: text, time_zone: text, finished: time,
   complete: value => value !== false,
   incidents: list(record({level: oneOf('warning', 'error'), kind: text, what: text, text})),
-  volumes: list(record({id: text, path: text, size: number, used: number, free: number,
-                        percent: number, level, forecast, samples: list(sample),
-                        explained: optional(number), outside: optional(number),
-                        filled_by: list(cause), grown_by: optional(list(cause))})),
+  volumes,
   shares: optional(list(record({name: text, path: text, volume: text, files: number, bytes: number,
                                 index: value => value === true, grown, samples: list(sample)}))),
   owners: optional(list(record({name: text, files: number, bytes: number, grown, places: list(record({
@@ -52,6 +53,25 @@ const readFields = record({
                         csv: optional(text), ok: value => value !== false}))
 });
 
+const readIndex = record({
+  host: text, profile: text, time_zone: text, language: text, volumes,
+  reports: list(record({name: text, made: time, level: optional(level), complete: value => value !== false,
+                        used: optional(number), grown: optional(number)}))
+});
+
+const withDates = parts => parts.forEach(each => {
+  each.samples = each.samples.filter(({date}) => date > 0);
+});
+
+// What stands beside all reports of a profile: each of them, the oldest first and without figures
+// where its facts can't be read, and the volumes of the newest with a sample {date, used, size} of
+// each report.
+export function readReports(json) {
+  const index = readIndex(json);
+  withDates(index.volumes);
+  return index;
+}
+
 // The facts by their keys, with `reports` as a Map by name and samples as {date, used}; undefined
 // when they are missing or broken.
 export function readFacts(pieces) {
@@ -60,9 +80,7 @@ export function readFacts(pieces) {
     return undefined;
   }
   const facts = readFields(json);
-  for (const each of [...facts.volumes, ...facts.shares ?? []]) {
-    each.samples = each.samples.filter(({date}) => date > 0);
-  }
+  withDates([...facts.volumes, ...facts.shares ?? []]);
   facts.reports = new Map(facts.reports.map(report => [report.name, report]));
   return facts;
 }

@@ -15,12 +15,13 @@ const DIAMOND = 'M0-6 6 0 0 6-6 0Z';
 const TICK_WIDTH = 84;
 
 const isGrowing = ({forecast}) => forecast.state === 'growing' && forecast.days !== undefined;
-const percentAt = ({size}, used) => used / size * 100;
+// A sample may tell the volume's size at its time.
+const percentAt = (volume, {used, size = volume.size}) => used / size * 100;
 
 // The line of a volume: its samples, and what it holds now.
 function pointsOf(volume, now) {
-  const points = volume.samples.map(({date, used}) => ({date, percent: percentAt(volume, used)}));
-  return points.at(-1)?.date > now - DAY ? points : [...points, {date: now, percent: percentAt(volume, volume.used)}];
+  const points = volume.samples.map(sample => ({date: sample.date, percent: percentAt(volume, sample)}));
+  return points.at(-1)?.date > now - DAY ? points : [...points, {date: now, percent: percentAt(volume, volume)}];
 }
 
 // The dashed line and the band around it, as points, up to where the volume is full or to `last`,
@@ -126,8 +127,8 @@ class Chart {
 }
 
 function historyTable(volumes) {
-  const rows = volumes.flatMap(volume => volume.samples.map(({date, used}) => [
-    volume.path, String(date), String(percentAt(volume, used))]));
+  const rows = volumes.flatMap(volume => volume.samples.map(sample => [
+    volume.path, String(sample.date), String(percentAt(volume, sample))]));
   return table([['volume', 'name'], ['time', 'time'], ['percent', 'percent']], rows.reverse(),
                {key: 'volume_usage.samples', caption: format.say('history')});
 }

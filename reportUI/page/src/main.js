@@ -1,6 +1,7 @@
 // Builds the page from the data blocks that stand in it. See data.js for what those are.
 import {copyOriginals, h, shown, shownPlain} from './dom.js';
 import {forgetDrawings} from './charts.js';
+import {languageChoice, themeChoice, useRemembered} from './choices.js';
 import {hasBlock, piecesOf, readReport, readVariable} from './data.js';
 import {readFacts} from './facts.js';
 import * as format from './format.js';
@@ -10,7 +11,6 @@ import {attention, glance, incidents, marksOf, next} from './summary.js';
 import {forgetTables, foundIn, isSought, seek} from './table.js';
 import {cards, levelElement} from './volumes.js';
 
-const THEMES = {system: 'themeSystem', light: 'themeLight', dark: 'themeDark'};
 const MOST_BESIDE = 6;  // cards of volumes that stand beside what needs attention
 const main = document.querySelector('main');
 const header = document.querySelector('header');
@@ -51,22 +51,6 @@ function emptyReports() {
 }
 
 // --- Header -------------------------------------------------------------------------------------
-
-function choice(label, options, chosen, change) {
-  const select = h('select', {}, ...options.map(([value, text]) => h(
-    'option', {value, selected: value === chosen}, text)));
-  select.addEventListener('change', () => change(select.value));
-  return h('label', {}, h('span', {}, label), select);
-}
-
-const remember = {
-  get: key => { try { return localStorage.getItem(`vorn-${key}`); } catch { return null; } },
-  set: (key, value) => { try { localStorage.setItem(`vorn-${key}`, value); } catch { /* not kept then */ } }
-};
-
-function setTheme(theme) {
-  document.documentElement.dataset.theme = theme in THEMES ? theme : 'system';
-}
 
 // Looks in all tables, folded ones too: sections without a find step aside.
 function search(text) {
@@ -125,14 +109,8 @@ function fillHeader() {
         h('span', {class: 'zone'}, format.zoneName(made)))),
     h('div', {class: 'controls'},
       searchBox(),
-      choice(format.say('language'), format.languages(), format.currentLanguage(), code => {
-        format.chooseLanguage(code);
-        remember.set('language', code);
-        translate();
-      }),
-      choice(format.say('theme'), Object.entries(THEMES).map(
-        ([theme, key]) => [theme, format.say(key)]), document.documentElement.dataset.theme,
-             theme => { setTheme(theme); remember.set('theme', theme); }),
+      languageChoice(translate),
+      themeChoice(),
       print));
 }
 
@@ -264,10 +242,9 @@ async function printAll() {
 }
 
 format.loadDictionaries(document);
-format.chooseLanguage(remember.get('language') ?? readVariable(pieces, 'vornLang') ?? 'en');
+useRemembered(readVariable(pieces, 'vornLang'));
 format.chooseZone(facts?.time_zone || main.dataset.zone);
 format.callVolumes(facts?.volumes ?? []);
-setTheme(remember.get('theme') ?? 'system');
 document.addEventListener('copy', copyOriginals);
 document.addEventListener('click', ({target}) => target.closest('.long')?.classList.toggle('open'));
 // Goes where the address leads, also if that has changed meanwhile.

@@ -207,6 +207,9 @@ struct Facts {
   std::vector<ReportFacts> reports;  // in page order
 };
 
+// The level of the worst that deserves attention.
+Level worst_level(const Facts& facts);
+
 // --- JSON ---------------------------------------------------------------------------------------
 
 // Every key is there; what is absent is null.
@@ -214,6 +217,7 @@ nlohmann::ordered_json to_json(const Facts& facts);
 
 // In one line of ASCII letters where JSON allows it, every '<' as \u003c, so that it can stand in a
 // script element as well as in a file.
+std::string line_of(const nlohmann::ordered_json& json);
 std::string to_line(const Facts& facts);
 
 // The facts of a text that to_line() has written; it may come from elsewhere. Keys that aren't
