@@ -40,7 +40,15 @@ std::string temporary(const char* kind, pid_t pid) {
 
 class Run : public testing::Test {
  protected:
-  void SetUp() override { write_file(VORN_PATH_SHARES, "[photos]\npath = /srv\n"); }
+  void SetUp() override {
+    write_file(VORN_PATH_SHARES, "[photos]\npath = /srv\n");
+    // What makes the list of reports.
+    for (const char* part : {"index.js", "report.css"}) {
+      write_file(std::string(VORN_PATH_TEMPLATE "/") + part, "");
+    }
+    fs::copy_file(VORN_TEST_SOURCE_DIR "/reportUI/build-template.sh", VORN_PATH_TEMPLATE_SCRIPT,
+                  fs::copy_options::overwrite_existing);
+  }
   void TearDown() override { fs::remove_all(kReports); }
   // The value of a path key after VornQazInitRealPath.
   std::string path(const char* key) const {
@@ -344,7 +352,7 @@ TEST_F(Run, KeepsAsManyReportsAsTheProfileSays) {
     publish(kWhole);
     EXPECT_EQ(VornQazStatusUpdate("keep", "success"), 0);
     EXPECT_EQ(syslog_lines().size(), lines);
-    EXPECT_EQ(support::names_in(own).size(), stay + 2);
+    EXPECT_EQ(support::names_in(own).size(), stay + 4);  // with the list and the link
     EXPECT_TRUE(exists(path("real_path_date_final")) && exists(own + "/2000-01-01_00-00-01"));
     EXPECT_EQ(exists(own + "/2001-02-03_04-05-06-10"), stay > 0);
   }
