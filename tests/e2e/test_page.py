@@ -47,6 +47,7 @@ class Page(ProductTest):
         run = self.m.run('--report', name)
         self.assertEqual((run.status, self.m.status(name)), (0, 'success'), run.log_lines)
         shutil.copytree(self.m.report_folders(name)[-1], self.pages / name)
+        shutil.copy(self.m.reports / name / 'index.html', self.pages / name)
         (self.pages / name / 'status.json').write_text(
             self.m.shell(f'/usr/vorn/bin/vornctl status {name} --json').out)
         self.m = self.new_machine()

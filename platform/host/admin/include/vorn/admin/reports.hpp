@@ -32,8 +32,8 @@ std::optional<std::vector<StoredReport>> stored_reports(const std::string& folde
 // Removes the whole report `name` of `folder` and follows no link on the way. False after a
 // message, with nothing removed when it isn't a whole report.
 bool remove_report(const std::string& folder, const std::string& name);
-// Brings the list of the reports in `folder` and the link to the newest up to date, which whoever has
-// removed one, or brought one there, does at last. A message for what fails.
+// Brings the list of the reports in `folder` and the link to the newest up to date, which whoever
+// has removed one, or brought one there, does at last. A message for what fails.
 void update_index(const std::string& folder);
 // Removes every whole report of `folder`, what pages are made of there, and the folder itself when
 // nothing else is in it; a message when it stays. False, after a message, when a report is left.
