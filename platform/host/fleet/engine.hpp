@@ -29,9 +29,9 @@ class Engine {
 
   // Fills `out` with the next bytes of rows in the TabSeparated format; 0 at their end.
   using Source = std::function<std::size_t(char* out, std::size_t size)>;
-  // Sends rows to `table`, compressed unless the node is this machine's own. All of them are in its place when it returns true; after
-  // false nobody knows how many are. Another node is tried as long as nothing was asked of
-  // `source`.
+  // Sends rows to `table`, compressed unless the node is this machine's own. All of them are in its
+  // place when it returns true; after false nobody knows how many are. Another node is tried as
+  // long as nothing was asked of `source`.
   bool insert(const std::string& table, const Source& source);
 
   // Runs a statement on one node, outside of the configured database.

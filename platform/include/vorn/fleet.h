@@ -29,8 +29,8 @@ const char* VORNFleetProblem(const VORNFleet* fleet);
 
 // Fills `out` with the next bytes of rows in the engine's TabSeparated format; 0 at their end.
 typedef size_t (*VORNFleetSource)(void* context, char* out, size_t size);
-// Adds rows to `table`, compressed on their way to another machine. 0 when all of them are in their place; -1 when
-// nobody knows how many are. Every wait is bounded.
+// Adds rows to `table`, compressed on their way to another machine. 0 when all of them are in their
+// place; -1 when nobody knows how many are. Every wait is bounded.
 int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetSource source, void* context);
 
 // As sqlite3_exec's callback: 0 to go on. Columns can be null; `names` is never null and holds

@@ -40,11 +40,11 @@ int VornQazProfileRunning(const char* profile);
 // "success" is stored only when the finished report, page and facts, is complete and on the disk;
 // otherwise "fail" is stored, one syslog line says why, and what looked like a report is removed.
 // Behind the word the status file tells more (report_format/run_state.hpp).
-// That end is told (see vornreport(8), "Who is told"): a failure by mail and on standard error, what
-// no mail has told on standard error, everything in the profile's metrics_file.
-// 0 when the word was stored; 1 when "fail" was, in place of "success"; -1 when nothing could be.
-// After a success the oldest finished reports beyond the profile's key `keep_reports` (a number
-// from 1 on; unset: all are kept) are removed, never the one just made.
+// That end is told (see vornreport(8), "Who is told"): a failure by mail and on standard error,
+// what no mail has told on standard error, everything in the profile's metrics_file. 0 when the
+// word was stored; 1 when "fail" was, in place of "success"; -1 when nothing could be. After a
+// success the oldest finished reports beyond the profile's key `keep_reports` (a number from 1 on;
+// unset: all are kept) are removed, never the one just made.
 int VornQazStatusUpdate(const char* profile, const char* status);
 
 // A run of `profile` that was only to collect data has failed: stores, beside its word, that it has
