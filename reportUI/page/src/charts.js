@@ -85,7 +85,9 @@ export function sparkline(samples, {width, height, now, size = 0, forecast, limi
   const [least, most] = [Math.min(...uses), Math.max(...uses, limit ? size : 0)];
   // What hardly moves is drawn flat.
   const floor = Math.max(0, Math.min(least, most - (size || most) * LEAST_SPAN) - (most - least) * .18);
-  const y = scaleLinear([floor, most + (most - floor) * .02 || 1], [height - 2, 3]);
+  // At the top is a full volume; one whose fill isn't in the drawing must not look full.
+  const headroom = size && !limit ? .8 : .02;
+  const y = scaleLinear([floor, most + (most - floor) * headroom || 1], [height - 2, 3]);
   const path = line(({date}) => x(Math.max(date, now - PAST * DAY)), ({used}) => y(used));
   const below = area(({date}) => x(Math.max(date, now - PAST * DAY)), height, ({used}) => y(used));
   const drawing = svg('svg', {class: `spark ${level}`, viewBox: `0 0 ${width} ${height}`,
