@@ -112,7 +112,9 @@ std::string text_behind(const std::string& file, off_t start) {
 
 RunLines lines_of_run(const admin::RunTrace& trace) {
   if (!has_journal()) {
-    return lines_between(trace.started, trace.ended.value_or(std::time(nullptr)));
+    constexpr std::time_t kLastWords = 2;  // what it says once its status is written
+    return lines_between(trace.started,
+                         trace.ended ? *trace.ended + kLastWords : std::time(nullptr));
   }
   const auto read = ask_program({kJournalctl, "--quiet", "--no-pager", "--output=short-iso",
                                  "--since=@" + std::to_string(trace.started),
