@@ -66,9 +66,9 @@ void configure_sqlite() {
   // Every connection belongs to one thread.
   sqlite3_config(SQLITE_CONFIG_MULTITHREAD);
   sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);
-  // Pages (4 MiB) that a sort gathers before it writes them out: more would leave the processor's
-  // caches, fewer would make so many runs of ten million rows that merging them took more memory.
-  constexpr unsigned kSortedRun = 512;
+  // Pages (2 MiB) that a sort gathers before it writes them out: two sorts at work should fit into
+  // the processor's caches.
+  constexpr unsigned kSortedRun = 256;
   sqlite3_config(SQLITE_CONFIG_PMASZ, kSortedRun);
 #ifndef VORN_HOST_ASAN  // the sanitizer sees errors in blocks of the system allocator only
   sqlite3_config(SQLITE_CONFIG_MALLOC, &host::sqlite_memory);
