@@ -20,15 +20,6 @@
 namespace ctl {
 namespace {
 
-template <typename Visit>
-void each_line(std::string_view text, Visit visit) {
-  for (std::size_t start = 0; start < text.size();) {
-    const std::size_t end = std::min(text.find('\n', start), text.size());
-    visit(text.substr(start, end - start));
-    start = end + 1;
-  }
-}
-
 // What systemd says of a timer's next run.
 std::optional<std::time_t> asked_of_systemd(const Job& job) try {
   constexpr std::chrono::seconds kLimit{5};
@@ -63,7 +54,7 @@ std::string times_text(const Job& job) {
 
 void check_runs_only(const std::string& profile, const std::string& file, std::string_view text) {
   bool only = true;
-  each_line(text, [&](std::string_view line) {
+  host::each_line(text, [&](std::string_view line) {
     const std::string_view text_of_line = host::trimmed(line);
     const auto jobs = admin::jobs_in({}, line);
     only = only && (text_of_line.empty() || text_of_line.front() == '#' ||

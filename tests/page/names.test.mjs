@@ -28,15 +28,21 @@ test('names are shown exactly and do nothing', () => withPage(fileOf('hostile'),
   assert.equal((await section(page, 'duplicate_file')).heading, 'Confirmed duplicates (same content)');
 }));
 
-// Bytes that are no UTF-8 stand in the address as they are.
-test('a folder of any name can be gone into, and has an address', () => withPage(withFacts(withBlock(
+const withFolders = size => withFacts(withBlock(
   read('hostile'), 'vornFolderUsageData', `[\n${['.', 'a ?#%\\udcff', 'a ?#%\\udcff/b'].map(
     (folder, i) => `[ 's', '${folder}', '${9 - i}', '1', '1700000000' ]`).join(',\n')}\n];\n</script>\n`), facts({
-  volumes: [volume('/x', 9, {size: 18})], shares: [{name: 's', path: '/x/s', volume: '/x', files: 1, bytes: 9, samples: []}]})), async page => {
+  volumes: [volume('/x', 9, {size})], shares: [{name: 's', path: '/x/s', volume: '/x', files: 1, bytes: 9, samples: []}]}));
+
+// Bytes that are no UTF-8 stand in the address as they are.
+test('a folder of any name can be gone into, and has an address', () => withPage(withFolders(18), async page => {
   await page.locator('.box.way', {hasText: 's: 9'}).press('Enter');
   await page.locator('.box.way', {hasText: 'a ?#%'}).press('Enter');
   assert.equal(await page.locator('.go').getAttribute('href'), 'file:///x/s/a%20%3F%23%25%ff');
   assert.equal(await page.locator('.trail .chip').innerText(), '\\xff');
+}));
+
+test('a share too small to be seen in its volume is gone into', () => withPage(withFolders(9000), async page => {
+  assert.deepEqual(await page.locator('.trail > :is(button:not(.copy), b)').allInnerTexts(), ['All volumes', '/x', 's']);
 }));
 
 test('the clipboard gets the names themselves', () => withClipboard('hostile', async (page, clipboard) => {

@@ -61,15 +61,6 @@ std::optional<Job> job_in(const std::string& file, std::string_view line) {
   return job.profile.empty() ? std::nullopt : std::optional(std::move(job));
 }
 
-template <typename Visit>
-void each_line(std::string_view text, Visit visit) {
-  for (std::size_t start = 0; start < text.size();) {
-    const std::size_t end = std::min(text.find('\n', start), text.size());
-    visit(text.substr(start, end - start));
-    start = end + 1;
-  }
-}
-
 // Debian's cron leaves out every other name, so that editors' copies and packages' leftovers don't
 // run.
 bool is_cron_name(std::string_view name) {

@@ -90,6 +90,17 @@ const canEnter = ({children, kind}) => kind !== 'all' && children?.length > 0;
 
 // --- The drawing --------------------------------------------------------------------------------
 
+// The way from the top to where a reader begins: the volume `name`, or the only one; and where its
+// shares are too small a part of it to be seen, the largest of them.
+function beginning(tree, name) {
+  const LEAST_PART = .02;
+  const volume = tree.children.find((each, i, all) => all.length === 1 || each.name === name);
+  const shares = volume?.children.filter(({kind}) => kind === 'share') ?? [];
+  const largest = shares.toSorted((one, two) => two.bytes - one.bytes)[0];
+  const isSeen = shares.reduce((sum, {bytes}) => sum + bytes, 0) >= volume?.bytes * LEAST_PART;
+  return [tree, ...volume ? [volume] : [], ...largest && !isSeen && canEnter(largest) ? [largest] : []];
+}
+
 // The box that lies nearest in the direction of an arrow key.
 function neighbour(boxes, from, key) {
   const [dx, dy] = {ArrowLeft: [-1, 0], ArrowRight: [1, 0], ArrowUp: [0, -1],
@@ -142,7 +153,7 @@ class Treemap {
       }
     }
     if (!stateOf(key)) {
-      this.way.push(...tree.children.filter(({name}) => tree.children.length === 1 || name === first));
+      this.way = beginning(tree, first);
     }
     this.go(this.way);
   }

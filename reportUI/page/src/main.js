@@ -247,12 +247,10 @@ format.chooseZone(facts?.time_zone || main.dataset.zone);
 format.callVolumes(facts?.volumes ?? []);
 document.addEventListener('copy', copyOriginals);
 document.addEventListener('click', ({target}) => target.closest('.long')?.classList.toggle('open'));
-// Goes where the address leads, also if that has changed meanwhile.
-const renderAtAnchor = () => render().then(() => document.getElementById(anchorOf())?.scrollIntoView());
+// Goes where the address leads, also if that has changed while the page was made.
+const goToAnchor = () => document.getElementById(anchorOf())?.scrollIntoView();
+const renderAtAnchor = () => render().then(goToAnchor);
 readAddress();
-window.addEventListener('hashchange', () => {
-  if (followAnchor()) {
-    renderAtAnchor();
-  }
-});
+// The browser has gone there by itself, but a page that was being made may have gone elsewhere since.
+window.addEventListener('hashchange', () => followAnchor() ? renderAtAnchor() : goToAnchor());
 renderAtAnchor();

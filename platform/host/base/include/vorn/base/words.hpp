@@ -1,4 +1,4 @@
-// Values of the configuration that hold several words.
+// Texts of several words or lines.
 #ifndef VORN_HOST_WORDS_HPP
 #define VORN_HOST_WORDS_HPP
 
@@ -27,6 +27,16 @@ inline std::vector<std::string_view> comma_words(std::string_view list) {
     list.remove_prefix(std::min(end + 1, list.size()));
   }
   return words;
+}
+
+// Calls `visit` with each line of `text`, without its end.
+template <typename Visit>
+void each_line(std::string_view text, Visit visit) {
+  for (std::size_t start = 0; start < text.size();) {
+    const std::size_t end = std::min(text.find('\n', start), text.size());
+    visit(text.substr(start, end - start));
+    start = end + 1;
+  }
 }
 
 }  // namespace host
