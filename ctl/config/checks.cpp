@@ -23,6 +23,7 @@
 #include "vorn/base/utf8.hpp"
 #include "vorn/base/words.hpp"
 #include "vorn/paths.h"
+#include "vorn/volume.h"
 
 namespace ctl {
 namespace {
@@ -364,6 +365,16 @@ std::vector<std::string> installed_languages() {
     }
   }
   return {codes.begin(), codes.end()};
+}
+
+bool any_quotas() {
+  VORNMountVolInfo* volumes = VORNMountVolAllEnum(nullptr, VORN_VOLUMES_OF_QUOTA);
+  bool found = false;
+  for (const VORNMountVolInfo* volume = volumes; volume != nullptr; volume = volume->next) {
+    found = found || VORNVolumeHasQuotas(volume->path) != 0;
+  }
+  VORNMountVolInfoFree(volumes);
+  return found;
 }
 
 std::string suggestion(std::string_view name, const std::vector<std::string>& names) {

@@ -43,6 +43,9 @@ std::vector<std::string> report_names();
 // The codes of the languages that are installed.
 std::vector<std::string> installed_languages();
 
+// Whether a volume has quotas of users.
+bool any_quotas();
+
 // `; did you mean "..."?` for the nearest of `names`, or nothing when none is near.
 std::string suggestion(std::string_view name, const std::vector<std::string>& names);
 

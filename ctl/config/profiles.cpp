@@ -17,7 +17,6 @@
 #include "vorn/admin/history.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/paths.h"
-#include "vorn/volume.h"
 
 namespace ctl {
 namespace {
@@ -91,16 +90,6 @@ struct NewProfile {
   std::string duplicates{};                                  // old spellings
   bool no_history = false;
 };
-
-bool any_quotas() {
-  VORNMountVolInfo* volumes = VORNMountVolAllEnum(nullptr, VORN_VOLUMES_OF_QUOTA);
-  bool found = false;
-  for (const VORNMountVolInfo* volume = volumes; volume != nullptr; volume = volume->next) {
-    found = found || VORNVolumeHasQuotas(volume->path) != 0;
-  }
-  VORNMountVolInfoFree(volumes);
-  return found;
-}
 
 // All reports that have something to tell: without quotas one would only log an error each time.
 std::string default_reports() {

@@ -6,6 +6,7 @@
 #include <cstring>
 
 #include "base/ctl.hpp"
+#include "config/checks.hpp"
 #include "config/share_state.hpp"
 #include "doctor/doctor.hpp"
 #include "report_format/reports.hpp"
@@ -37,6 +38,28 @@ void check_shares(Findings& findings, const Configuration& configuration) {
   }
 }
 
+namespace {
+
+// Without quotas the report quota_usage of `profile` is an error in the log each time.
+void check_quotas(Findings& findings, const Section& profile) {
+  std::string others;
+  for (const std::string& name : report_names()) {
+    if (name != report_format::kQuotaUsage.name &&
+        report_format::is_selected(name, profile.value("report_list"))) {
+      others += (others.empty() ? "" : ",") + name;
+    }
+  }
+  if (!any_quotas()) {
+    findings.add(Level::warning, "quotas",
+                 "no volume has any, so the report quota_usage of profile " + profile.name +
+                     " comes to nothing",
+                 "turn quotas on, or run vornctl profile set " + profile.name + " report_list " +
+                     (others.empty() ? "REPORTS" : others));
+  }
+}
+
+}  // namespace
+
 void check_quota_tool(Findings& findings, const Configuration& configuration) {
   constexpr const char* kTool = "/sbin/repquota";
   const auto wants = [](const Section& profile) {
@@ -50,6 +73,7 @@ void check_quota_tool(Findings& findings, const Configuration& configuration) {
   }
   if (access(kTool, X_OK) == 0) {
     findings.ok("quota tool", kTool);
+    check_quotas(findings, *profile);
   } else {
     findings.add(Level::error, "quota tool",
                  std::string(kTool) + ", which the report quota_usage of profile " + profile->name +

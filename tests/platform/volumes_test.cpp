@@ -97,7 +97,7 @@ TEST(Volumes, OfTheNetworkAreThoseOfSharesThatSaySo) {
   EXPECT_STREQ(folder.path().c_str(), VLIBCSzHashGetValue(hash.get(), "remote"));
   const std::string log = support::syslog_text();
   EXPECT_TRUE(log.starts_with("share \"local\" is left out")) << log;
-  EXPECT_NE(std::string::npos, log.find("write network = yes")) << log;
+  EXPECT_NE(std::string::npos, log.find("run vornctl share set '")) << log;
 }
 
 TEST(Volumes, KeepQuotasByTheirMountOptions) {

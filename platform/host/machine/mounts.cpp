@@ -2,12 +2,16 @@
 
 #include <fcntl.h>
 #include <libmount/libmount.h>
+#include <sys/quota.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstddef>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -51,6 +55,15 @@ bool has_user_quotas(const char* options) {
          (std::any_of(kNames.begin(), kNames.end(),
                       [&](const char* name) { return is_set(name); }) ||
           is_set("usrjquota", true));
+}
+
+// Whether the kernel counts users' usage. ext4 and others can keep quotas inside, which are on
+// whatever the options say.
+bool counts_users(const std::string& target) {
+  const Fd folder(open(target.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  std::uint32_t format = 0;
+  return folder &&
+         syscall(SYS_quotactl_fd, folder.get(), QCMD(Q_GETFMT, USRQUOTA), 0, &format) == 0;
 }
 
 struct Place {
@@ -159,6 +172,8 @@ std::vector<Mount> read_own_mounts() {
     const bool is_hidden = !place && (errno == ENOENT || errno == ENOTDIR || errno == EACCES);
     mount.visible = place ? place->mount_id.value_or(mount.id) == mount.id : !is_hidden;
     mount.is_folder = place ? place->is_folder : !is_hidden;
+    mount.has_user_quotas =
+        mount.has_user_quotas || (mount.visible && mount.is_folder && counts_users(mount.target));
   }
   return mounts;
 }

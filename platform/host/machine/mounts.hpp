@@ -18,7 +18,7 @@ struct Mount {
   std::string target;  // where
   std::string type;
   VornFsKind kind = VORN_FS_OTHER;
-  bool has_user_quotas = false;  // by its options: usage of users is counted
+  bool has_user_quotas = false;  // usage of users is counted, by its options or the kernel's word
   bool visible = true;           // no later mount covers it
   bool is_folder = true;         // containers mount single files too
   bool holds_share = false;      // set by those who ask for volumes
@@ -34,8 +34,9 @@ std::vector<Mount> read_mounts(const char* table);
 // tried (base/silence.hpp).
 bool hangs(VornFsKind kind, const std::string& target);
 
-// The mounts of this process. What is visible and what is a folder is asked of the kernel, for
-// file systems of walked kinds (asking a dead network server could take for ever).
+// The mounts of this process. What is visible, what is a folder and what has quotas that its
+// options don't tell is asked of the kernel, for file systems of walked kinds (asking a dead
+// network server could take for ever).
 std::vector<Mount> read_own_mounts();
 
 // The mount that holds `path` (links followed), or null.

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <functional>
 #include <memory>
 #include <utility>
 
@@ -73,12 +74,25 @@ struct FreeRecords {
 };
 using Records = std::unique_ptr<VORNMountVolInfo, FreeRecords>;
 
-Records measure_volumes() {
+// Those that hold data. Of them those that have quotas; where none seems to, the tool shall say why
+// a report of quotas that somebody wants comes to nothing.
+std::vector<Volume> selected_volumes(int selector) {
+  std::vector<Volume> volumes = read_volumes().volumes;
+  std::erase_if(volumes, [](const Volume& volume) { return !volume.holds_data; });
+  const auto has_quotas = [](const Volume& volume) { return volume.has_user_quotas; };
+  if (selector == VORN_VOLUMES_OF_QUOTA &&
+      std::any_of(volumes.begin(), volumes.end(), has_quotas)) {
+    std::erase_if(volumes, std::not_fn(has_quotas));
+  }
+  return volumes;
+}
+
+Records measure_volumes(int selector) {
   static Measurements measurements;
   Records first;
   VORNMountVolInfo* last = nullptr;
-  for (const Volume& volume : read_volumes().volumes) {
-    const auto space = volume.holds_data ? measurements.of(volume) : std::nullopt;
+  for (const Volume& volume : selected_volumes(selector)) {
+    const auto space = measurements.of(volume);
     if (!space) {
       continue;
     }
@@ -97,13 +111,13 @@ Records measure_volumes() {
 }  // namespace
 }  // namespace host
 
-VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int /*selector*/) try {
+VORNMountVolInfo* VORNMountVolAllEnum(const char* filter, int selector) try {
   if (filter != nullptr) {
     errno = EINVAL;
     return nullptr;
   }
   const host::ErrnoKeeper keeper;
-  return host::measure_volumes().release();
+  return host::measure_volumes(selector).release();
 } catch (...) {
   errno = ENOMEM;
   return nullptr;

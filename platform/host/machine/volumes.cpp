@@ -17,7 +17,6 @@
 #include "config/shares.hpp"
 #include "machine/file_system.hpp"
 #include "vorn/base/file_io.hpp"
-#include "vorn/paths.h"
 #include "vorn/volume.h"
 
 namespace host {
@@ -71,7 +70,8 @@ std::vector<Volume> choose_volumes(const std::vector<Mount>& mounts) {
   for (const Mount* mount : best) {
     const bool holds_data =
         mount->kind != VORN_FS_MEMORY || mount->target == "/" || shared.contains(mount->device);
-    volumes.push_back({mount->device, mount->target, mount->kind, holds_data});
+    volumes.push_back(
+        {mount->device, mount->target, mount->kind, holds_data, mount->has_user_quotas});
   }
   return volumes;
 }
@@ -152,9 +152,9 @@ const std::string& known_cut_volume_id(const std::string& cut) {
 void tell_unwalked(const Share& share, const Mount& mount) {
   if (mount.kind == VORN_FS_REMOTE) {
     log_line(
-        "share \"%s\" is left out: %s is on a network file system (%s); write network = yes in its "
-        "section in %s to walk it all the same",
-        share.name.c_str(), share.path.c_str(), mount.type.c_str(), VORN_PATH_SHARES);
+        "share \"%s\" is left out: %s is on a network file system (%s); to walk it all the "
+        "same run vornctl share set '%s' --network",
+        share.name.c_str(), share.path.c_str(), mount.type.c_str(), share.name.c_str());
   } else {
     log_line("share \"%s\": %s is on a file system that is not walked (%s); it adds nothing",
              share.name.c_str(), share.path.c_str(), mount.type.c_str());
@@ -239,7 +239,7 @@ int VORNVolumeHasQuotas(const char* mount_path) try {
   if (mount_path == nullptr) {
     return 0;
   }
-  const auto mounts = host::read_mounts(host::kOwnMountTable);
+  const auto mounts = host::read_own_mounts();
   const bool found = std::any_of(mounts.begin(), mounts.end(), [=](const host::Mount& mount) {
     return mount.visible && mount.has_user_quotas && mount.target == mount_path;
   });

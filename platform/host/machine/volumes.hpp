@@ -20,6 +20,7 @@ struct Volume {
   // Whether it holds users' data for sure. Memory file systems (/run, /dev/shm, the layers of
   // containers) do only when they are the root or when a share lies on them.
   bool holds_data;
+  bool has_user_quotas = false;
 };
 
 // Every device with a visible folder of a walked kind, in mount order, at the best of its mounts:

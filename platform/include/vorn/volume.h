@@ -20,8 +20,8 @@ typedef struct VORNMountVolInfo {
   struct VORNMountVolInfo* next;
 } VORNMountVolInfo;
 
-// Which volumes: all that hold users' data, or those of them that can have quotas as well. This
-// platform gives the same for both; the quota tool itself knows.
+// Which volumes: all that hold users' data, or those of them that have users' quotas; where none
+// has, all again, so that the quota tool itself says what is the matter.
 enum { VORN_VOLUMES_OF_USAGE = 11, VORN_VOLUMES_OF_QUOTA = 15 };
 
 // The mounted volumes, freed by the caller; null when there are none. `filter` must be null. A
@@ -42,7 +42,8 @@ int VornQazGetVolumePathHash(VLIBCSzHash** hash);
 // or -1 when it can't be told or doesn't fit.
 int VORNVolumeOfPath(const char* path, char* mount_path, size_t size);
 
-// Non-zero when the volume mounted at `mount_path` keeps users' quotas, by its mount options.
+// Non-zero when the volume mounted at `mount_path` keeps users' quotas, by its mount options
+// or the kernel's word.
 int VORNVolumeHasQuotas(const char* mount_path);
 
 // Writes the identifier of the volume mounted at `mount_path`: a short text, the same from run to
