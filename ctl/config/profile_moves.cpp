@@ -11,7 +11,7 @@
 #include "base/ctl.hpp"
 #include "base/stored_reports.hpp"
 #include "config/commands.hpp"
-#include "schedule/jobs.hpp"
+#include "schedule/removal.hpp"
 #include "vorn/admin/history.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/base/file_io.hpp"
@@ -164,6 +164,7 @@ void rename_profile(const Move& move) {
   if (!admin::forget_history(move.profile)) {
     throw host_failure("the history under the old name stays");
   }
+  warn_of_jobs(move.profile);
 }
 
 void describe(CLI::App& command, void (*run)(const Move&), const std::shared_ptr<Move>& move) {

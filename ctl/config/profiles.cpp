@@ -12,7 +12,7 @@
 #include "config/checks.hpp"
 #include "config/commands.hpp"
 #include "report_format/reports.hpp"
-#include "schedule/jobs.hpp"
+#include "schedule/removal.hpp"
 #include "schedule/timers.hpp"
 #include "vorn/admin/history.hpp"
 #include "vorn/admin/runs.hpp"
@@ -263,8 +263,7 @@ void remove_profile(const std::string& name, bool reports_too) {
   const Section profile = read_profile(name);
   const std::string folder = folder_of_reports(profile);
   hold_profile(name);
-  remove_cron_file(profile);
-  remove_timers(name);
+  remove_schedule(profile);
   admin::forget_runs(profile);  // what can't be removed has a message
   if (reports_too && !admin::remove_all_reports(folder)) {
     throw host_failure(folder + " can't be emptied");
@@ -273,6 +272,7 @@ void remove_profile(const std::string& name, bool reports_too) {
   if (!admin::forget_history(name)) {
     throw host_failure("the history of " + titled(name) + " stays");
   }
+  warn_of_jobs(name);
   if (!reports_too && access(folder.c_str(), F_OK) == 0) {
     warn("the reports of " + titled(name) + " stay in " + folder);
   }

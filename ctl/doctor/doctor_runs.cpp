@@ -10,7 +10,7 @@
 #include "base/stored_reports.hpp"
 #include "base/texts.hpp"
 #include "doctor/doctor.hpp"
-#include "schedule/jobs.hpp"
+#include "schedule/removal.hpp"
 #include "schedule/timers.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/base/cron_times.hpp"
@@ -56,9 +56,7 @@ void check_job(Findings& findings, const Job& job, const Configuration& configur
                      });
   if (!known) {
     findings.add(Level::warning, subject, "profile " + job.profile + " doesn't exist",
-                 job.by == Scheduler::cron
-                     ? "remove the line"
-                     : "run systemctl disable --now " + admin::timer_of(job.kind, job.profile));
+                 removal_of(job));
     return;
   }
   if (job.by == Scheduler::timer) {
@@ -175,11 +173,12 @@ void check_last_runs(Findings& findings, const Configuration& configuration) {
     if (const auto due = admin::overdue_since(profile.name, begun, std::time(nullptr));
         due && state != RunState::running) {
       findings.add(Level::warning, "reports of " + profile.name, overdue_text(begun, *due),
-                   "see that cron or the timer runs, and look into the system log");
+                   "see that cron or the timer runs, and look into vornctl log " + profile.name);
     }
     if (state == RunState::failed || state == RunState::ended_early) {
-      findings.add(Level::warning, subject, word_for(state),
-                   "look into the system log, then run vornctl run " + profile.name);
+      findings.add(
+          Level::warning, subject, word_for(state),
+          "look into vornctl log " + profile.name + ", then run vornctl run " + profile.name);
     } else {
       findings.ok(subject, word_for(state));
     }

@@ -151,6 +151,10 @@ void print_remarks(const ProfileStatus& status) {
   if (status.state == admin::RunState::ended_early && status.started > 0) {
     print_line(status.name + ": the run of " + time_text(status.started) + " didn't finish");
   }
+  if (status.state == admin::RunState::failed) {
+    print_line(status.name + ": the last run failed; vornctl log " + status.name +
+               " says why, vornctl doctor what to do");
+  }
   if (status.overdue) {
     print_line(status.name + ": " + overdue_text(status.begun, *status.overdue) +
                "; run vornctl doctor");
@@ -218,7 +222,8 @@ void status(const Options& options) {
 
 void add_status_command(CLI::App& app) {
   auto options = std::make_shared<Options>();
-  CLI::App* command = app.add_subcommand("status", "Show runs, reports and schedules of profiles");
+  CLI::App* command = app.add_subcommand(
+      "status", "Print how profiles are doing: last run, newest report, next run");
   add_profile_argument(*command, options->profile)->required(false);
   add_json_flag(*command, options->json);
   command->callback([options] { status(*options); });

@@ -91,21 +91,4 @@ std::string cron_file_problem(const std::string& file) {
   return text && !text->empty() && !text->ends_with('\n') ? "has no line end at its end" : "";
 }
 
-std::string remove_cron_file(const Section& profile) {
-  const std::string id = profile.value(kScheduleKey);
-  if (id.empty()) {
-    return "";
-  }
-  if (!admin::is_schedule_id(id)) {
-    throw Failure("profile " + profile.name + ": " + kScheduleKey + " = " + id +
-                  " is no schedule identifier; unset it with vornctl profile set");
-  }
-  std::string path = admin::schedule_file(id);
-  check_runs_only(profile.name, path, host::read_file(path, kLargestCronFile).value_or(""));
-  if (unlink(path.c_str()) != 0 && errno != ENOENT) {
-    throw Failure(path + " can't be removed (" + std::strerror(errno) + "); run this as root");
-  }
-  return path;
-}
-
 }  // namespace ctl

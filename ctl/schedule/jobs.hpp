@@ -39,10 +39,6 @@ std::string times_text(const Job& job);
 // Why cron would not read `file`, and what to do; empty when nothing is wrong.
 std::string cron_file_problem(const std::string& file);
 
-// Removes the cron file of the profile's schedule, if it runs nothing else. Its path, or an empty
-// text when the profile has no schedule. Throws a Failure when it stays.
-std::string remove_cron_file(const Section& profile);
-
 }  // namespace ctl
 
 #endif

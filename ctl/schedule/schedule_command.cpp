@@ -20,6 +20,7 @@
 #include "base/texts.hpp"
 #include "schedule/commands.hpp"
 #include "schedule/jobs.hpp"
+#include "schedule/removal.hpp"
 #include "schedule/timers.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/base/cron_times.hpp"
@@ -94,7 +95,7 @@ void write_cron_file(const std::string& path, const std::string& text) {
   if (file.fd() < 0 || fchmod(file.fd(), kMode) != 0 || !host::write_all(file.fd(), text) ||
       !file.commit()) {
     throw Failure(path + " can't be written (" + std::strerror(errno) +
-                  "); run this as root and see that cron is installed");
+                  "); see that cron is installed, or use --timer");
   }
 }
 
@@ -105,7 +106,7 @@ host::Fd lock_schedules() {
   host::Fd lock(open(kLock, O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
   if (!lock || flock(lock.get(), LOCK_EX) != 0) {
     throw Failure(std::string(kLock) + " can't be locked (" + std::strerror(errno) +
-                  "); run this as root");
+                  "); see to its folder");
   }
   return lock;
 }
@@ -209,21 +210,25 @@ void set_schedule(const Options& options) {
   }
 }
 
-void clean_schedule(const Options& options) {
+// Of a profile that is gone, too: an edited file may have left its jobs behind.
+void clean_schedule(const std::string& name) {
   const host::Fd lock = lock_schedules();
-  const Section profile = read_profile(options.profile);
-  const std::string path = remove_cron_file(profile);
-  const std::vector<std::string> timers = remove_timers(profile.name);
-  if (path.empty() && timers.empty()) {
-    print_line("profile " + profile.name + " has no schedule");
+  const bool is_gone = admin::is_profile_name(name) && !profile_exists(name);
+  const Section profile = is_gone ? Section{name, {}} : read_profile(name);
+  const std::vector<std::string> removed = remove_schedule(profile);
+  if (is_gone && removed.empty()) {
+    read_profile(name);  // which tells of a wrong name
   }
-  if (!path.empty()) {
-    change_section(VORN_PATH_CONFIG, profile.name, {{kScheduleKey, std::nullopt}});
-    print_line("removed " + path);
+  if (profile.find(kScheduleKey) != nullptr) {
+    change_section(VORN_PATH_CONFIG, name, {{kScheduleKey, std::nullopt}});
   }
-  for (const std::string& timer : timers) {
-    print_line("removed " + timer);
+  if (removed.empty()) {
+    print_line("profile " + name + " has no schedule");
   }
+  for (const std::string& job : removed) {
+    print_line("removed " + job);
+  }
+  warn_of_jobs(name);
 }
 
 // All jobs, or those of one profile.
@@ -272,7 +277,7 @@ void schedule(const Options& options) {
     throw Failure("name the profile; vornctl schedule alone shows what is scheduled", kWrongUsage);
   }
   if (options.clean) {
-    clean_schedule(options);
+    clean_schedule(options.profile);
   } else if (sets) {
     set_schedule(options);
   } else {
@@ -285,7 +290,7 @@ void schedule(const Options& options) {
 void add_schedule_command(CLI::App& app) {
   auto options = std::make_shared<Options>();
   CLI::App* command =
-      app.add_subcommand("schedule", "Show schedules, or have a profile run by the clock");
+      app.add_subcommand("schedule", "Print schedules, or have a profile run by the clock");
   add_profile_argument(*command, options->profile)->required(false);
   command
       ->add_option("--report", options->report, "When to make a report: five cron fields or @daily")

@@ -62,7 +62,7 @@ void write_drop_in(const std::string& unit, const std::string& text) {
   host::AtomicFile file(path);
   if (!is_made || file.fd() < 0 || fchmod(file.fd(), kMode) != 0 ||
       !host::write_all(file.fd(), kHead + text) || !file.commit()) {
-    throw Failure(path + " can't be written (" + std::strerror(errno) + "); run this as root");
+    throw Failure(path + " can't be written (" + std::strerror(errno) + "); see to its folder");
   }
 }
 
@@ -73,7 +73,7 @@ bool remove_drop_in(const std::string& unit) {
     if (errno == ENOENT) {
       return false;
     }
-    throw Failure(path + " can't be removed (" + std::strerror(errno) + "); run this as root");
+    throw Failure(path + " can't be removed (" + std::strerror(errno) + "); see to its folder");
   }
   rmdir(path.substr(0, path.rfind('/')).c_str());  // unless others have files in it
   return true;

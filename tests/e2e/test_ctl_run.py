@@ -9,7 +9,8 @@ import signal
 import time
 from pathlib import Path
 
-from harness import CTL, LIMIT, PROGRAM, CtlTest, Run, make_files, needs_root, wait_for
+from harness import (CTL, LIMIT, PROGRAM, SCRIPTS, CtlTest, Run, make_files, needs_root,
+                     wait_for)
 
 ALONE = 'unshare', '--pid', '--fork', '--kill-child', '--mount-proc'  # sees its own processes only
 WHOLE, CUT = '<!DOCTYPE html>\n</html>\n', '<!DOCTYPE html>\n'
@@ -196,11 +197,13 @@ class Schedules(WeeklyTest):
                     '>/dev/null\n')
         self.m.profile('a.b', report_list='volume_usage', schedule_collect_id='has.dots')
         self.m.profile('own', report_list='volume_usage', schedule_collect_id='job1')
-        (self.m.cron / 'vornreport-job1').write_text('0 0 * * * root backup\n')
         self.m.profile('twin', report_list='volume_usage', schedule_collect_id='weekly')
         report = job('0 4 * * 1', '--report', 'weekly')
         data = job('*/5 0-6/2 1,15 1-3 0,2-4', '--data', 'weekly')
-        other = {'vornreport-job1': '0 0 * * * root backup\n'}
+        mine = '@daily root /usr/vorn/bin/vornreport --report gone\n'
+        other = {'vornreport-job1': '0 0 * * * root backup\n', 'mine': mine, 'vornreport-gone': mine}
+        for name, text in other.items():
+            (self.m.cron / name).write_text(text)
         weekly = 'vornreport-weekly'
         for arguments, status, changed, err in (
                 (['weekly', '--report', ' 0  4 * * MON'], 0, {weekly: report}, ''),
@@ -216,6 +219,7 @@ class Schedules(WeeklyTest):
                  {'vornreport-a-b-108bf50c': job('@hourly', '--data', 'a.b')}, ''),
                 (['a.b', '--clean'], 0, {'vornreport-a-b-108bf50c': None}, ''),
                 (['own', '--report', '@daily'], 1, {}, 'vornreport-job1 holds other jobs '),
+                (['gone', '--clean'], 0, {'vornreport-gone': None}, r'mine still runs .*its line'),
                 (['weekly', '--clean'], 0, {weekly: None}, ''),
                 (['weekly', '--clean'], 0, {}, ''),
                 (['weekly'], 0, {}, ''),
@@ -238,10 +242,14 @@ class Schedules(WeeklyTest):
                 for path in self.m.cron.glob('vornreport-[aw]*'):
                     self.assertEqual(path.stat().st_mode & 0o7777, 0o644)
                 keys = re.findall(r'schedule_collect_id = (\S+)', self.m.config.read_text())
-                self.assertLessEqual({name[11:] for name in other}, set(keys))
+                self.assertLessEqual({name[11:] for name in other} - {'', 'gone'}, set(keys))
         self.ctl('schedule', 'weekly', '--data', '@daily')
-        self.m.run('--clean', 'weekly')
+        (self.m.cron / 'mine').write_text(mine.replace('gone', 'weekly'))
+        clean = self.m.run('--clean', 'weekly')
         self.assertNotIn(weekly, self.files())
+        self.assertEqual(clean.log_lines, ['profile "weekly" is still run by /etc/cron.d/mine; run '
+                                           'vornctl schedule weekly --clean'])
+        (self.m.cron / 'mine').unlink()
         # Two at once lose nothing of each other's.
         one = f'{CTL} schedule weekly'
         run = Run(self.m, ['sh', '-c', f'for i in 1 2 3 4 5 6 7 8; do {one} --clean; '
@@ -528,20 +536,26 @@ class EveryCommand(WeeklyTest):
 
     @needs_root
     def test_another_user_is_told_to_be_root(self):
-        (self.stored('weekly', {'2026-01-01_00-00-00': WHOLE})).chmod(0o700)
         for folder in (self.m.base, self.m.stage, self.m.stage / 'usr'):
             folder.chmod(0o755)
-        for words in ('share add x /etc', 'share set photos --network', 'share remove photos',
-                      'profile add x', 'profile set weekly language de', 'profile remove weekly',
-                      'profile copy weekly x', 'profile rename weekly x', 'run weekly', 'run --all',
-                      'log weekly', 'reports weekly', 'reports weekly keep 1', 'doctor',
-                      'schedule weekly --report @daily', 'schedule weekly --clean'):
+
+        def usages(*words):
+            """The usage of each command below this one, out of the help."""
+            text = self.ctl('help', *words).out
+            commands = re.findall(r'^  ([a-z]\S*)  ', text.partition('Subcommands:')[2], re.M)
+            return [usage for command in commands for usage in usages(*words, command)] or [text]
+        found = usages()
+        self.assertGreater(len(found), 25)
+        for usage in found:
+            line, = re.findall('Usage: vornctl (.*)', usage)
+            needed = re.findall(r'^  (--[a-z-]+) .*REQUIRED', usage, re.M)
+            words = [re.sub('[A-Z]+', '1', word) for word in re.sub(r'\[.*?\]', '', line).split()]
+            words += [word for option in needed for word in (option, '1')]
             with self.subTest(words):
                 run = Run(self.m, ['setpriv', '--reuid=65534', '--regid=65534', '--clear-groups',
-                                   CTL, *words.split()], None).finish()
+                                   CTL, *words], None).finish()
                 self.assertEqual((run.status, run.out), (1, ''), run.err)
-                self.assertRegex(run.err, 'as root')
-                self.assertNotIn('move it away', run.err)
+                self.assertRegex(run.err, '^vornctl: .*; run this as root\n$')
 
 
 class Doctor(WeeklyTest):
@@ -607,7 +621,12 @@ class Doctor(WeeklyTest):
                 ('error', 'cron: it does not run', schedule(line)),
                 ('error', 'schedule .*mine: .*the hour', schedule(line.replace('* *', '* 25', 1))),
                 ('error', 'schedule .*mine: it can be written', schedule(line, 0o666)),
-                ('warning', 'mine: profile gone ', schedule(line.replace('weekly', 'gone'))),
+                ('warning', 'mine: profile gone .*; remove its line from .*/mine',
+                 schedule(line.replace('weekly', 'gone'))),
+                ('error', 'template: .*index.js', lambda: (
+                    self.m.stage / SCRIPTS / 'template/index.js').unlink()),
+                ('warning', 'quotas: no volume has any, .*report_list share_list$',
+                 configure(report_list='quota_usage,share_list')),
                 ('error', 'profile more: its metrics_file is that of again',
                  lambda: [self.m.profile(name, report_list='share_list',
                                          metrics_file='/tmp/x.prom') for name in ('again', 'more')]),

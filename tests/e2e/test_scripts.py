@@ -82,7 +82,7 @@ ROOMS = {
                    'base-contract api'),
     'host-outcome': (r'platform/host/outcome/.*', 'host-schedule host-mail host-run host-config '
                      'host-base format base-contract api'),
-    'host-schedule': (r'platform/host/schedule/.*', 'base-contract api'),
+    'host-schedule': (r'platform/host/schedule/.*', 'host-config host-base base-contract api'),
     'host-mail': (r'platform/host/mail/.*', 'host-config host-base format base-contract api'),
     'host-run': (r'platform/host/run/.*', 'host-config host-base format base-contract api'),
     'host-machine': (r'platform/host/machine/.*', 'host-config host-base format base-contract api'),

@@ -1,12 +1,8 @@
-// Profile names, the list of profiles and their schedules.
+// Profile names and the list of profiles.
 #include "config/profile.hpp"
-
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <exception>
 #include <set>
 #include <string>
@@ -56,43 +52,6 @@ int enum_profiles(VLIBCSzList& list) {
   return count;
 }
 
-int clean_schedule(const char* profile, VLIBCSzHash& hash, const char* key) {
-  const char* value = hash.find(key);
-  const std::string id = value == nullptr ? "" : value;
-  if (id.empty()) {
-    return 0;
-  }
-  if (!valid_schedule_id(id)) {
-    log_line(
-        "profile \"%s\": %s = %.80s is no schedule identifier (1 to 64 of A-Z a-z 0-9 _ -); "
-        "run vornctl profile set %s %s ''",
-        profile, key, id.c_str(), profile, key);
-    errno = EINVAL;
-    return -1;
-  }
-  const int saved_errno = errno;
-  const std::string path = schedule_file(id);
-  struct stat status {};
-  if (lstat(path.c_str(), &status) == 0) {
-    if (!S_ISREG(status.st_mode) && !S_ISLNK(status.st_mode)) {
-      log_line("profile \"%s\": schedule %s is no file; remove it by hand", profile, path.c_str());
-      return -1;
-    }
-    if (unlink(path.c_str()) != 0) {
-      log_line("profile \"%s\": schedule %s can't be removed (%s)", profile, path.c_str(),
-               std::strerror(errno));
-      return -1;
-    }
-  } else if (errno != ENOENT && errno != ENOTDIR) {
-    log_line("profile \"%s\": schedule %s can't be examined (%s)", profile, path.c_str(),
-             std::strerror(errno));
-    return -1;
-  }
-  hash.remove(key);
-  errno = saved_errno;
-  return 1;
-}
-
 }  // namespace
 
 bool valid_profile(const char* profile) {
@@ -126,17 +85,6 @@ int VornQazEnumProfile(VLIBCSzList** list, int flags) {
   }
   try {
     return host::enum_profiles(**list);
-  } catch (const std::exception&) {
-    return -1;
-  }
-}
-
-int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key) {
-  if (!host::valid_profile(profile) || hash == nullptr || *hash == nullptr || key == nullptr) {
-    return -1;
-  }
-  try {
-    return host::clean_schedule(profile, **hash, key);
   } catch (const std::exception&) {
     return -1;
   }

@@ -85,8 +85,9 @@ int VornQazProgressUpdate(const char* profile, const char* text);
 void VornQazProgressEnd(const char* profile);
 
 // Removes the schedule whose identifier is the value of `key` in `*hash` (its file in
-// VORN_PATH_CRON), and the key. 1 when `*hash` changed, 0 when there was nothing to do, -1 on
-// failure with one syslog line.
+// VORN_PATH_CRON), and the key. One syslog line for each other job or timer that runs the profile:
+// those stay. 1 when `*hash` changed, 0 when there was nothing to do, -1 on failure with one syslog
+// line.
 int VornQazScheduleClean(const char* profile, VLIBCSzHash** hash, const char* key);
 
 // Copies the profile's language code (key `language`, default "en") into `code`. 1 to 7 letters,
