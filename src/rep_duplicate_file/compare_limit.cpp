@@ -40,8 +40,8 @@ void begin_compare_limit(const VLIBCSzHash* profile_hash) {
   if (!minutes) {
     REPORT_LOG_ERR(kDuplicateModule, __LINE__,
                    "%s \"%s\" is no whole number, so the comparison of contents has no limit; "
-                   "correct it in %s\n",
-                   kKey, value, VORN_PATH_CONFIG);
+                   "run vornctl profile set PROFILE %s NUMBER\n",
+                   kKey, value, kKey);
   }
   g_minutes = minutes.value_or(0);
   g_is_past = false;

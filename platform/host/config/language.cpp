@@ -5,7 +5,6 @@
 
 #include "base/host_log.hpp"
 #include "report_format/values.hpp"
-#include "vorn/paths.h"
 #include "vorn/report.h"
 
 int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size) {
@@ -19,8 +18,8 @@ int VornQazImportLang(const VLIBCSzHash* hash, char* code, size_t size) {
   if (!report_format::is_language_code(language) || language.size() >= size) {
     host::log_line(
         "language \"%.80s\" is no code of at most %zu letters, digits and '-', so the page is in "
-        "English; write language = en, for example, in %s",
-        value, size - 1, VORN_PATH_CONFIG);
+        "English; run vornctl profile set PROFILE language CODE",
+        value, size - 1);
     language = kDefault;
   }
   std::memcpy(code, language.data(), language.size());

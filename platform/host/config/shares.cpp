@@ -233,7 +233,7 @@ int VORNShareEnum(VLIBCSzList** list, int /*flags*/) try {
     return -1;
   }
   if (shares->empty()) {
-    host::log_line("no shares in %s; add a section [name] with path = /... for each",
+    host::log_line("no shares in %s; add each with vornctl share add NAME FOLDER",
                    VORN_PATH_SHARES);
   }
   for (const host::Share& share : *shares) {
@@ -248,14 +248,14 @@ int VORNShareEnum(VLIBCSzList** list, int /*flags*/) try {
 int VORNSharePathGet(const char* share, char* path, size_t size) try {
   const host::Share* found = host::find_share(share);
   if (found == nullptr || path == nullptr) {
-    host::log_line("share \"%s\" is not in %s; add a section for it", share == nullptr ? "" : share,
-                   VORN_PATH_SHARES);
+    host::log_line("share \"%s\" is not in %s; run vornctl share add NAME FOLDER",
+                   share == nullptr ? "" : share, VORN_PATH_SHARES);
     errno = ENOENT;
     return -1;
   }
   if (!found->path_error.empty()) {
-    host::log_line("share \"%s\" can't be read: %s in %s", share, found->path_error.c_str(),
-                   VORN_PATH_SHARES);
+    host::log_line("share \"%s\" can't be read: %s in %s; run vornctl share set NAME path FOLDER",
+                   share, found->path_error.c_str(), VORN_PATH_SHARES);
     errno = EINVAL;
     return -1;
   }

@@ -6,15 +6,13 @@
 
 #include <string>
 
-#include "vorn/paths.h"
-
 namespace host {
 
 // Thrown for an index that can't be used.
 struct IndexRefusal {
   std::string reason;
   std::string advice =
-      "have a whole one renamed into its place, or take file_index out of " VORN_PATH_SHARES;
+      "have a whole one renamed into its place, or run vornctl share set NAME file_index ''";
 };
 
 // Reads the table `file_info` of the open database `source` (`size` bytes) and writes a new

@@ -49,7 +49,7 @@ struct OpenIndex {
 
 OpenIndex open_index(const std::string& path) {
   if (path.front() != '/') {
-    throw IndexRefusal{"its path is not absolute", "write file_index = /... in " VORN_PATH_SHARES};
+    throw IndexRefusal{"its path is not absolute", "run vornctl share set NAME file_index /PATH"};
   }
   const std::size_t name = path.rfind('/') + 1;
   OpenIndex index;

@@ -48,8 +48,9 @@ std::vector<std::string> addresses(const char* profile, std::string_view list) {
     if (valid_address(address)) {
       found.push_back(address);
     } else {
-      log_line(R"(profile "%s": "%s" is no mail address; write name@domain in %s)", profile,
-               address.c_str(), VORN_PATH_CONFIG);
+      log_line(
+          R"(profile "%s": "%s" is no mail address; run vornctl profile set %s mail_to NAME@DOMAIN)",
+          profile, address.c_str(), profile);
     }
   }
   return found;
@@ -74,8 +75,8 @@ bool parse_server(const char* profile, const std::string& text, MailServer& serv
   if (host.empty()) {
     log_line(
         "profile \"%s\": smtp_url \"%s\" is not smtp://host:port or smtps://host:port; "
-        "correct it in %s (a user goes into smtp_user)",
-        profile, text.c_str(), VORN_PATH_CONFIG);
+        "run vornctl profile set %s smtp_url smtp://HOST:PORT (a user goes into smtp_user)",
+        profile, text.c_str(), profile);
     return false;
   }
   server.url = text;
@@ -150,9 +151,9 @@ std::optional<Posting> prepare(const char* profile, const VLIBCSzHash& hash,
   errno = EINVAL;
   if (!valid_address(posting.from)) {
     log_line(
-        "profile \"%s\": mail_from \"%s\" is no mail address; write mail_from = name@domain "
-        "in %s",
-        profile, posting.from.c_str(), VORN_PATH_CONFIG);
+        "profile \"%s\": mail_from \"%s\" is no mail address; run vornctl profile set %s "
+        "mail_from NAME@DOMAIN",
+        profile, posting.from.c_str(), profile);
     return std::nullopt;
   }
   const std::string url = value_of(hash, "smtp_url");
@@ -247,8 +248,8 @@ std::vector<std::string> send_failure(const char* profile, const VLIBCSzHash& ha
 std::vector<std::string> send_test_mail(const char* profile, const VLIBCSzHash& hash,
                                         const MailLimits& limits) {
   if (!wants_mail(hash)) {
-    log_line("profile \"%s\" has no recipients; write mail_to = name@domain in %s", profile,
-             VORN_PATH_CONFIG);
+    log_line("profile \"%s\" has no recipients; run vornctl profile set %s mail_to NAME@DOMAIN",
+             profile, profile);
     errno = EINVAL;
     return {};
   }

@@ -11,7 +11,6 @@
 
 #include "base/host_log.hpp"
 #include "mail/mail_message.hpp"
-#include "vorn/paths.h"
 
 namespace host {
 namespace {
@@ -174,8 +173,8 @@ std::vector<std::string> deliver(const char* profile, const MailServer& server,
     if (result == Delivery::Result::unreachable) {
       log_line(
           "profile \"%s\": mail server %s can't be used (%s), %zu recipients not served; "
-          "check smtp_url in %s",
-          profile, server.url.c_str(), delivery->reason(), to.size() - i, VORN_PATH_CONFIG);
+          "see to it, or run vornctl profile set %s smtp_url smtp://HOST:PORT",
+          profile, server.url.c_str(), delivery->reason(), to.size() - i, profile);
       break;
     }
     log_line("profile \"%s\": mail server %s refused the mail to %s: %s", profile,

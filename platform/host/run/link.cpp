@@ -48,8 +48,10 @@ std::string base_of(const VLIBCSzHash& hash, const std::string& report_dir) {
                          ? "file://" + percent_encoded(report_dir)
                          : configured;
   if (const char* problem = host::link_base_error(base); problem != nullptr) {
-    host::log_line("link_base \"%.1100s\" %s; write link_base = https://server/reports in %s",
-                   base.c_str(), problem, VORN_PATH_CONFIG);
+    host::log_line(
+        "link_base \"%.1100s\" %s; run vornctl profile set PROFILE link_base "
+        "https://SERVER/REPORTS",
+        base.c_str(), problem);
     return {};
   }
   while (base.back() == '/') {
@@ -120,8 +122,10 @@ int make_link(const VLIBCSzHash& hash, const char* target_file, char* link, size
   }
   const std::string text = base + "/" + percent_encoded(*rest);
   if (text.size() >= size) {
-    host::log_line("the link to \"%s\" is longer than %zu bytes; write a shorter link_base in %s",
-                   target_file, size - 1, VORN_PATH_CONFIG);
+    host::log_line(
+        "the link to \"%s\" is longer than %zu bytes; give the profile a shorter link_base with "
+        "vornctl profile set",
+        target_file, size - 1);
     errno = ENAMETOOLONG;
     return -1;
   }

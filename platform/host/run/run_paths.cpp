@@ -259,8 +259,9 @@ std::optional<std::string> report_dir(const char* profile, const VLIBCSzHash& ha
   const char* value = hash.find("report_dir");
   std::string dir = value == nullptr || *value == '\0' ? VORN_PATH_REPORTS : value;
   if (const char* problem = report_dir_error(dir); problem != nullptr) {
-    log_line(R"(profile "%s": report_dir "%.1100s" %s; write report_dir = /... in %s)", profile,
-             dir.c_str(), problem, VORN_PATH_CONFIG);
+    log_line(
+        R"(profile "%s": report_dir "%.1100s" %s; run vornctl profile set %s report_dir FOLDER)",
+        profile, dir.c_str(), problem, profile);
     errno = EINVAL;
     return std::nullopt;
   }
