@@ -134,7 +134,7 @@ class Machine:
         if not inside:
             folder.mkdir(parents=True, exist_ok=True)
         with self.shares.open('ab') as file:
-            file.write(f'[{name}]\npath = {folder}\n'.encode())
+            file.write(os.fsencode(f'[{name}]\npath = {folder}\n'))
         return folder
 
     def history(self, sql, *values):

@@ -2,6 +2,7 @@
 import json
 import os
 import re
+import shlex
 import signal
 import subprocess
 import time
@@ -54,8 +55,13 @@ class Told(TellingTest):
             with self.subTest(name):
                 self.m = self.new_machine()
                 server = self.mailed(**keys)
+                self.m.shell(f'{CTL} schedule weekly --report @daily')
+                line = (self.m.cron / 'vornreport-weekly').read_text().split('@daily root ')[1]
                 breaks()
-                run = self.m.run('--report', 'weekly')
+                # As cron does; it mails what isn't empty.
+                run = self.m.shell(f'exec env -i HOME=/root LOGNAME=root SHELL=/bin/sh PATH=/usr/bin:/bin'
+                                   f' /bin/sh -c {shlex.quote(line)}')
+                self.assertEqual(run.out, '')
                 self.assertRegex(run.err, f'vornreport: .*{said}(.*\n)+vornreport: the run of profile '
                                           'weekly failed; vornctl doctor')
                 mails = server.mails()
@@ -177,7 +183,20 @@ class Metrics(TellingTest):
         self.assertGreater(failed['last_run_timestamp_seconds', ''],
                            last['last_run_timestamp_seconds', ''])
 
-    def test_forecast_levels_and_users(self):
+    def test_paths_that_could_end_a_label(self):
+        """Names of shares and users that could are refused before."""
+        volumes = ['/tmp/say "hi"', '/tmp/a\\nb\\', '/tmp/\udcff', '/tmp/\udcfe', '/tmp/\\xff']
+        for i, volume in enumerate(volumes):
+            self.m.options += ['--tmpfs', 1 << 20, volume]
+            self.m.share(f'share{i}', volume, inside=True)
+        path = self.m.base / 'odd.prom'
+        self.m.profile('weekly', report_list='share_list', metrics_file=path)
+        self.m.run('--report', 'weekly')
+        found = [label for name, label in self.metrics(path) if name == 'volume_level']
+        self.assertLessEqual({r'volume="/tmp/say \"hi\""', r'volume="/tmp/a\\nb\\"',
+                              r'volume="/tmp/\\xfe"', r'volume="/tmp/\\xff"'}, set(found))
+
+    def test_forecast_levels_users_and_what_is_made_of_them(self):
         folder = self.m.reports / 'weekly/2026-01-02_03-04-05'
         folder.mkdir(parents=True)
         (folder / 'report.html').write_text('<!DOCTYPE html>\n</html>\n')
@@ -185,9 +204,12 @@ class Metrics(TellingTest):
             'format': 1, 'started': 1767323045, 'finished': 1767323050, 'volumes': [
                 {'path': '/a', 'level': 'critical', 'forecast': {
                     'state': 'growing', 'days': 12, 'days_low': 9, 'days_high': 20}},
-                {'path': '/b"\\', 'forecast': {'state': 'full'}},
+                {'path': '/b"\\', 'level': 'warning', 'forecast': {'state': 'full'}},
                 {'path': '/c', 'forecast': {'state': 'steady'}}],
-            'quotas': [{'volume': '/a', 'user': 'ann', 'used': 93, 'quota': 100, 'percent': 93.0}]}))
+            'incidents': [{'level': 'error', 'kind': 'share_missing', 'what': 'x', 'text': 'Gone.'}],
+            'shares': [{'name': 'x', 'grown': {'month': {'since': 1, 'files': 1, 'bytes': 1}}}],
+            'quotas': [{'volume': '/a', 'user': 'ann', 'used': 1, 'quota': 1, 'percent': 103.0}]}))
+        (self.m.vorn / 'var/status/weekly').write_text('success\nsucceeded = 1767323050\n')
         self.m.shares.unlink()  # so the next run fails, and the report stays the newest
         for users in ('', 'true'):
             path = self.m.base / f'w{users}.prom'
@@ -202,7 +224,36 @@ class Metrics(TellingTest):
                                  *(('/b\\"\\\\', bound, 0) for bound in ('low', 'mid', 'high')))})
             self.assertEqual(found['volume_level', 'volume="/a"'], 2)
             self.assertEqual(found.get(('quota_used_ratio', 'volume="/a",user="ann"')),
-                             .93 if users else None)
+                             1.03 if users else None)
+        self.check_documents(path.read_text())
+
+    def check_documents(self, metrics):
+        """Each alert fires on these metrics, and each panel of the dashboard shows some of them: at
+        the ninth day of a report that was made at its begin."""
+        docs = self.m.stage / 'usr/share/doc/vornreport/prometheus'
+        alerts = re.findall(r'- alert: (\w+)', (docs / 'alerts.yml').read_text())
+        asked = re.findall(r'"(?:expr|definition)": (".*")', (docs / 'dashboard.json').read_text())
+        queries = [re.sub(r'^label_values\((.*), (\w+)\)$', r'count by (\2) (\1)', re.sub(
+            r'\$\w+', '.*', json.loads(query))) for query in asked]
+        series = [{'series': f'{name}{{{labels},instance="server"}}',
+                   'values': ('0' if 'timestamp' in name else value) + '+0x9'} for name, labels, value
+                  in re.findall(r'^(vornreport_\w+)\{(.*)\} (\S+)$', metrics, re.MULTILINE)]
+        expected = [(f'count(ALERTS{{alertname="{alert}"}}) > bool 0', '{}') for alert in alerts]
+        expected += [(f'count({query}) > bool 0', '{}') for query in queries]
+        rules = self.m.base / 'test.yml'
+        rules.write_text(json.dumps({
+            'rule_files': [str(docs / 'alerts.yml')], 'evaluation_interval': '1d', 'tests': [
+                {'interval': '1d', 'input_series': series, 'promql_expr_test': [
+                    {'expr': query, 'eval_time': '9d', 'exp_samples': [{'labels': labels, 'value': 1}]}
+                    for query, labels in expected]}]}))
+        self.assertGreater(len(alerts) + len(queries), 15)
+        manual = (self.m.stage / 'usr/share/man/man8/vornreport.8').read_text()
+        self.assertLessEqual(set(re.findall(r'# TYPE (\w+)', metrics)),
+                             set(re.findall(r'vornreport_\w+', manual)))
+        for words in (['check', 'rules', docs / 'alerts.yml'], ['test', 'rules', rules]):
+            done = subprocess.run(['promtool', *words], stdout=subprocess.PIPE,
+                                  stderr=subprocess.STDOUT, text=True)
+            self.assertEqual(done.returncode, 0, done.stdout)
 
     @needs_root
     def test_folders_of_others(self):
@@ -228,14 +279,3 @@ class Metrics(TellingTest):
                 self.assertEqual(path.is_file() and not path.is_symlink(), not wrong)
                 self.assertEqual(list(outside.iterdir()), [])
 
-
-class Documents(ProductTest):
-    def test_rules_and_dashboard_name_what_there_is(self):
-        docs = self.m.stage / 'usr/share/doc/vornreport/prometheus'
-        subprocess.run(['promtool', 'check', 'rules', docs / 'alerts.yml'], check=True,
-                       stdout=subprocess.DEVNULL)
-        manual = (self.m.stage / 'usr/share/man/man8/vornreport.8').read_text()
-        for name in ('alerts.yml', 'dashboard.json'):
-            for metric in re.findall(r'vornreport_\w+', (docs / name).read_text()):
-                self.assertIn(metric, manual, name)
-        self.assertTrue(json.loads((docs / 'dashboard.json').read_text())['panels'])

@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <set>
 #include <utility>
 #include <vector>
 
@@ -13,7 +14,6 @@
 #include "base/trusted_folder.hpp"
 #include "report_format/values.hpp"
 #include "vorn/base/file_io.hpp"
-#include "vorn/paths.h"
 
 namespace host {
 namespace {
@@ -21,6 +21,7 @@ namespace {
 using report_format::Facts;
 using Labels = std::vector<std::pair<const char*, std::string>>;
 
+// Facts are UTF-8, as the format wants it.
 std::string label_value(std::string_view text) {
   std::string value;
   for (const char c : text) {
@@ -37,7 +38,9 @@ std::string number(std::int64_t value) {
 }
 
 // The families of metrics, each with its samples behind its description. All are gauges and carry
-// the profile, so that files of several profiles don't contradict each other.
+// the profile, so that files of several profiles don't contradict each other. Two samples of one
+// name would cost the whole file, so of paths that facts write alike (a byte that is no UTF-8, and
+// four characters that look like it) only the first has one.
 class Families {
  public:
   explicit Families(std::string profile) : profile_(std::move(profile)) {}
@@ -45,20 +48,24 @@ class Families {
   void begin(const char* name, const char* help) {
     name_ = std::string("vornreport_") + name;
     pending_ = "# HELP " + name_ + " " + help + "\n# TYPE " + name_ + " gauge\n";
+    samples_.clear();
   }
   void add(const std::string& value, const Labels& labels = {}) {
-    text_ += std::exchange(pending_, {}) + name_ + "{profile=\"" + label_value(profile_) + '"';
+    std::string sample = name_ + "{profile=\"" + label_value(profile_) + '"';
     for (const auto& [label, of] : labels) {
-      text_ += std::string(",") + label + "=\"" + label_value(of) + '"';
+      sample += std::string(",") + label + "=\"" + label_value(of) + '"';
     }
-    text_ += "} " + value + "\n";
+    if (samples_.insert(sample).second) {
+      text_ += std::exchange(pending_, {}) + sample + "} " + value + "\n";
+    }
   }
   std::string take() { return std::move(text_); }
 
  private:
   std::string profile_;
   std::string name_;
-  std::string pending_;  // of a family without samples nothing is said
+  std::string pending_;            // of a family without samples nothing is said
+  std::set<std::string> samples_;  // of this family, up to their labels
   std::string text_;
 };
 
@@ -200,8 +207,10 @@ void write_metrics(const std::string& profile, const VLIBCSzHash& settings,
     return;
   }
   if (const char* error = metrics_file_error(value); error != nullptr) {
-    log_line(R"(profile "%s": metrics_file "%.1100s" %s; correct it in %s)", profile.c_str(), value,
-             error, VORN_PATH_CONFIG);
+    log_line(
+        "profile \"%s\": metrics_file \"%.1100s\" %s; run vornctl profile set %s metrics_file "
+        "/FOLDER/NAME.prom",
+        profile.c_str(), value, error, profile.c_str());
     return;
   }
   const char* users = settings.find("metrics_users");
