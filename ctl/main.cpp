@@ -1,4 +1,6 @@
 // vornctl: administration of the reports on a host.
+#include <unistd.h>
+
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <clocale>
@@ -21,8 +23,7 @@ namespace {
 
 constexpr const char* kFooter =
     "Exit status: 0 fine, 1 failed, 2 wrong usage, 3 a report that lacks something. Every command "
-    "is "
-    "described in vornctl(8).";
+    "is described in vornctl(8).";
 
 using Words = std::vector<std::string>;
 
@@ -56,12 +57,32 @@ void check_commands(const CLI::App& app, const Words& words) {
   }
 }
 
+// That of each command, one after another; `name` is that of the group as it is typed.
+void print_all_help(const CLI::App& group, const std::string& name) {
+  for (const CLI::App* command : group.get_subcommands({})) {
+    if (!command->get_subcommands({}).empty()) {
+      print_all_help(*command, name + " " + command->get_name());
+      continue;
+    }
+    const std::string text = command->help(name);
+    std::fputs(text.substr(0, text.rfind(kFooter)).c_str(), stdout);
+  }
+}
+
+// Settings, runs and reports are root's, and what another user could see of them would mislead.
+void check_user() {
+  if (geteuid() != 0) {
+    throw ctl::Failure("shares, profiles and their reports are root's to see; run this as root");
+  }
+}
+
 void run(int argc, char** argv) {
   CLI::App app("Administration of vornreport: shares, profiles, runs and reports.", "vornctl");
   app.footer(kFooter);
-  app.set_version_flag("--version", "vornctl " VORN_VERSION);
-  app.set_help_all_flag("--help-all", "Print the help of all commands and exit");
+  app.set_help_flag("-h,--help", "Print this help and exit");
+  app.set_version_flag("--version", "vornctl " VORN_VERSION, "Print the version and exit");
   app.require_subcommand(1);
+  app.parse_complete_callback(check_user);  // before that of any command
   ctl::add_share_commands(app);
   ctl::add_profile_commands(app);
   ctl::add_run_command(app);
@@ -71,6 +92,7 @@ void run(int argc, char** argv) {
   ctl::add_log_command(app);
   ctl::add_fleet_commands(app);
   ctl::add_doctor_command(app);
+  app.set_help_all_flag("--help-all", "Print the help of all commands and exit");
 
   // Hidden, and asked for before anything is parsed: what it is asked about is no command yet.
   if (argc > 1 && std::string_view(argv[1]) == "complete") {
@@ -82,6 +104,8 @@ void run(int argc, char** argv) {
   std::reverse(words.begin(), words.end());
   try {
     app.parse(std::move(words));
+  } catch (const CLI::CallForAllHelp&) {
+    print_all_help(app, app.get_name());
   } catch (const CLI::ParseError& error) {
     if (error.get_exit_code() == 0) {
       app.exit(error);  // the help or version that was asked for

@@ -35,7 +35,7 @@ std::string folder_problem(const Share& share) {
   const std::unique_ptr<DIR, decltype(close)> dir(opendir(path.c_str()));
   if (!dir || (errno = 0, readdir(dir.get()) == nullptr && errno != 0)) {
     return path + " can't be read (" + std::strerror(errno) + "); " +
-           (errno == EACCES || errno == EPERM ? "run this as root" : "see to its file system");
+           "see to its file system, which must let root read it";
   }
   return {};
 }
