@@ -44,7 +44,7 @@ std::string script_complaint(const std::vector<std::string>& arguments) try {
   return failure.what();
 }
 
-// Begins a page, as a run does.
+// Begins a page and makes a list of reports, as a run does.
 void check_template(Findings& findings) {
   char folder[] = "/tmp/vornctl.XXXXXX";
   if (mkdtemp(folder) == nullptr) {
@@ -57,6 +57,9 @@ void check_template(Findings& findings) {
   std::string complaint = script_complaint({VORN_PATH_TEMPLATE_SCRIPT, "header", page});
   if (complaint.empty()) {
     complaint = script_complaint({VORN_PATH_TEMPLATE_SCRIPT, "lang", page, "en"});
+  }
+  if (complaint.empty()) {
+    complaint = script_complaint({VORN_PATH_TEMPLATE_SCRIPT, "index"});
   }
   host::remove_tree(folder);
   if (complaint.empty()) {
