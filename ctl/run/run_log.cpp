@@ -116,8 +116,9 @@ RunLines lines_of_run(const admin::RunTrace& trace) {
     return lines_between(trace.started,
                          trace.ended ? *trace.ended + kLastWords : std::time(nullptr));
   }
+  // Of a timer's run the journal has standard error as well, which says the same again.
   const auto read = ask_program({kJournalctl, "--quiet", "--no-pager", "--output=short-iso",
-                                 "--since=@" + std::to_string(trace.started),
+                                 "--since=@" + std::to_string(trace.started), "_TRANSPORT=syslog",
                                  "_PID=" + std::to_string(trace.process)});
   return {read && read->status == 0, lines_of(read ? read->out : "")};
 }
