@@ -207,9 +207,13 @@ void describe_set(CLI::App& group) {
   set->add_option("--path", share->path, "New folder")->type_name("FOLDER");
   set->add_option("--file-index", share->file_index, kIndexHelp)->type_name("FILE");
   const auto network = std::make_shared<bool>();
-  const CLI::Option* flag = set->add_flag("--network,!--no-network", *network, kNetworkHelp);
-  set->callback([set, share, network, flag] {
-    share->network = flag->count() > 0 ? std::optional(*network) : std::nullopt;
+  const auto no_network = std::make_shared<bool>();
+  set->add_flag("--network", *network, kNetworkHelp);
+  set->add_flag("--no-network", *no_network, "Leave it out when it is")->excludes("--network");
+  set->callback([set, share, network, no_network] {
+    if (*network || *no_network) {
+      share->network = *network;
+    }
     set_share(*share, pairs_of(*set));
   });
 }
@@ -395,7 +399,7 @@ void import_samba(const Import& import) {
 void describe_import(CLI::App& group) {
   CLI::App& command = *group.add_subcommand("import-samba", "Add the shares that Samba offers");
   const auto import = std::make_shared<Import>();
-  command.add_flag("--dry-run", import->dry_run, "Only print what would be done");
+  command.add_flag("--dry-run", import->dry_run, "Only print what would be added");
   command.add_flag("--usershares", import->with_user_shares,
                    "Also the shares that users have made");
   add_json_flag(command, import->json);

@@ -36,16 +36,18 @@ constexpr std::string_view kRemark = "vornfleet: ";
 struct Setting {
   const char* key;
   const char* option;
+  const char* type;
   const char* help;
 };
 constexpr Setting kSettings[] = {
-    {"url", "--url", "The engine's nodes, comma-separated: http://host:8123/"},
-    {"database", "--database", "Database in the engine (default: vornreport)"},
-    {"cluster", "--cluster", "Cluster of the engine's remote_servers"},
-    {"user", "--user", "User of the engine"},
-    {"password_file", "--password-file", "File with the user's password in its first line"},
-    {"insecure", "--insecure", "true: a password may go over plain http to another machine"},
-    {"server", "--server", "This server's name in the fleet (default: its host name)"},
+    {"url", "--url", "URLS", "The engine's nodes, comma-separated: http://host:8123/"},
+    {"database", "--database", "NAME", "Database in the engine (default: vornreport)"},
+    {"cluster", "--cluster", "NAME", "Cluster of the engine's remote_servers"},
+    {"user", "--user", "NAME", "User of the engine"},
+    {"password_file", "--password-file", "FILE", "File with the user's password in its first line"},
+    {"insecure", "--insecure", "true|false",
+     "true: a password may go over plain http to another machine"},
+    {"server", "--server", "NAME", "This server's name in the fleet (default: its host name)"},
 };
 
 void set(const CLI::App& command) {
@@ -106,7 +108,8 @@ void status(bool json) {
                std::to_string(run.files), size_text(run.bytes), run.overdue ? "overdue" : "ok"});
   }
   if (table.empty()) {
-    print_line("no server has sent a run; set fleet = true in a profile and run it");
+    print_line(
+        "no server has sent a run; run vornctl profile set PROFILE fleet true, then the profile");
     return;
   }
   table.print();
@@ -185,7 +188,7 @@ void add_fleet_commands(CLI::App& app) {
 
   CLI::App* set_command = group.add_subcommand("set", "Say where the fleet's engine is");
   for (const Setting& setting : kSettings) {
-    set_command->add_option(setting.option, setting.help)->expected(1);
+    set_command->add_option(setting.option, setting.help)->type_name(setting.type)->expected(1);
   }
   set_command->callback([set_command] { set(*set_command); });
 
@@ -197,26 +200,31 @@ void add_fleet_commands(CLI::App& app) {
       });
 
   const auto json = std::make_shared<bool>();
-  CLI::App* status_command = group.add_subcommand("status", "List servers and their newest runs");
+  CLI::App* status_command =
+      group.add_subcommand("status", "Print every server with its newest run");
   add_json_flag(*status_command, *json);
   status_command->callback([json] { status(*json); });
 
   const auto options = std::make_shared<ReportOptions>();
   CLI::App* report_command = group.add_subcommand("report", "Make a report over the fleet");
   report_command->add_option("FOLDER", options->folder, "Folder that the report goes into")
+      ->type_name("")
       ->required();
   report_command
       ->add_option("--reports", options->reports, "Comma-separated reports (default: all)")
       ->type_name("REPORTS");
   report_command->add_option("--language", options->language, "Language of the page")
       ->type_name("LANGUAGE");
-  report_command->add_option("--servers", options->servers,
-                             "Comma-separated servers (default: all)");
+  report_command
+      ->add_option("--servers", options->servers, "Comma-separated servers (default: all)")
+      ->type_name("SERVERS");
   report_command->callback([options] { report(*options); });
 
   const auto server = std::make_shared<std::string>();
   CLI::App* forget_command = group.add_subcommand("forget", "Remove a server's rows");
-  forget_command->add_option("SERVER", *server, "Name of the server in the fleet")->required();
+  forget_command->add_option("SERVER", *server, "Name of the server in the fleet")
+      ->type_name("")
+      ->required();
   forget_command->callback([server] {
     if (!admin::forget_server(*server)) {
       throw host_failure("the rows of " + *server + " can't be removed");

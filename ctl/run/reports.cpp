@@ -223,7 +223,7 @@ void add_reports_command(CLI::App& app) {
   CLI::App& keeping = add_action(group, "keep", "Remove all but the newest", keep, options);
   keeping.add_option("N", options->count, "How many stay")->type_name("")->required();
   for (CLI::App* command : {&remove, &keeping}) {
-    command->add_flag("--dry-run", options->dry_run, "Only say what would be removed");
+    command->add_flag("--dry-run", options->dry_run, "Only print what would be removed");
   }
 }
 

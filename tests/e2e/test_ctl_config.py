@@ -424,7 +424,7 @@ class Completion(ControlTest):
                 ('profile add x --reports large_file,q', 'large_file,quota_usage'),
                 ('profile add x --shares music,', 'music,photos|music,my docs'),
                 ('reports ', 'weekly'), ('reports weekly ', 'list|open|compare|remove|keep'),
-                ('reports weekly remove --', '--help|--help-all|--older-than|--dry-run'),
+                ('reports weekly remove --', '--help|--older-than|--dry-run'),
                 ('reports weekly remove 2026-0', '2026-01-02_03-04-05|2026-02-03_03-04-05'),
                 ('help reports ', 'list|open|compare|remove|keep'),
                 ('profile add x --rep', '--report-list|--report-dir'), ('profile show weekly ', '')):
