@@ -546,16 +546,19 @@ class EveryCommand(WeeklyTest):
             return [usage for command in commands for usage in usages(*words, command)] or [text]
         found = usages()
         self.assertGreater(len(found), 25)
+        as_nobody = 'setpriv', '--reuid=65534', '--regid=65534', '--clear-groups', CTL
         for usage in found:
             line, = re.findall('Usage: vornctl (.*)', usage)
             needed = re.findall(r'^  (--[a-z-]+) .*REQUIRED', usage, re.M)
             words = [re.sub('[A-Z]+', '1', word) for word in re.sub(r'\[.*?\]', '', line).split()]
             words += [word for option in needed for word in (option, '1')]
             with self.subTest(words):
-                run = Run(self.m, ['setpriv', '--reuid=65534', '--regid=65534', '--clear-groups',
-                                   CTL, *words], None).finish()
+                run = Run(self.m, [*as_nobody, *words], None).finish()
                 self.assertEqual((run.status, run.out), (1, ''), run.err)
                 self.assertRegex(run.err, '^vornctl: .*; run this as root\n$')
+        os.chown(self.m.vorn / 'etc', 65534, -1)  # staged by this user, to try it
+        run = Run(self.m, [*as_nobody, 'profile', 'list'], None).finish()
+        self.assertEqual((run.status, run.err), (0, ''))
 
 
 class Doctor(WeeklyTest):
