@@ -54,7 +54,7 @@ void set(const CLI::App& command) {
   Changes changes;
   for (const Setting& setting : kSettings) {
     if (const CLI::Option* option = command.get_option(setting.option); option->count() > 0) {
-      const std::string value = option->as<std::string>();
+      const auto value = option->as<std::string>();
       changes.emplace_back(setting.key, value.empty() ? std::nullopt : std::optional(value));
     }
   }

@@ -195,8 +195,9 @@ bool has_collected(const Section& profile, std::time_t start) {
   return has_succeeded(profile);
 }
 
-[[noreturn]] void fail_with_log(const std::string& what, const RunLog& log, const Child& child,
-                                const RunOutput& output) {
+// `what` is of the run of `profile`.
+[[noreturn]] void fail_with_log(const std::string& profile, const std::string& what,
+                                const RunLog& log, const Child& child, const RunOutput& output) {
   std::vector<std::string> said = log.messages(child.pid());
   if (said.empty()) {
     said.assign(output.complaints().begin(), output.complaints().end());
@@ -204,7 +205,7 @@ bool has_collected(const Section& profile, std::time_t start) {
   for (const std::string& line : said) {
     warn(line);
   }
-  throw Failure(what + "; see " + log.command() + ", and vornctl doctor");
+  throw Failure(what + "; see vornctl log " + profile + ", and vornctl doctor");
 }
 
 // Prints the page of the report, and what it lacks to standard error.
@@ -254,19 +255,21 @@ void run_profile(const Options& options, const Section& profile, Json& told) {
       throw Failure("the run of profile " + profile.name +
                     " was ended; what it had begun is removed");
     }
-    fail_with_log("the run of profile " + profile.name + " was ended from outside", log, child,
-                  output);
+    fail_with_log(profile.name, "the run of profile " + profile.name + " was ended from outside",
+                  log, child, output);
   }
   if (options.data) {
     if (!has_collected(profile, start)) {
-      fail_with_log("collecting data for profile " + profile.name + " failed", log, child, output);
+      fail_with_log(profile.name, "collecting data for profile " + profile.name + " failed", log,
+                    child, output);
     }
     return;
   }
   const admin::LastRun last = admin::last_run(profile.name);
   if (last.state != admin::RunState::succeeded || last.status.report.empty() ||
       last.status.report == before) {
-    fail_with_log("the run of profile " + profile.name + " failed", log, child, output);
+    fail_with_log(profile.name, "the run of profile " + profile.name + " failed", log, child,
+                  output);
   }
   show_report(options, profile, last.status, told);
 }

@@ -151,12 +151,4 @@ std::vector<std::string> RunLog::messages(pid_t pid) const {
   return found;
 }
 
-const char* RunLog::command() const {
-  if (is_journal_) {
-    return "journalctl -t vornreport";
-  }
-  return file_ == kLogFiles[1] ? "grep vornreport /var/log/messages"
-                               : "grep vornreport /var/log/syslog";
-}
-
 }  // namespace ctl

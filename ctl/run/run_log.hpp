@@ -27,8 +27,6 @@ class RunLog {
   // The last messages of process `pid` since then; a log daemon gets a moment to write them. Empty
   // when there are none or the log can't be read.
   std::vector<std::string> messages(pid_t pid) const;
-  // The command that shows all of them.
-  const char* command() const;
 
  private:
   bool is_journal_ = false;

@@ -60,7 +60,7 @@ class Running(WeeklyTest):
         self.m.shares.unlink()
         (self.m.vorn / 'vornreport/sql/vornreport.sql').unlink()
         (self.m.vorn / 'etc/vornreport.db').unlink()
-        where = 'see grep vornreport /var/log/syslog, and vornctl doctor'
+        where = 'see vornctl log weekly, and vornctl doctor'
         self.check(['run', 'weekly'], 1, rf'(.*\n)+vornctl: the run of .* failed; {where}')
         self.check(['run', 'global', '--data'], 1, r'(.*\n)+vornctl: collecting data .* failed')
 
