@@ -258,19 +258,28 @@ class Walk {
   }
 
   int open_failed() {
+    const int error = errno;
     // Not this folder's fault: what is missing now is missing for want of handles or memory.
-    if (errno == EMFILE || errno == ENFILE || errno == ENOMEM) {
+    if (error == EMFILE || error == ENFILE || error == ENOMEM) {
       mark_report_data_lost();
     }
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Failed to opendir [%s].", path_.c_str());
-    count_unreadable();
+    count_failed(error);
     return -1;
   }
 
   int stat_failed() {
+    const int error = errno;
     REPORT_LOG_ERR_NESTED(kGatheringModule, __LINE__, "Failed to stat [%s].", path_.c_str());
-    count_unreadable();
+    count_failed(error);
     return -1;
+  }
+
+  // What was removed before its turn came is no longer part of the share, which lacks nothing.
+  void count_failed(int error) {
+    if (error != ENOENT) {
+      count_unreadable();
+    }
   }
 
   void count_unreadable() {

@@ -1,5 +1,6 @@
 // Walks with threads: what they find, in which order, and how many there are.
 #include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -14,6 +15,7 @@
 #include <latch>
 #include <random>
 
+#include "facts/tallies.hpp"
 #include "file_gathering/share_walk.hpp"
 #include "report_fixture.hpp"
 #include "thread_count.hpp"
@@ -24,12 +26,20 @@ std::latch* g_answer = nullptr;  // what looks at files named "hangs" wait for
 
 }  // namespace
 
-// In place of the system's: there is no file system here that could be made to hang.
+// In place of the system's: there is no file system here that could be made to hang, and nobody who
+// removes things just when they have been found or looked at.
 extern "C" int fstatat(int folder, const char* name, struct stat* status, int flags) noexcept {
   if (g_answer != nullptr && std::strcmp(name, "hangs") == 0) {
     g_answer->wait();
   }
-  return static_cast<int>(syscall(SYS_newfstatat, folder, name, status, flags));
+  if (std::strcmp(name, "goes") == 0) {
+    unlinkat(folder, name, 0);
+  }
+  const long result = syscall(SYS_newfstatat, folder, name, status, flags);
+  if (std::strcmp(name, "goes then") == 0) {
+    unlinkat(folder, name, AT_REMOVEDIR);
+  }
+  return static_cast<int>(result);
 }
 
 namespace vornreport {
@@ -119,6 +129,22 @@ TEST_F(LookAheadTest, TellsWhatItCannotReadInItsPlace) {
     EXPECT_NE(one.find(line), std::string::npos) << line;
   }
   EXPECT_EQ(std::count(one.begin(), one.begin() + static_cast<long>(one.find('(')), '\n'), 60);
+}
+
+// Temporary files come and go on a server at work, whose shares are whole all the same.
+TEST_F(LookAheadTest, AShareDoesNotLackWhatWasRemoved) {
+  const std::string top = folder_.path("top");
+  write_file(top + "/stays", "");
+  write_file(top + "/goes", "");
+  std::filesystem::create_directories(top + "/goes then");
+  tallies().begin_share("share", top.c_str(), 0);
+  const std::string found = walked(top, 2);
+  const ShareTally& share = *tallies().share();
+  EXPECT_TRUE(share.is_whole() && share.total().files == 1) << found;
+  for (const char* line : {"Failed to stat [", "Failed to opendir ["}) {
+    EXPECT_NE(found.find(line), std::string::npos) << line;
+  }
+  tallies().clear();
 }
 
 TEST_F(LookAheadTest, GoesOnWithoutAThreadThatHangs) {
