@@ -18,8 +18,8 @@ CREATE INDEX IF NOT EXISTS VolumeUsageHistory ON VolumeUsage (profile, sampleDat
 CREATE INDEX IF NOT EXISTS VolumeUsageDates ON VolumeUsage (sampleDate);
 
 -- What finished reports counted, for growth: one row per profile and report. `time` is when the run
--- began, in seconds since the epoch; `valid` is 0 until the report is finished; `folders` is how
--- many `details` holds. Both texts are lines of fields with tabs between them.
+-- began, in seconds since the epoch, negative until the report is finished, when `valid` becomes 1;
+-- `folders` is how many `details` holds. Both texts are lines of fields with tabs between them.
 CREATE TABLE IF NOT EXISTS Snapshot (
   profile TEXT NOT NULL,
   time INTEGER NOT NULL,

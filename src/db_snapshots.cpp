@@ -16,6 +16,9 @@ constexpr int64_t kMostDays = 730;
 
 // As in the schema, for databases that are older than this table. The long text comes last, so that
 // who doesn't ask for it needn't read through it. `folders` is the number of them in `details`.
+//
+// A pending set stands at its time below zero: two runs can begin in one second, and the second one
+// must not cost the first one's set unless it finishes as well.
 constexpr char kTable[] =
     "CREATE TABLE IF NOT EXISTS Snapshot (\n"
     "  profile TEXT NOT NULL,\n"
@@ -28,11 +31,13 @@ constexpr char kTable[] =
     ")";
 
 void tell_lost(const char* what) {
-  record_incident("history_lost", "snapshot",
-                  std::string("the snapshot of ") + what +
-                      " can't be used, so growth isn't told; the log says why",
+  record_incident("history_lost", "snapshot", std::string(what) + "; the log says why",
                   AlreadyLogged::kYes);
 }
+constexpr char kNotStored[] =
+    "the snapshot of this run can't be stored, so later runs can't tell what has grown since it";
+constexpr char kNoneRead[] =
+    "the snapshots of earlier runs can't be read, so growth since them isn't told";
 
 // The history with its table, for the sets of one profile.
 class Snapshots {
@@ -125,7 +130,7 @@ void cut(Snapshots& history, int64_t time, const SnapshotText& text) {
 void thin_out(Snapshots& history, int64_t now) {
   const std::string old =
       history.own() + kValid + " AND time < " + std::to_string(now - kAllDays * kDay);
-  history.run("DELETE FROM Snapshot WHERE time < " + std::to_string(now - kMostDays * kDay));
+  history.run("DELETE FROM Snapshot WHERE abs(time) < " + std::to_string(now - kMostDays * kDay));
   history.run("DELETE FROM Snapshot" + old + " AND time NOT IN (SELECT min(time) FROM Snapshot" +
               old + " GROUP BY time / " + std::to_string(7 * kDay) + ")");
   std::vector<int64_t> large;
@@ -153,19 +158,23 @@ bool SnapshotStorePending(const std::string& profile, Snapshot set) {
       history.run(
           "INSERT OR REPLACE INTO Snapshot (profile, time, valid, folders, summary, "
           "details) VALUES (" +
-          history.profile() + ", " + std::to_string(set.time) + ", 0, " +
+          history.profile() + ", " + std::to_string(-set.time) + ", 0, " +
           std::to_string(set.folder_count()) + ", " + history.quoted(text.summary) + ", " +
           history.quoted(text.details) + ")");
   if (!is_stored) {
-    tell_lost("this run");
+    tell_lost(kNotStored);
   }
   return is_stored;
 }
 
 bool SnapshotMarkValid(const std::string& profile, int64_t time, int64_t now) {
   Snapshots history(profile);
+  const std::string pending = history.own() + kPending + at(-time);
+  bool is_there = false;
   if (!history.is_ready() ||
-      !history.run("UPDATE Snapshot SET valid = 1" + history.own() + at(time))) {
+      !history.each("SELECT time FROM Snapshot" + pending, [&](auto&&) { is_there = true; }) ||
+      !is_there ||
+      !history.run("UPDATE OR REPLACE Snapshot SET time = -time, valid = 1" + pending)) {
     return false;
   }
   thin_out(history, now);
@@ -174,7 +183,9 @@ bool SnapshotMarkValid(const std::string& profile, int64_t time, int64_t now) {
 
 void SnapshotDrop(const std::string& profile, int64_t time) {
   if (Snapshots history(profile); history.is_ready()) {
-    history.run("DELETE FROM Snapshot" + history.own() + at(time));
+    history.run("DELETE FROM Snapshot" + history.own() +
+                " AND time = (SELECT min(time) FROM Snapshot" + history.own() +
+                " AND (valid = 0 OR time = " + std::to_string(time) + "))");
   }
 }
 
@@ -184,7 +195,7 @@ std::optional<std::vector<int64_t>> SnapshotTimes(const std::string& profile) {
   if (!history.is_ready() ||
       !history.each("SELECT time FROM Snapshot" + history.own() + kValid + " ORDER BY time",
                     [&](const auto& column) { times.push_back(to_time(column("time"))); })) {
-    tell_lost("earlier runs");
+    tell_lost(kNoneRead);
     return std::nullopt;
   }
   return times;
@@ -198,12 +209,12 @@ std::optional<Snapshot> SnapshotRead(const std::string& profile, int64_t time) {
                     [&](const auto& column) {
                       text.emplace(SnapshotText{column("summary"), column("details")});
                     })) {
-    tell_lost("earlier runs");
+    tell_lost(kNoneRead);
     return std::nullopt;
   }
   std::optional<Snapshot> set = text ? checked(snapshot_of(time, *text), time) : std::nullopt;
   if (text && !set) {
-    tell_lost("earlier runs");
+    tell_lost(kNoneRead);
   }
   return set;
 }
@@ -223,7 +234,7 @@ std::optional<SnapshotSamples> SnapshotSamplesOf(const std::string& profile, int
                         " AND time >= " + std::to_string(since) +
                         " AND time <= " + std::to_string(until) + " ORDER BY time",
                     add)) {
-    tell_lost("earlier runs");
+    tell_lost(kNoneRead);
     return std::nullopt;
   }
   return samples;

@@ -20,16 +20,16 @@ inline constexpr size_t kMostFolders = 2000;
 inline constexpr size_t kMostOldFolders = 500;
 
 // Stores a set, its folders cut to kMostFolders, in the place of what the profile's earlier runs
-// have left unfinished; one of the same second is replaced. False when it isn't stored.
+// have left unfinished. False when it isn't stored.
 bool SnapshotStorePending(const std::string& profile, Snapshot set);
 
-// Makes the profile's set of `time` count, and thins out: all sets of the last 40 days stay, of
-// older ones the first of each week, with their largest folders; of all profiles those older than
-// two years go. Times after `now`, of a clock that was ahead, stay until they are past. False when
-// the set doesn't count.
+// Makes the profile's set of `time` count, in the place of one of the same second, and thins out:
+// all sets of the last 40 days stay, of older ones the first of each week, with their largest
+// folders; of all profiles those older than two years go. Times after `now`, of a clock that was
+// ahead, stay until they are past. False when the set doesn't count, as when it isn't there.
 bool SnapshotMarkValid(const std::string& profile, int64_t time, int64_t now);
 
-// Removes the profile's set of `time`, whether it counts or not.
+// Removes the set that the profile's run of `time` has stored, whether it counts or not.
 void SnapshotDrop(const std::string& profile, int64_t time);
 
 // The times of the sets that count, oldest first. Nothing when they can't be read.

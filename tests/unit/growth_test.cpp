@@ -231,7 +231,10 @@ TEST_F(GrowthTest, OnlyFinishedRunsCount) {
   EXPECT_FALSE(SnapshotRead("p", kNow - 10));
   ASSERT_TRUE(store(kNow));
   EXPECT_TRUE(SnapshotMarkValid("p", kNow, kNow));
-  EXPECT_TRUE(SnapshotMarkValid("p", kNow - 10, kNow));  // gone by now
+  EXPECT_FALSE(SnapshotMarkValid("p", kNow - 10, kNow));  // gone by now
+  EXPECT_EQ(SnapshotTimes("p"), (std::vector<int64_t>{kNow - 20, kNow}));
+  ASSERT_TRUE(store(kNow));  // of the same second, and fails
+  SnapshotDrop("p", kNow);
   EXPECT_EQ(SnapshotTimes("p"), (std::vector<int64_t>{kNow - 20, kNow}));
   SnapshotDrop("p", kNow);
   EXPECT_EQ(SnapshotTimes("p"), std::vector<int64_t>{kNow - 20});
