@@ -12,6 +12,8 @@ Makes trees in FOLDER once (and uses them again later) and prints a table. The p
     scale    the same run on file indexes of N and 10 N rows: no tree, only rows
     content  duplicates by content against fdupes and jdupes, and the digest against openssl md5
     buckets  duplicates by content among N files of one size: empty ones, and different ones
+    crowd    memory with N folders and 5000 owners: a walk of N files, and a file index of 10 N rows
+             (as root; only the peak memory counts, of the last of runs with one to compare with)
 
 Each number is the median of the rounds (peak memory: the greatest); a first round warms the cache
 and is not counted. Peers alternate within a round, so that whatever else the machine does meets
@@ -36,6 +38,7 @@ from gather import EXTENSIONS, FIND, ROOT, WORDS, drop_caches
 
 SHARES = 8
 OWNERS = 5
+CROWD, CROWD_BEGIN = 5000, 100_000  # owners, and the first one's number
 # Peak memory not from getrusage: that counts this interpreter, which the program was forked from.
 WATCH = r'''
 import re, resource, subprocess, sys, time
@@ -93,8 +96,24 @@ def make_tree(folder, count):
     (folder / '.complete').write_text(str(count))
 
 
+def crowd_folders(count):
+    """`count` folders in folders of a thousand."""
+    return (f'{WORDS[i // 1000 % len(WORDS)]}_{i // 1000}/{WORDS[i % len(WORDS)]} of customer {i}'
+            for i in range(count))
+
+
+def crowd_rows(folders):
+    """Ten files in each folder, of CROWD owners, as rows of an index."""
+    choice = random.Random(1)
+    for i, place in enumerate(crowd_folders(folders)):
+        for n in range(10):
+            name = f'{choice.choice(WORDS)}_{i}_{n}.{choice.choice(EXTENSIONS)}'
+            yield (f'{place}/{name}', name, int(choice.lognormvariate(11, 2.5)),
+                   choice.randrange(1500), f'owner{(i + n) % CROWD}')
+
+
 def make_index(folder, rows, what):
-    """A share's file index of (path, name, size, age in days, extension)."""
+    """A share's file index of (path, name, size, age in days, and perhaps owner)."""
     if made(folder, what):
         return
     now = int(time.time())
@@ -102,9 +121,23 @@ def make_index(folder, rows, what):
         db.execute('CREATE TABLE file_info (owner_name TEXT, time_modify TEXT, size TEXT, '
                    'path TEXT, name TEXT, file_ext TEXT, is_dir INTEGER)')
         db.executemany('INSERT INTO file_info VALUES (?, ?, ?, ?, ?, ?, 0)', (
-            ('root', now - age * 86400, size, path, name, name.rpartition('.')[2])
-            for path, name, size, age in rows))
+            (*(owner or ['root']), now - age * 86400, size, path, name, name.rpartition('.')[2])
+            for path, name, size, age, *owner in rows))
     (folder / '.complete').write_text(what)
+
+
+def make_crowd_tree(folder, folders):
+    """`folders` folders with a file each, of CROWD owners."""
+    if made(folder, str(folders)):
+        return
+    choice = random.Random(1)
+    for i, place in enumerate(crowd_folders(folders)):
+        os.makedirs(folder / place)
+        path = folder / place / f'{choice.choice(WORDS)}_{i}.{choice.choice(EXTENSIONS)}'
+        with open(path, 'wb') as file:
+            file.truncate(int(choice.lognormvariate(11, 2.5)))
+        os.chown(path, CROWD_BEGIN + i % CROWD, 0)
+    (folder / '.complete').write_text(str(folders))
 
 
 def make_equal_size(folder, count):
@@ -158,6 +191,7 @@ class Bench:
                        stdout=subprocess.DEVNULL, env=os.environ | {'DESTDIR': str(self.stage)})
         self.config = self.stage / 'usr/vorn/etc/vornreport.conf'
         self.shipped = self.config.read_text()
+        self.options = []  # for the sandbox
 
     def report(self, shares, reports='duplicate_file', **keys):
         """Seconds, CPU seconds and peak MiB; `shares` is (name, folder, index or None)."""
@@ -167,8 +201,8 @@ class Bench:
         self.config.write_text(self.shipped + f'\n[bench]\nreport_list = {reports}\n' + ''.join(
             f'{key} = {value}\n' for key, value in keys.items()))
         result = subprocess.run(
-            [ROOT / 'tools/sandbox.sh', '--stage', self.stage, '--', sys.executable, '-c', WATCH,
-             '/usr/vorn/bin/vornreport', '--report', 'bench'], stdout=subprocess.PIPE, check=True,
+            [ROOT / 'tools/sandbox.sh', '--stage', self.stage, *self.options, '--', sys.executable,
+             '-c', WATCH, '/usr/vorn/bin/vornreport', '--report', 'bench'], stdout=subprocess.PIPE, check=True,
             stderr=subprocess.DEVNULL).stdout.split()
         status = (self.stage / 'usr/vorn/var/status/bench').read_text().splitlines()[0]
         if status != 'success':
@@ -293,6 +327,19 @@ class Bench:
                 results[:2], results[2:], ('empty files', 'files of 8 bytes, all different')):
             yield (f'{self.files} {what}', whole,
                    f'{whole / quarter:.1f} x the time of a quarter of them')
+
+    def crowd(self):
+        tree, index = (self.base / f'crowd-{kind}{self.files}' for kind in ('tree', 'index'))
+        make_crowd_tree(tree, self.files)
+        make_index(index, crowd_rows(self.files), str(self.files))
+        for name, text in (('passwd', ''.join(
+                f'owner{i}:x:{CROWD_BEGIN + i}:0::/:/bin/sh\n' for i in range(CROWD))), ('group', '')):
+            (self.work / name).write_text(f'root:x:0:{"0::/:/bin/sh" if text else ""}\n' + text)
+            self.options += ['--bind', self.work / name, f'/etc/{name}']
+        for shares, what in (([('crowd', tree, None)], f'{self.files} files walked'),
+                             ([('crowd', index, index / 'index.db')], f'{10 * self.files} rows')):
+            before, last = (self.report(shares, self.every_report) for _ in range(2))
+            yield (f'{what}, {self.files} folders, {CROWD} owners', Result([before, last]), '')
 
 
 def main():

@@ -4,6 +4,7 @@
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <type_traits>
+#include <utility>
 
 #include "facts_scan.hpp"
 #include "report_format/attention.hpp"
@@ -69,22 +70,33 @@ struct Codec {
     take_word(json, value, std::array{kFull, kShort, kGrowing, kShrinking, kSteady});
   }
 
-  static Json written(Level level) { return word_of(level); }
-  static Json written(ForecastState state) { return word_of(state); }
-  static Json written(const Arithmetic auto& number) { return number; }
-  static Json written(const std::string& text) { return text; }
+  // --- Writing single values
+  // ----------------------------------------------------------------------
+
+  // In ASCII letters, '<' as well as those beyond.
+  static void put_json(std::string& out, const Json& value) {
+    for (const char c :
+         value.dump(-1, ' ', /*ensure_ascii=*/true, Json::error_handler_t::replace)) {
+      c == '<' ? out += "\\u003c" : out += c;
+    }
+  }
+  static void put(std::string& out, Level level) { put_json(out, word_of(level)); }
+  static void put(std::string& out, ForecastState state) { put_json(out, word_of(state)); }
+  static void put(std::string& out, const Arithmetic auto& number) { put_json(out, number); }
+  static void put(std::string& out, const std::string& text) { put_json(out, text); }
 
   // --- Records
   // ------------------------------------------------------------------------------------ A record
   // names its keys once, in fields(); Writer and Reader go through them.
 
   template <typename Value>
-  static Json written(const std::vector<Value>& list) {
-    Json json = Json::array();
+  static void put(std::string& out, const std::vector<Value>& list) {
+    const char* before = "[";
     for (const Value& value : list) {
-      json.push_back(written(value));
+      out += std::exchange(before, ",");
+      put(out, value);
     }
-    return json;
+    out += list.empty() ? "[]" : "]";
   }
   template <typename Value>
   static void take(const Json& json, std::vector<Value>& list) {
@@ -98,8 +110,12 @@ struct Codec {
   }
 
   template <typename Value>
-  static Json written(const std::optional<Value>& value) {
-    return value ? written(*value) : Json(nullptr);
+  static void put(std::string& out, const std::optional<Value>& value) {
+    if (value) {
+      put(out, *value);
+    } else {
+      out += "null";
+    }
   }
   template <typename Value>
   static void take(const Json& json, std::optional<Value>& value) {
@@ -110,7 +126,9 @@ struct Codec {
     }
   }
 
-  static Json written(const Sample& sample) { return {sample.time, sample.used}; }
+  static void put(std::string& out, const Sample& sample) {
+    put_json(out, {sample.time, sample.used});
+  }
   static void take(const Json& json, Sample& sample) {
     if (json.is_array() && json.size() == 2) {
       take(json[0], sample.time);
@@ -118,16 +136,13 @@ struct Codec {
     }
   }
 
-  static Json written(IncidentLevel level) {
-    return level == IncidentLevel::kError ? "error" : "warning";
+  static void put(std::string& out, IncidentLevel level) {
+    put_json(out, level == IncidentLevel::kError ? "error" : "warning");
   }
   static void take(const Json& json, IncidentLevel& level) {
     level = json == "error" ? IncidentLevel::kError : IncidentLevel::kWarning;
   }
 
-  static Json written(const AttentionValue& value) {
-    return std::visit([](const auto& one) { return Json(one); }, value);
-  }
   static void take(const Json& json, AttentionValue& value) {
     if (json.is_string()) {
       value = json.get<std::string>();
@@ -141,12 +156,12 @@ struct Codec {
   }
 
   using AttentionValues = std::vector<std::pair<std::string, AttentionValue>>;
-  static Json written(const AttentionValues& values) {
+  static void put(std::string& out, const AttentionValues& values) {
     Json json = Json::object();
     for (const auto& [name, value] : values) {
-      json[name] = written(value);
+      json[name] = std::visit([](const auto& one) { return Json(one); }, value);
     }
-    return json;
+    put_json(out, json);
   }
   static void take(const Json& json, AttentionValues& values) {
     values.clear();
@@ -163,19 +178,28 @@ struct Codec {
     Bool by_content;
   };
 
+  // Straight into the text: a tree of JSON values takes ten times its room, and a server may have
+  // thousands of owners.
   class Writer {
    public:
+    explicit Writer(std::string& out) : out_(out) {}
     template <typename Value>
     void operator()(const char* key, const Value& value) {
-      json_[key] = written(value);
+      begin(key);
+      put(out_, value);
     }
     void operator()(const char* key, Mode<const bool*> mode) {
-      json_[key] = *mode.by_content ? "content" : "name";
+      begin(key);
+      put_json(out_, *mode.by_content ? "content" : "name");
     }
-    Json take_json() { return std::move(json_); }
 
    private:
-    Json json_ = Json::object();
+    void begin(const char* key) {
+      out_.append(std::exchange(before_, ",")).append("\"").append(key).append("\":");
+    }
+
+    std::string& out_;
+    const char* before_ = "{";
   };
 
   class Reader {
@@ -359,11 +383,11 @@ struct Codec {
     field("reports", r.reports);
   }
 
-  static Json written(const auto& record) requires(
-      !Arithmetic<std::remove_cvref_t<decltype(record)>>) {
-    Writer writer;
+  static void put(std::string& out,
+                  const auto& record) requires(!Arithmetic<std::remove_cvref_t<decltype(record)>>) {
+    Writer writer(out);
     fields(writer, record);
-    return writer.take_json();
+    out += "}";
   }
 
   template <typename Record>
@@ -378,29 +402,48 @@ struct Codec {
 }  // namespace
 
 Json to_json(const Facts& facts) {
-  Json json = Json::object();
-  json["format"] = kFactsFormat;
-  json.update(Codec::written(facts));
-  return json;
+  return Json::parse(to_line(facts));
 }
 
 std::string line_of(const Json& json) {
   std::string line;
-  for (const char c : json.dump(-1, ' ', /*ensure_ascii=*/true, Json::error_handler_t::replace)) {
-    c == '<' ? line += "\\u003c" : line += c;
-  }
+  Codec::put_json(line, json);
   return line;
 }
 
 std::string to_line(const Facts& facts) {
-  return line_of(to_json(facts));
+  std::string line;
+  Codec::Writer writer(line);
+  writer("format", kFactsFormat);
+  Codec::fields(writer, facts);
+  line += "}";
+  return line;
 }
 
 std::optional<Facts> facts_of(std::string_view text) {
   if (has_object_of_many_keys(text)) {
     return std::nullopt;
   }
-  const Json json = Json::parse(text, nullptr, /*allow_exceptions=*/false);
+  // Owners, of which there may be thousands, are taken one by one.
+  std::vector<OwnerFacts> owners;
+  bool is_owners = false;
+  bool is_inside = false;
+  const auto take_owners = [&](int depth, Json::parse_event_t event, Json& parsed) {
+    using enum Json::parse_event_t;
+    if (depth == 1 && event == key) {
+      is_owners = parsed == "owners";
+    } else if (depth == 1 && event == array_start && is_owners) {
+      is_inside = true;
+      owners.clear();
+    } else if (depth == 1 && event == array_end) {
+      is_inside = false;
+    } else if (depth == 2 && event == object_end && is_inside) {
+      Codec::take(parsed, owners.emplace_back());
+      return false;
+    }
+    return true;
+  };
+  const Json json = Json::parse(text, take_owners, /*allow_exceptions=*/false);
   if (!json.is_object()) {
     return std::nullopt;
   }
@@ -410,6 +453,9 @@ std::optional<Facts> facts_of(std::string_view text) {
   }
   Facts facts;
   Codec::take(json, facts);
+  if (facts.owners) {
+    facts.owners = std::move(owners);
+  }
   return facts;
 }
 

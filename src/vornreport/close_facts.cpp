@@ -1,6 +1,7 @@
 #include <array>
 #include <cstdio>
 #include <ctime>
+#include <initializer_list>
 #include <string>
 #include <utility>
 
@@ -72,13 +73,15 @@ FactsSource source_of(const char* report_list) {
   return source;
 }
 
-// Writes `text` to the end of `path`. False, logged, when it isn't there then.
-bool write_text(const char* path, const char* mode, const std::string& text) {
+// Writes the texts to the end of `path`. False, logged, when they aren't there then.
+bool write_texts(const char* path, const char* mode, std::initializer_list<const char*> texts) {
   FileHandle file = open_report_file(path, mode, kDriverModule, __LINE__);
   if (!file) {
     return false;
   }
-  std::fputs(text.c_str(), file.get());
+  for (const char* text : texts) {
+    std::fputs(text, file.get());
+  }
   return close_report_file(std::move(file), path, kDriverModule, __LINE__);
 }
 
@@ -88,9 +91,10 @@ bool write_facts(const report_format::Facts& facts, const char* date_dir, const 
   const std::string line = report_format::to_line(facts);
   PathText path;
   path.format("%s/%s", date_dir, report_format::kFactsFile);
-  const std::string block = std::string("<script type='text/javascript'>\nvar ") +
-                            report_format::kFactsVariable + " = " + line + ";\n</script>\n";
-  return write_text(data_path, "a", block) && write_text(path.c_str(), "w", line + "\n");
+  return write_texts(data_path, "a",
+                     {"<script type='text/javascript'>\nvar ", report_format::kFactsVariable, " = ",
+                      line.c_str(), ";\n</script>\n"}) &&
+         write_texts(path.c_str(), "w", {line.c_str(), "\n"});
 }
 
 bool close_facts(const VLIBCSzHash* profile_hash, const char* data_path) {

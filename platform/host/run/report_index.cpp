@@ -97,12 +97,14 @@ void add_figures(Json& row, const Facts& facts, Used& before) {
 
 // The volumes of the newest report, with a sample of each report: time, used, size.
 Json volumes_of(Facts newest, const std::map<std::string, Json>& samples) {
-  for (report_format::VolumeFacts& volume : newest.volumes) {
+  Facts shown;
+  shown.volumes = std::move(newest.volumes);
+  for (report_format::VolumeFacts& volume : shown.volumes) {
     volume.samples.clear();
     volume.filled_by.reset();
     volume.grown_by.reset();
   }
-  Json volumes = report_format::to_json(newest)["volumes"];
+  Json volumes = report_format::to_json(shown)["volumes"];
   for (Json& volume : volumes) {
     volume["samples"] = samples.at(volume["path"].get<std::string>());
   }
