@@ -1,6 +1,7 @@
 #include "rep_folder_usage.hpp"
 
 #include <array>
+#include <utility>
 
 #include "facts/tallies.hpp"
 #include "listed_report.hpp"
@@ -27,10 +28,11 @@ int32_t folder_usage(ReportArgs* args) {
     return run_fleet_report(kReport, args);
   }
   std::vector<ListedRow> rows;
-  for (const LargeFolder& folder : tallies().largest_folders()) {
-    rows.push_back({tallies().shares()[folder.share].name(), folder.folder,
-                    std::to_string(folder.amount.bytes), std::to_string(folder.amount.files),
-                    std::to_string(folder.newest)});
+  for (LargeFolder& folder : tallies().largest_folders()) {
+    ListedRow row{tallies().shares()[folder.share].name(), "", std::to_string(folder.amount.bytes),
+                  std::to_string(folder.amount.files), std::to_string(folder.newest)};
+    row[1] = std::move(folder.folder);
+    rows.push_back(std::move(row));
   }
   return run_listed_report(kReport, args, rows);
 }

@@ -7,8 +7,8 @@
 namespace vornreport {
 
 bool FolderTotals::comes_before(const Total& one, const Total& two) {
-  return std::tuple(two.amount.bytes, one.name->length, one.ordinal) <
-         std::tuple(one.amount.bytes, two.name->length, two.ordinal);
+  return std::tuple(two.amount.bytes, one.length, one.ordinal) <
+         std::tuple(one.amount.bytes, two.length, two.ordinal);
 }
 
 std::string FolderTotals::path_of(const Name& name) {
@@ -31,34 +31,52 @@ void FolderTotals::forget_share(size_t share) {
 }
 
 void FolderTotals::enter(std::string_view name, size_t volume) {
-  std::shared_ptr<const Name> above = inside_.empty() ? nullptr : inside_.back().name;
-  const size_t length = above == nullptr ? 0 : above->length + name.size() + 1;
-  auto own = std::make_shared<const Name>(
-      Name{std::move(above), std::string(inside_.empty() ? "." : name), length});
-  inside_.push_back({share_, std::move(own), volume, {}, 0, 0});
+  const bool is_top = inside_.empty();
+  const size_t length = is_top ? 0 : inside_.back().total.length + name.size() + 1;
+  inside_.push_back(
+      {std::string(is_top ? "." : name), {share_, nullptr, length, volume, {}, 0, 0}});
 }
 
 void FolderTotals::file(uint64_t bytes, uint32_t changed) {
   if (!inside_.empty()) {
-    inside_.back().amount.add(bytes);
-    inside_.back().newest = std::max(inside_.back().newest, changed);
+    Total& total = inside_.back().total;
+    total.amount.add(bytes);
+    total.newest = std::max(total.newest, changed);
+  }
+}
+
+// Names the folders that the walk is in, from the top down.
+void FolderTotals::name_places() {
+  std::shared_ptr<const Name> above;
+  for (Place& place : inside_) {
+    if (!place.total.name) {
+      place.total.name =
+          std::make_shared<const Name>(Name{std::move(above), std::move(place.text)});
+    }
+    above = place.total.name;
   }
 }
 
 void FolderTotals::leave() {
-  Total total = std::move(inside_.back());
+  inside_.back().total.ordinal = left_++;
+  // The order of the heap is that of the list, so that its front is the list's last.
+  const bool is_full = kept_.size() == kMost;
+  const bool is_kept = !is_full || comes_before(inside_.back().total, kept_.front());
+  if (is_kept) {
+    name_places();
+  }
+  Total total = std::move(inside_.back().total);
   inside_.pop_back();
   if (!inside_.empty()) {
-    inside_.back().amount.add(total.amount);
-    inside_.back().newest = std::max(inside_.back().newest, total.newest);
+    Total& above = inside_.back().total;
+    above.amount.add(total.amount);
+    above.newest = std::max(above.newest, total.newest);
   }
-  total.ordinal = left_++;
-  // The order of the heap is that of the list, so that its front is the list's last.
-  if (kept_.size() == kMost) {
-    if (!comes_before(total, kept_.front())) {
-      cut_.insert(total.share);
-      return;
-    }
+  if (!is_kept) {
+    cut_.insert(total.share);
+    return;
+  }
+  if (is_full) {
     std::pop_heap(kept_.begin(), kept_.end(), comes_before);
     cut_.insert(kept_.back().share);
     kept_.pop_back();

@@ -47,24 +47,30 @@ class FolderTotals {
   struct Name {
     std::shared_ptr<const Name> above;  // null at the top
     std::string text;
-    size_t length;  // of the whole path
   };
   struct Total {
     size_t share;
     std::shared_ptr<const Name> name;
+    size_t length;  // of the whole path
     size_t volume;
     Amount amount;
     uint32_t newest;
     uint64_t ordinal;  // in which they were left
   };
+  // A folder that the walk is in. Its total has a name once one below it is kept: most never are.
+  struct Place {
+    std::string text;
+    Total total;
+  };
+  void name_places();
   static bool comes_before(const Total& one, const Total& two);
   static std::string path_of(const Name& name);
 
   size_t share_ = 0;
   uint64_t left_ = 0;
-  std::vector<Total> inside_;  // the folders that the walk is in
-  std::vector<Total> kept_;    // a heap: the one that goes first is in front
-  std::set<size_t> cut_;       // shares that lack a folder
+  std::vector<Place> inside_;
+  std::vector<Total> kept_;  // a heap: the one that goes first is in front
+  std::set<size_t> cut_;     // shares that lack a folder
 };
 
 }  // namespace vornreport

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <cstdlib>
+#include <iterator>
 #include <map>
 #include <string_view>
 #include <tuple>
@@ -51,6 +52,51 @@ Change change(GrowthKind kind, const std::string& share, const std::string& volu
           difference(then.bytes, now.bytes)};
 }
 
+// Both kinds of folder are one.
+GrowthKind group_of(GrowthKind kind) {
+  return kind == GrowthKind::kFolderAtLeast ? GrowthKind::kFolder : kind;
+}
+
+auto order_of(const Change& change) {
+  return std::tuple(group_of(change.kind), ~magnitude(change.bytes), ~magnitude(change.files),
+                    std::string_view(change.share), std::string_view(change.name), change.kind);
+}
+
+// The folders that have changed the most: on each volume the greatest losses and the greatest
+// gains. There are up to 10,000 in a set, whose paths may take 4 KiB each.
+class GreatFolders {
+ public:
+  void add(Change change) {
+    if (change.files == 0 && change.bytes == 0) {
+      return;
+    }
+    changes_.push_back(std::move(change));
+    if (changes_.size() - kept_ > kMostGathered) {
+      cut();
+    }
+  }
+  std::vector<Change> take() {
+    cut();
+    return std::move(changes_);
+  }
+
+ private:
+  static constexpr size_t kMostGathered = 4096;
+
+  void cut() {
+    std::sort(changes_.begin(), changes_.end(),
+              [](const Change& one, const Change& two) { return order_of(one) < order_of(two); });
+    std::map<std::pair<std::string, bool>, size_t> counts;
+    std::erase_if(changes_, [&](const Change& change) {
+      return ++counts[{change.volume, change.bytes < 0}] > kMostFoldersOfVolume;
+    });
+    kept_ = changes_.size();
+  }
+
+  std::vector<Change> changes_;
+  size_t kept_ = 0;  // by the last cut
+};
+
 // The changes of one share.
 class ShareGrowth {
  public:
@@ -79,7 +125,9 @@ class ShareGrowth {
   }
 
   // `then_smallest` and `now_smallest`: of the sets that the shares are of.
-  void add_folders(std::optional<uint64_t> then_smallest, std::optional<uint64_t> now_smallest) {
+  void add_folders(GreatFolders& out, std::optional<uint64_t> then_smallest,
+                   std::optional<uint64_t> now_smallest) {
+    folders_ = &out;
     std::unordered_map<std::string_view, const SnapshotFolder*> before;
     for (const SnapshotFolder& folder : then_.folders) {
       before.emplace(folder.folder, &folder);
@@ -106,28 +154,32 @@ class ShareGrowth {
     out_.push_back(change(kind, now_.name, volume, name, then, now));
   }
   void add_at_least(const SnapshotFolder& folder, uint64_t then, uint64_t now) {
-    out_.push_back({GrowthKind::kFolderAtLeast, now_.name, folder.volume, folder.folder, 0,
-                    difference(then, now)});
+    folders_->add({GrowthKind::kFolderAtLeast, now_.name, folder.volume, folder.folder, 0,
+                   difference(then, now)});
+  }
+  void add_folder(const std::string& volume, const std::string& name, const Amount& then,
+                  const Amount& now) {
+    folders_->add(change(GrowthKind::kFolder, now_.name, volume, name, then, now));
   }
 
   void add_kept(const SnapshotFolder& then, const SnapshotFolder& now) {
     if (then.volume == now.volume) {
-      add(GrowthKind::kFolder, now.volume, now.folder, then.amount, now.amount);
-    } else {  // something was mounted there, or is no more
+      add_folder(now.volume, now.folder, then.amount, now.amount);
+    } else {  // something was mounted there, or is no more; both halves stay
       add(GrowthKind::kFolder, then.volume, now.folder, then.amount, {});
       add(GrowthKind::kFolder, now.volume, now.folder, {}, now.amount);
     }
   }
   void add_appeared(const SnapshotFolder& folder, std::optional<uint64_t> smallest) {
     if (then_.has_all_folders) {
-      add(GrowthKind::kFolder, folder.volume, folder.folder, {}, folder.amount);
+      add_folder(folder.volume, folder.folder, {}, folder.amount);
     } else if (smallest && folder.amount.bytes > *smallest) {
       add_at_least(folder, *smallest, folder.amount.bytes);
     }
   }
   void add_vanished(const SnapshotFolder& folder, std::optional<uint64_t> smallest) {
     if (now_.has_all_folders) {
-      add(GrowthKind::kFolder, folder.volume, folder.folder, folder.amount, {});
+      add_folder(folder.volume, folder.folder, folder.amount, {});
     } else if (smallest && folder.amount.bytes > *smallest) {
       add_at_least(folder, folder.amount.bytes, *smallest);
     }
@@ -152,17 +204,8 @@ class ShareGrowth {
   const SnapshotShare& then_;
   const SnapshotShare& now_;
   std::vector<Change>& out_;
+  GreatFolders* folders_ = nullptr;
 };
-
-// Both kinds of folder are one.
-GrowthKind group_of(GrowthKind kind) {
-  return kind == GrowthKind::kFolderAtLeast ? GrowthKind::kFolder : kind;
-}
-
-auto order_of(const Change& change) {
-  return std::tuple(group_of(change.kind), ~magnitude(change.bytes), ~magnitude(change.files),
-                    std::string_view(change.share), std::string_view(change.name), change.kind);
-}
 
 }  // namespace
 
@@ -185,6 +228,7 @@ const char* word_of(GrowthKind kind) {
 
 std::vector<Change> changes_between(const Snapshot& then, const Snapshot& now) {
   std::vector<Change> changes;
+  GreatFolders folders;
   const auto then_smallest = then.smallest_folder();
   const auto now_smallest = now.smallest_folder();
   for (const SnapshotShare& share : now.shares) {
@@ -200,8 +244,9 @@ std::vector<Change> changes_between(const Snapshot& then, const Snapshot& now) {
     if (now.has_types && then.has_types) {
       growth.add_named(GrowthKind::kType, &SnapshotPart::types);
     }
-    growth.add_folders(then_smallest, now_smallest);
+    growth.add_folders(folders, then_smallest, now_smallest);
   }
+  std::ranges::move(folders.take(), std::back_inserter(changes));
   return changes;
 }
 

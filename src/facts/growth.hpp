@@ -37,12 +37,14 @@ struct Change {
 };
 
 // Changes of the shares that both sets have and that were read as a whole by both, unchanged ones
-// included; of owners and types only where both sets have them, of owners those of one limit.
+// included; of owners and types only where both sets have them, of owners those of one limit; of
+// folders the kMostFoldersOfVolume greatest losses and gains on each volume.
 //
 // A folder that one set lacks counts as nothing in it when that set has all folders of the share.
 // Else it was no larger than the smallest that the set has: the change is at least the difference,
 // kFolderAtLeast, without files, of which nothing is known. That holds for one that has shrunk out
 // of the set as for one that has grown into it; where it comes to nothing, nothing is told.
+inline constexpr size_t kMostFoldersOfVolume = 500;
 std::vector<Change> changes_between(const Snapshot& then, const Snapshot& now);
 
 // The changes since one time.

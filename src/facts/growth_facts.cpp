@@ -67,8 +67,7 @@ bool is_below(const Cause& folder, const Cause& other) {
 
 // Leaves out folders that grew because of one below them, which says where.
 void keep_nearest(std::vector<Cause>& folders) {
-  constexpr size_t kLookedAt = 500;  // few of them share the growth that is worth telling
-  keep_greatest(folders, kLookedAt);
+  keep_greatest(folders, kMostFoldersOfVolume);  // few share the growth that is worth telling
   const std::vector<Cause> all = folders;
   std::erase_if(folders, [&](const Cause& folder) {
     const int64_t most_of_it = folder.bytes - folder.bytes / 10;

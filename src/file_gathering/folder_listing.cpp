@@ -126,7 +126,7 @@ const Folder& top_of(const Folder& folder) {
 int open_step_by_step(int top, const std::vector<const Folder*>& way) {
   int at = -1;
   for (const Folder* folder : way) {
-    const int next = open_folder_at(at < 0 ? top : at, folder->name.c_str());
+    const int next = open_folder_at(at < 0 ? top : at, folder->name);
     const int error = errno;
     if (at >= 0) {
       close(at);

@@ -67,7 +67,7 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
     std::unique_ptr<Batch> finished;  // freed without the lock
     Lock lock(mutex_);
     if (folder.current) {
-      held_ -= folder.current->entries.size();
+      held_ -= room_of(*folder.current);
       finished = std::move(folder.current);
       if (is_silent_) {
         abandoned_.push_back(std::move(finished));  // a thread may be in one of its folders
@@ -80,14 +80,13 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
       }
       const bool was_full = is_full();
       folder.current = std::move(folder.batches.front());
-      folder.batches.pop_front();
-      const size_t count = folder.current->entries.size();
-      ahead_ -= count;
-      held_ += count;
+      folder.batches.erase(folder.batches.begin());
+      ahead_ -= room_of(*folder.current);
+      held_ += room_of(*folder.current);
       if (was_full && !is_full()) {
         work_.notify_all();
       }
-      if (count > 0) {
+      if (!folder.current->entries.empty()) {
         folder.next_entry = 1;
         return folder.current->entries.data();
       }
@@ -169,6 +168,10 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
   }
 
   bool is_full() const { return ahead_ >= kMostAhead; }
+
+  static size_t room_of(const Batch& batch) {
+    return batch.entries.size() + kFolderCounts * batch.folders.size();
+  }
 
   // --- Handles
   // ------------------------------------------------------------------------------------
@@ -309,7 +312,7 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
     parent.openers += known >= 0 ? 1 : 0;
     lock.unlock();
     const int from = known >= 0 ? known : open_again(parent);
-    const int handle = from >= 0 ? open_folder_at(from, folder.name.c_str()) : -1;
+    const int handle = from >= 0 ? open_folder_at(from, folder.name) : -1;
     const int error = errno;
     struct stat status {};
     const bool is_same_system =
@@ -335,9 +338,8 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
   }
 
   void take_in(Folder& folder, const Listed& listed, std::unique_ptr<Batch> batch) {
-    const size_t count = batch->entries.size();
-    ahead_ += count;
-    count_looks(count + 1);
+    ahead_ += room_of(*batch);
+    count_looks(batch->entries.size() + 1);
     bool has_work = !listed.at_end;
     for (const std::unique_ptr<Folder>& found : batch->folders) {
       ++folder.unopened;
@@ -382,8 +384,8 @@ class LookAhead::Shared : public std::enable_shared_from_this<Shared> {
   std::unique_ptr<Folder> top_;
   Folder* first_ = nullptr;   // in the order of the walk
   Folder* wanted_ = nullptr;  // that the consumer waits for
-  size_t ahead_ = 0;          // entries that the consumer hasn't taken
-  size_t held_ = 0;           // entries in the batches that it is at
+  size_t ahead_ = 0;          // room of the entries that the consumer hasn't taken
+  size_t held_ = 0;           // room of the batches that it is at
   unsigned handles_ = 0;
   bool is_stopping_ = false;
   bool is_silent_ = false;  // a thread hangs

@@ -21,7 +21,6 @@
 
 #include <chrono>
 #include <cstdint>
-#include <deque>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -64,7 +63,7 @@ struct Folder {
   };
 
   Folder* parent = nullptr;  // null at the top
-  std::string name;          // in the parent
+  const char* name = "";     // in the parent, whose batch holds it
   size_t path_length = 0;    // of the whole path, as the walk writes it
   dev_t device = 0;          // until it is open: of its parent
   ino_t inode = 0;           // once it is open
@@ -75,9 +74,9 @@ struct Folder {
   unsigned unopened = 0;  // folders in it that somebody is going to open
   unsigned openers = 0;   // those who use the handle just now
 
-  std::deque<std::unique_ptr<Batch>> batches;  // that the consumer hasn't taken yet
-  std::unique_ptr<Batch> current;              // the consumer's
-  size_t next_entry = 0;                       // in it
+  std::vector<std::unique_ptr<Batch>> batches;  // that the consumer hasn't taken yet, few
+  std::unique_ptr<Batch> current;               // the consumer's
+  size_t next_entry = 0;                        // in it
 
   // In the order of the walk, all that aren't listed to their end.
   Folder* before = nullptr;
@@ -86,7 +85,8 @@ struct Folder {
 
 class LookAhead {
  public:
-  static constexpr size_t kMostAhead = 32768;  // entries
+  static constexpr size_t kMostAhead = 32768;  // entries, and
+  static constexpr size_t kFolderCounts = 4;   // so many more for each folder among them
   static constexpr size_t kBatch = 4096;       // entries of one folder that are examined together
   static constexpr unsigned kMostHandles = 512;
   static constexpr size_t kLongestPath = 4095;

@@ -104,9 +104,9 @@ class Walk {
     }
     // Once more when another file system stands there than the one that was judged: a folder that
     // is mounted on demand is only mounted by the first look into it.
-    Opened opened = open_subfolder(handle, folder.name.c_str(), parent.device);
+    Opened opened = open_subfolder(handle, folder.name, parent.device);
     if (opened.result == Look::kReplaced) {
-      opened = open_subfolder(handle, folder.name.c_str(), parent.device);
+      opened = open_subfolder(handle, folder.name, parent.device);
     }
     const int error = errno;
     ahead_.give_back(parent, handle);

@@ -1,3 +1,4 @@
+#include <malloc.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -164,6 +165,7 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash, bool& has_
   }
   report_trace(kDriverModule, 363, "########## report.tmp=%s\n\n", data_path.c_str());
   progress_phase(report_format::Phase::kAssembling);
+  malloc_trim(0);  // what the reports have left is room for the facts
   if (!report_data_lost()) {
     has_snapshot = store_snapshot(profile_hash);
     close_facts(profile_hash, data_path.c_str());

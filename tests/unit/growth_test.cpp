@@ -154,20 +154,32 @@ TEST_F(GrowthTest, Folders) {
     const char* changes;
   } cases[] = {
       {"1", "f\tx\t1\t10\n", "1", "f\tx\t3\t5\n", "folder a /v x 2 -5\n"},
-      {"1", "f\t.\t1\t10\n", "0", "f\t.\t1\t10\nf\tx\t2\t8\n",
-       "folder a /v . 0 0\nfolder a /v x 2 8\n"},
+      {"1", "f\t.\t1\t10\n", "0", "f\t.\t1\t10\nf\tx\t2\t8\n", "folder a /v x 2 8\n"},
       {"0", "f\t.\t1\t10\nf\ts\t1\t5\n", "1", "f\t.\t1\t10\nf\ts\t1\t5\nf\tx\t2\t8\nf\ty\t1\t5\n",
-       "folder a /v . 0 0\nfolder a /v s 0 0\nfolder_at_least a /v x 0 3\n"},
-      {"1", "f\t.\t1\t10\nf\tx\t2\t8\n", "1", "f\t.\t1\t10\n",
-       "folder a /v . 0 0\nfolder a /v x -2 -8\n"},
+       "folder_at_least a /v x 0 3\n"},
+      {"1", "f\t.\t1\t10\nf\tx\t2\t8\n", "1", "f\t.\t1\t10\n", "folder a /v x -2 -8\n"},
       {"1", "f\t.\t1\t10\nf\tx\t2\t8\nf\ty\t1\t6\n", "0", "f\t.\t1\t10\nf\ts\t1\t6\n",
-       "folder a /v . 0 0\nfolder a /v s 1 6\nfolder_at_least a /v x 0 -2\n"},
+       "folder a /v s 1 6\nfolder_at_least a /v x 0 -2\n"},
       {"0", "", "1", "f\tx\t2\t8\n", ""},
   };
   for (const auto& one : cases) {
     auto changes = changes_between(folders(one.then_all, one.then), folders(one.now_all, one.now));
     changes.erase(changes.begin());  // of the share
     EXPECT_EQ(shown(changes), one.changes);
+  }
+}
+
+// However many there are, and whatever their names take.
+TEST_F(GrowthTest, OnlyTheFoldersThatChangedTheMost) {
+  std::string gone, come;
+  for (int i = 1; i <= 6000; ++i) {
+    gone += "f\tg" + std::to_string(i) + "\t1\t" + std::to_string(i) + "\n";
+    come += "f\tc" + std::to_string(i) + "\t1\t" + std::to_string(i) + "\n";
+  }
+  const std::string told = shown(changes_between(folders("1", gone), folders("1", come)));
+  EXPECT_EQ(std::count(told.begin(), told.end(), '\n'), 1 + 2 * 500);
+  for (const char* edge : {" c5501 1 5501\n", " c6000 1 6000\n", " g5501 -1 -5501\n"}) {
+    EXPECT_NE(told.find(edge), std::string::npos) << edge;
   }
 }
 
