@@ -13,7 +13,7 @@ Makes trees in FOLDER once (and uses them again later) and prints a table. The p
     content  duplicates by content against fdupes and jdupes, and the digest against openssl md5
     buckets  duplicates by content among N files of one size: empty ones, and different ones
     crowd    memory with N folders and 5000 owners: a walk of N files, and a file index of 10 N rows
-             (as root; only the peak memory counts, of the last of runs with one to compare with)
+             (as root; two runs of each, so that the second one has a snapshot to compare with)
 
 Each number is the median of the rounds (peak memory: the greatest); a first round warms the cache
 and is not counted. Peers alternate within a round, so that whatever else the machine does meets
@@ -202,8 +202,8 @@ class Bench:
             f'{key} = {value}\n' for key, value in keys.items()))
         result = subprocess.run(
             [ROOT / 'tools/sandbox.sh', '--stage', self.stage, *self.options, '--', sys.executable,
-             '-c', WATCH, '/usr/vorn/bin/vornreport', '--report', 'bench'], stdout=subprocess.PIPE, check=True,
-            stderr=subprocess.DEVNULL).stdout.split()
+             '-c', WATCH, '/usr/vorn/bin/vornreport', '--report', 'bench'],
+            stdout=subprocess.PIPE, check=True, stderr=subprocess.DEVNULL).stdout.split()
         status = (self.stage / 'usr/vorn/var/status/bench').read_text().splitlines()[0]
         if status != 'success':
             raise SystemExit(f'the report ended with the status "{status}"')
