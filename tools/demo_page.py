@@ -48,6 +48,7 @@ class Model:
         self.people = PEOPLE[:2] if kind == 'tiny' else (
             [f'{name}.{name[::-1]}{i}' for i in range(10) for name in PEOPLE] if kind == 'huge' else PEOPLE)
         self.has_history = kind != 'tiny'
+        self.days = 1000 if kind == 'huge' else 180  # of the history of volumes
         self.most_folders = 40 if kind == 'tiny' else 2000
         self.shares = []  # (name, volume, bytes, files, grown in a month)
         for path, (size, used, growth, shares, _) in self.volumes.items():
@@ -294,17 +295,30 @@ def changes_of(model, facts):
 
 
 def ages_of(model, facts):
-    return [(share['name'], age, share['files'] // 7, int(share['bytes'] * part))
+    return [(share['name'], age, int(share['files'] * part), int(share['bytes'] * part))
             for share in facts['shares']
             for age, part in zip(AGES, model.choice.sample(AGE_PARTS, len(AGE_PARTS)))]
 
 
 def quotas_of(model, facts):
     """Of the first volume with quotas: user, quota, used, percent."""
+    told = {user['user']: user for user in facts['quotas']}
+
     def row(name):
-        return (quoted(name), str(model.choice.randrange(2) * 50 * GIB),
-                str(model.choice.randrange(80 * GIB)), f'{model.choice.randrange(120)}.0')
+        quota = told[name]['quota'] if name in told else model.choice.randrange(2) * 80 * GIB
+        used = told[name]['used'] if name in told else model.choice.randrange(70 * GIB)
+        return quoted(name), str(quota), str(used), f'{used / quota * 100 if quota else -1:.1f}'
     return {user['volume']: [row(name) for name in model.people[:100]] for user in facts['quotas'][:1]}
+
+
+def history_of(model, facts):
+    """Of each volume: time and percent, the newest first."""
+    def series(volume):
+        (first, held), size = volume['samples'][0], volume['size']
+        earlier = [[first - ago * DAY, held * (1 - .3 * ago / model.days) + model.choice.uniform(-1, 1) * size * .001]
+                   for ago in range(model.days - len(volume['samples']), 0, -1)]
+        return [(quoted(date), f'{used / size * 100:.4f}') for date, used in [*earlier, *volume['samples']]][::-1]
+    return {volume['id']: series(volume) for volume in facts['volumes']} if model.has_history else None
 
 
 def types_of(model, facts):
@@ -337,7 +351,8 @@ def blocks_of(model, facts):
         'folder_usage': model.folders, 'file_age': ages_of(model, facts), 'growth': changes_of(model, facts),
         'coverage': [(share['volume'], share['name'], share['files'], share['bytes'], share['allocated'], 0, 2)
                      for share in facts['shares']]}
-    tables = {'quota_usage': quotas_of(model, facts), 'file_group': types_of(model, facts)}
+    tables = {'quota_usage': quotas_of(model, facts), 'file_group': types_of(model, facts),
+              'history': history_of(model, facts)}
     return {name: rows_of(found) if found else None for name, found in rows.items()} | {
         name: tables_of(found) if found else None for name, found in tables.items()}
 
@@ -368,7 +383,8 @@ def write_page(folder, facts, blocks, build, language):
         facts_line = json.dumps(facts).replace('<', '\\u003c')
         texts = [(report['variable'], blocks[report['name']]) for report in formats['reports']]
         with head.open('a') as file:
-            for variable, text in [*texts, (formats['facts_variable'], f'{facts_line};\n')]:
+            for variable, text in [*texts, ('vornVolumeUsageDataHistory', blocks['history']),
+                               (formats['facts_variable'], f'{facts_line};\n')]:
                 if text:
                     file.write(f"<script type='text/javascript'>\nvar {variable} = {text}</script>\n")
         call('header', head, 'volume_usage')

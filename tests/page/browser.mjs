@@ -18,13 +18,14 @@ export const SOURCE = path.join(here, '../../reportUI');
 export const LANGUAGES = ['de', 'en', 'es', 'fr', 'ja', 'zh'];
 export const FORMAT = JSON.parse(fs.readFileSync(process.env.VORN_FORMAT, 'utf8'));
 export const ALL = FORMAT.reports.map(({name}) => name);
-export const axe = fs.readFileSync(require.resolve('axe-core/axe.min.js'), 'utf8');
+const axe = fs.readFileSync(require.resolve('axe-core/axe.min.js'), 'utf8');
 export const fileOf = (name, file = 'report.html') => path.join(process.env.VORN_PAGES, name, file);
 export const dictionary = code => JSON.parse(fs.readFileSync(path.join(SOURCE, `template/lang/${code}.json`), 'utf8'));
 export const read = (name, file) => fs.readFileSync(fileOf(name, file), 'utf8');
 
 const folder = fs.mkdtempSync('/var/tmp/vorn-page-');
-let browser, plain, copies = 0;
+let browser, copies = 0;
+const contexts = new Map();  // a tab for each kind of reader, for one costs more than a page
 before(async () => {
   browser = await chromium.launch({
     executablePath: '/usr/bin/chromium', env: {...process.env, HOME: folder},
@@ -39,15 +40,12 @@ after(async () => {
 // The page is filled piece by piece.
 export const isReady = page => page.locator('body[data-ready]').waitFor({state: 'attached'});
 
-// What is folded gets its rows when it opens.
-export async function openAll(page) {
-  for (let deep = 0; deep < 3; ++deep) {
-    await page.evaluate(() => new Promise(resolve => {
-      document.querySelectorAll('details:not([open])').forEach(each => { each.open = true; });
-      setTimeout(resolve, 20);
-    }));
+// What is folded is made when it is opened, and so is what is folded in that.
+export const openAll = page => page.evaluate(() => {
+  for (let each; (each = document.querySelector('details:not([open]) > summary'));) {
+    each.click();
   }
-}
+});
 
 // Opens a page (its file, or its text, which then stands alone in a folder) and does `work` on it.
 // Whatever the page says on the console or asks of the network fails the test.
@@ -58,11 +56,11 @@ export async function withPage(where, work, {address, silent = true, ...options}
     fs.writeFileSync(file, where);
   }
   const url = address ?? `file://${file}`;
-  // A tab costs more than a page: those without wishes share one.
-  const isPlain = Object.keys(options).length === 0;
-  const context = isPlain && plain || await browser.newContext({
-    viewport: {width: 1280, height: 800}, reducedMotion: 'reduce', ...options});
-  plain = isPlain ? context : plain;
+  const kind = JSON.stringify(options);
+  if (!contexts.has(kind)) {
+    contexts.set(kind, await browser.newContext({viewport: {width: 1280, height: 800}, reducedMotion: 'reduce', ...options}));
+  }
+  const context = contexts.get(kind);
   const page = context.pages()[0] ?? await context.newPage();
   const said = [];
   const listeners = {
@@ -83,32 +81,40 @@ export async function withPage(where, work, {address, silent = true, ...options}
     }
   } finally {
     Object.entries(listeners).forEach(([name, listener]) => page.off(name, listener));
-    if (isPlain) {
-      await page.evaluate(() => localStorage.clear());
-      await page.emulateMedia({media: null, forcedColors: null});
-    } else {
-      await context.close();
-    }
+    await page.evaluate(() => localStorage.clear());
+    await page.emulateMedia({media: null, forcedColors: null});
   }
 }
 
-// A copy of a page whose block of `variable` is another: its text after `var NAME = `, or what
+// A copy of a page whose blocks of some variables are others: the text after `var NAME = `, or what
 // stands in place of the whole element. The end of the head is what the product makes of it.
-export function withBlock(page, variable, block) {
+export function withBlocks(page, blocks) {
   const start = "<script type='text/javascript'>\n";
-  const [head, body] = page.split(/<\/template>\n<\/head>\n<body.*>\n/);
-  const text = /^[[{]/.test(block) ? `${start}var ${variable} = ${block}` : block;
-  const old = new RegExp(`<script type='text/javascript'>\n(var vornDuplicateHashMatch.*\n)?var ${
-    variable} = [^]*?</script>\n`);
+  let [head, body] = page.split(/<\/template>\n<\/head>\n<body.*>\n/);
+  for (const [variable, block] of blocks) {
+    const text = /^[[{]/.test(block) ? `${start}var ${variable} = ${block}` : block;
+    const old = new RegExp(`<script type='text/javascript'>\n(var vornDuplicateHashMatch.*\n)?var ${
+      variable} = [^]*?</script>\n`);
+    head = old.test(head) ? head.replace(old, () => text) : head + text;
+  }
   const copy = path.join(folder, 'head');
-  fs.writeFileSync(copy, old.test(head) ? head.replace(old, () => text) : head + text);
+  fs.writeFileSync(copy, head);
   execFileSync(path.join(SOURCE, 'build-template.sh'), ['header', copy, 'share_list']);
   return fs.readFileSync(copy, 'utf8') + body;
 }
+export const withBlock = (page, variable, block) => withBlocks(page, [[variable, block]]);
 
 export async function choose(page, language) {
   await page.locator('header select').first().selectOption(language);
   await isReady(page);
+}
+
+// Nothing of what axe looks for, or of `rules` alone.
+export async function assertAccessible(page, rules) {
+  await page.evaluate(axe);
+  const {violations} = await page.evaluate(only => window.axe.run({
+    resultTypes: ['violations'], selectors: false, ...only ? {runOnly: only} : {}}), rules);
+  assert.deepEqual(violations.map(({id, nodes}) => [id, ...nodes.slice(0, 3).map(({html}) => html)]), []);
 }
 
 export const textOf = (page, selector) => page.locator(selector).allInnerTexts();

@@ -3,7 +3,7 @@
 import assert from 'node:assert/strict';
 import test from 'node:test';
 
-import {ALL, assertSensible, choose, FORMAT, read, sections, withBlock, withPage} from './browser.mjs';
+import {ALL, assertSensible, choose, FORMAT, read, sections, withBlock, withBlocks, withPage} from './browser.mjs';
 import {facts, volume, withFacts} from './facts.mjs';
 
 const END = '</script>\n';
@@ -68,8 +68,8 @@ test('blocks harm only their own section', async t => {
     (turn || turns[turns.push(Object.defineProperty({}, 'alone', {value: alone})) - 1])[report] = [name, ...rest];
   }
   for (const [i, turn] of turns.entries()) {
-    await t.test(`page ${i}`, () => withPage(Object.values(turn).reduce(
-      (text, [, variable, block]) => withBlock(text, variable, block), whole), async page => {
+    await t.test(`page ${i}`, () => withPage(withBlocks(
+      whole, Object.values(turn).map(([, variable, block]) => [variable, block])), async page => {
       const all = await sections(page), expected = {...untouched};
       for (const [report, [name, , , notes, rows, captions]] of Object.entries(turn)) {
         const shown = all[report];

@@ -167,8 +167,8 @@ const VALUES = {
 };
 const LINES = {
   volume_full: '/srv/a: full', volume_used: '/srv/a: 93.4% used, 2 GiB free', volume_fills: '/srv/a: full in about 24 days (19 to 33)',
-  volume_grew: '/srv/a grew by 1 GiB since Jul 14, 2017', volume_grew_in: '/srv/a grew by 1 GiB since Jul 14, 2017, mostly CAD/b',
-  volume_grew_in_by: '/srv/a grew by 1 GiB since Jul 14, 2017, mostly CAD/b, mostly by anna',
+  volume_grew: '/srv/a grew by 1 GiB since Jul 14, 2017', volume_grew_in: '/srv/a grew by 1 GiB since Jul 14, 2017, mostly in CAD/b',
+  volume_grew_in_by: '/srv/a grew by 1 GiB since Jul 14, 2017, mostly in CAD/b and by anna',
   quota_over: 'anna is over the quota on /home: 12 GiB of 10 GiB', quota_near: 'anna has used 90% of the quota on /home',
   quota_more: 'Further users near or over their quota: 1,234', share_largest: 'The largest share is CAD with 3 GiB',
   owner_most: 'chen owns the most: 4 GiB', duplicates_possible: 'Possible duplicates could free 5 GiB',

@@ -2,7 +2,7 @@
 import assert from 'node:assert/strict';
 import test from 'node:test';
 
-import {axe, choose, LANGUAGES, openAll, read, withPage} from './browser.mjs';
+import {assertAccessible, choose, LANGUAGES, openAll, read, withPage} from './browser.mjs';
 import {DAY, facts, growing, incident, NOW, volume, withFacts} from './facts.mjs';
 
 const NARROW = {viewport: {width: 390, height: 844}}, ZOOMED = {viewport: {width: 640, height: 400}, deviceScaleFactor: 2};
@@ -14,12 +14,6 @@ const rich = withFacts(read('hostile'), facts({
   attention: [{level: 'critical', code: 'volume_full', values: {volume: `/srv/${'x'.repeat(200)}`}, section: 'volume_usage'}]}));
 const bare = withFacts(read('hostile'), null);
 const PAGES = {server: read('server'), rich};
-
-async function assertAccessible(page, rules) {
-  await page.evaluate(axe);
-  const {violations} = await page.evaluate(only => window.axe.run(only ? {runOnly: only} : {}), rules);
-  assert.deepEqual(violations.map(({id, nodes}) => [id, ...nodes.slice(0, 3).map(({html}) => html)]), []);
-}
 
 // Colours are all that the dark has of its own; the small page has what is folded on the large one.
 test('axe finds nothing', async t => {
@@ -100,5 +94,7 @@ test('a print has what is shown, on white, on few pages, and nothing to press', 
     await page.waitForFunction(() => document.title === 'printed');
     assert.equal(await page.locator('#large_file tbody tr').count(), 200);
     assert.equal(await page.locator('details:not([open])').count(), 0);
+    await page.evaluate(() => dispatchEvent(new Event('afterprint')));
+    assert.deepEqual([await page.locator('#large_file tbody tr').count(), await page.locator('details[open]').count()], [10, 0]);
   }, {colorScheme: 'dark'});
 });

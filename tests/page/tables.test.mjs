@@ -54,7 +54,8 @@ test('filtering by words in any order, all rows, and the sum of what is there', 
 const state = page => page.evaluate(() => [
   document.querySelector('#large_file input').value, document.querySelectorAll('#large_file tbody tr').length,
   document.querySelector('#large_file tbody .name').textContent, document.querySelector('.trail b').textContent,
-  document.querySelector('.choice :checked').value, document.querySelector('#file_age details').open]);
+  document.querySelector('.choice :checked').value, document.querySelector('#file_age details').open,
+  document.querySelector('#duplicate_file .below')?.previousSibling.textContent.replace(/[.,]/g, '')]);
 
 test('another language, and the address, keep what a reader has done', () => withPage(fileOf('server'), async page => {
   await page.locator('#large_file thead button').first().click();
@@ -63,27 +64,56 @@ test('another language, and the address, keep what a reader has done', () => wit
   await page.locator('.box.way').first().focus();
   await page.keyboard.press('Enter');
   await page.locator('#file_age summary').first().click();
+  await page.locator('#duplicate_file .more').click();
+  await page.locator('#duplicate_file .opener').nth(150).click();
   await page.locator('#large_file').scrollIntoViewIfNeeded();
   const before = await state(page), top = await page.$eval('#large_file', each => each.getBoundingClientRect().top);
   assert.equal(before[4], 'week');
-  await choose(page, 'de');
+  // The second choice comes while the page is still being made.
+  await page.$eval('header select', select => ['fr', 'de'].forEach(code => {
+    const now = document.querySelector('header select');
+    now.value = code;
+    now.dispatchEvent(new Event('change'));
+  }));
+  await isReady(page);
+  await page.locator('#duplicate_file .below').waitFor();
+  assert.equal(await page.evaluate(() => document.documentElement.lang), 'de');
   assert.deepEqual(await state(page), before);
   assert.ok(Math.abs(await page.$eval('#large_file', each => each.getBoundingClientRect().top) - top) < 200, 'the place is kept');
   await page.reload();
   await isReady(page);
-  assert.deepEqual(await state(page), [...before.slice(0, 5), false], 'the address leads to what was seen');
+  assert.deepEqual((await state(page)).slice(0, 6), [...before.slice(0, 5), false], 'the address leads to what was seen');
   await page.locator('#duplicate_file .here').nth(3).click();
   await page.waitForFunction(() => document.querySelectorAll('#duplicate_file tbody tr').length === 1);
+  await isReady(page);
+  assert.deepEqual((await state(page)).slice(0, 5), before.slice(0, 5), 'a link takes nothing away');
+  await page.goBack();
+  await page.waitForFunction(() => document.querySelectorAll('#duplicate_file tbody tr').length === 200);
+}));
+
+test('a link is followed while another language is made, and one into a fold opens it', () => withPage(fileOf('server'), async page => {
+  await page.evaluate(() => {
+    const select = document.querySelector('header select');
+    select.value = 'de';
+    select.dispatchEvent(new Event('change'));
+    document.querySelector('nav a[href="#large_file"]').click();
+  });
+  await isReady(page);
+  assert.ok(Math.abs(await page.$eval('#large_file', each => each.getBoundingClientRect().top)) < 100);
+  await page.goto(`file://${fileOf('server')}#file_owner?file_owner.by-share=!!CAD`);
+  await page.locator('#file_owner details[open] tbody', {hasText: 'CAD'}).waitFor();
 }));
 
 test('one search looks in all tables', () => withPage(fileOf('server'), async page => {
   await page.locator('.search input').fill('anna');
   await page.waitForFunction(() => /\d/.test(document.querySelector('.search .hits').textContent));
   assert.ok(await page.locator('#file_owner tbody tr:visible').count() > 0);
-  assert.equal(await page.locator('#duplicate_file:visible, #volumes:visible').count(), 0);
+  assert.equal(await page.locator('#duplicate_file:visible, #volumes:visible, nav a[href="#duplicate_file"]:visible').count(), 0);
+  assert.ok(await page.locator('#file_owner details[open]').count() > 0);
   await page.locator('.search input').fill('');
   await page.locator('#volumes').waitFor();
   assert.equal(await page.locator('#duplicate_file:visible').count(), 1);
+  assert.equal(await page.locator('#file_owner details[open]').count(), 0);
 }));
 
 test('a group of duplicates and an owner open to what they hold', () => withPage(fileOf('server'), async page => {
@@ -103,7 +133,7 @@ test('growth has its sign, and is told where there is something to compare with'
     const rows = (await textOf(page, '#growth tbody tr')).map(row => row.replace(/\s+/g, ' ').trim());
     assert.ok(rows.some(row => /^last report Share Photos \+3 GiB \+1$/.test(row)), rows.join('\n'));
     assert.ok(rows.some(row => /^last report File type Videos Video \u2212/.test(row)), rows.join('\n'));
-    assert.match((await textOf(page, '#glance')).join(), /\/srv\/media grew by [\d.]+\sGiB since .*, mostly Photos\/to sort, mostly by anna/);
+    assert.match((await textOf(page, '#glance')).join(), /\/srv\/media grew by [\d.]+\sGiB since .*, mostly in Photos\/to sort and by anna/);
   });
   await withPage(fileOf('empty'), async page => assert.match((await section(page, 'growth')).notes[0], /keinen früheren Bericht/));
 });
@@ -160,4 +190,7 @@ test('every drawing has its data as a table', () => withPage(fileOf('server'), a
     assert.ok(await page.locator(`#${name} ${drawing}`).count() > 0, name);
     assert.ok(await page.locator(`#${name} table:visible tbody tr`).count() > 5, name);
   }
+  // All that the page has of the volumes, which is more than the facts have.
+  await page.locator('.charts').press('Home');
+  assert.equal(await page.locator('.charts').getAttribute('aria-valuenow'), '-179');
 }));

@@ -1,11 +1,13 @@
 // How old the files are: a bar for each share, and what is older than so many years.
-import {legend, stack} from './charts.js';
+import {cutBars, legend, stack} from './charts.js';
 import {h, shown} from './dom.js';
+import {fold} from './folds.js';
 import * as format from './format.js';
 import {ageName, ageOrder, sizeElement, table, withParts} from './table.js';
 
 const YEAR = 365;
 const OLDER = [1, 3, 5];  // years
+const MOST_BARS = 15;
 
 // Files and bytes of each age over all shares, from the youngest on, of rows of share, age, files and
 // size: [age, bytes, files] each.
@@ -31,14 +33,11 @@ function shareBars(rows, ages) {
   }
   const sum = sizes => [...sizes.values()].reduce((all, bytes) => all + bytes, 0);
   const sorted = [...shares].map(([share, sizes]) => [share, sizes, sum(sizes)]).sort((one, two) => two[2] - one[2]);
-  return h('div', {class: 'stacks'}, ...sorted.filter(([, , total]) => total > 0).slice(0, MOST_BARS).map(
+  return cutBars(sorted.filter(([, , total]) => total > 0), MOST_BARS, some => h('div', {}, ...some.map(
     ([share, sizes, total]) => h('div', {class: 'stackrow'}, h('span', {class: 'who long'}, shown(share)),
       stack(ages.map(age => [classOf(age, ages), ageName(age), sizes.get(age) ?? 0]), total),
-      h('span', {class: 'amount'}, sizeElement(total, null)))),
-    sorted.length > MOST_BARS ? h('p', {class: 'cut'}, format.say('andMore', {
-      n: format.number(sorted.length - MOST_BARS)})) : null);
+      h('span', {class: 'amount'}, sizeElement(total, null))))));
 }
-const MOST_BARS = 15;
 
 function olderLines(totals, hasOldest) {
   const all = totals.reduce((sum, [, bytes]) => sum + bytes, 0);
@@ -57,12 +56,11 @@ export function ages(rows, {heading, csv, hasOldest}) {
   const [columns, lines] = withParts([['age', 'age'], ['size', 'size', {bar: true, sum: true}],
                                       ['files', 'count', {sum: true, low: true}]],
     totals.map(total => total.map(String)), 1);
-  const details = h('details', {}, h('summary', {}, format.say('byShare', {name: heading})));
-  details.addEventListener('toggle', () => details.append(table(
+  const [key, caption] = ['file_age.share', format.say('byShare', {name: heading})];
+  const details = fold(key, caption, () => table(
     [['share', 'name'], ['age', 'age'], ['size', 'size', {bar: true, sum: true}], ['files', 'count', {low: true}]],
-    rows.map(([share, age, files, bytes]) => [share, age, bytes, files]),
-    {key: 'file_age.share', caption: format.say('byShare', {name: heading})})), {once: true});
+    rows.map(([share, age, files, bytes]) => [share, age, bytes, files]), {key, caption}));
   return [olderLines(totals, hasOldest), h('figure', {}, legend(known.map(
-    age => [classOf(age, known), ageName(age)])), shareBars(rows, known)),
+    age => [classOf(age, known), ageName(age)])), ...shareBars(rows, known)),
   table(columns, lines, {key: 'file_age', caption: heading, csv}), details];
 }

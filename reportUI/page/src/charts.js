@@ -52,6 +52,14 @@ export function forgetDrawings() {
 export const legend = (entries, what) => h('div', {class: 'legend'}, what ? h('span', {}, `${what}:`) : null,
   h('ul', {}, ...entries.map(([name, text]) => h('li', {class: name}, text))));
 
+// What `draw` makes of the first `most` of a list, and how many more there are; one more has the room
+// that saying so would take.
+export function cutBars(list, most, draw) {
+  const count = list.length > most + 1 ? most : list.length;
+  return [draw(list.slice(0, count)), count < list.length ? h('p', {class: 'cut'}, format.say(
+    'andMore', {n: format.number(list.length - count)})) : null];
+}
+
 // A bar of parts, [class, text of what it is, bytes] each, with a gap between them.
 export function stack(parts, total) {
   const bar = h('div', {class: 'stack', 'aria-hidden': 'true'});
@@ -83,11 +91,11 @@ export function sparkline(samples, {width, height, now, size = 0, forecast, limi
   const x = scaleLinear([now - PAST * DAY, now + Math.max(ahead, PAST * .04) * DAY], [1, width - 1]);
   const uses = samples.map(({used}) => used);
   const [least, most] = [Math.min(...uses), Math.max(...uses, limit ? size : 0)];
-  // What hardly moves is drawn flat.
-  const floor = Math.max(0, Math.min(least, most - (size || most) * LEAST_SPAN) - (most - least) * .18);
+  // What hardly moves is drawn flat, in the middle.
+  const span = Math.max(most - least, (size || most) * LEAST_SPAN), middle = (least + most) / 2;
   // At the top is a full volume; one whose fill isn't in the drawing must not look full.
-  const headroom = size && !limit ? .8 : .02;
-  const y = scaleLinear([floor, most + (most - floor) * headroom || 1], [height - 2, 3]);
+  const headroom = limit ? 0 : size ? .8 : .05;
+  const y = scaleLinear([Math.max(0, middle - span * .68), middle + span * (.5 + headroom) || 1], [height - 2, 3]);
   const path = line(({date}) => x(Math.max(date, now - PAST * DAY)), ({used}) => y(used));
   const below = area(({date}) => x(Math.max(date, now - PAST * DAY)), height, ({used}) => y(used));
   const drawing = svg('svg', {class: `spark ${level}`, viewBox: `0 0 ${width} ${height}`,

@@ -93,7 +93,7 @@ const canEnter = ({children, kind}) => kind !== 'all' && children?.length > 0;
 // The way from the top to where a reader begins: the volume `name`, or the only one; and where its
 // shares are too small a part of it to be seen, the largest of them.
 function beginning(tree, name) {
-  const LEAST_PART = .02;
+  const LEAST_PART = .15;
   const volume = tree.children.find((each, i, all) => all.length === 1 || each.name === name);
   const shares = volume?.children.filter(({kind}) => kind === 'share') ?? [];
   const largest = shares.toSorted((one, two) => two.bytes - one.bytes)[0];

@@ -111,7 +111,8 @@ export const numberChange = value => isSigned(value) ?
 export const sizeChange = value => isSigned(value) ?
   signed(Number(value), size(magnitude(value))) : UNKNOWN;
 
-export const exactSize = value => say('bytes', {n: numberFormat({}).format(BigInt(value))});
+export const exactSize = value => numberFormat(
+  {style: 'unit', unit: 'byte', unitDisplay: 'long'}).format(BigInt(value));
 
 // `value` is a number of hundredths. What is below 100 is never rounded to it: it isn't full yet.
 export function percent(value) {

@@ -1,10 +1,13 @@
 // What grew and what shrank: bars to both sides of nothing, for shares, folders, owners and types.
+import {cutBars} from './charts.js';
 import {h, shown} from './dom.js';
+import {fold} from './folds.js';
 import * as format from './format.js';
 import {keep, stateOf} from './state.js';
 import {sizeElement, table, typeName} from './table.js';
 
 const MOST = 8;  // bars of each kind
+const ROWS = 'growth.rows';
 const SINCE = {month: 'sinceMonth', week: 'sinceWeek', last: 'sinceLast'};
 const GROWN = {share: 'grownShare', owner: 'grownOwner', type: 'grownType', folder: 'grownFolder',
                folder_at_least: 'grownAtLeast'};
@@ -38,9 +41,8 @@ function bars(heading, changes) {
     return h('li', {}, h('span', {class: 'long'}, shown(name)),
              h('span', {class: 'sides'}, bar), sizeElement(bytes, null, format.sizeChange(bytes)));
   };
-  return sorted.length ? h('div', {class: 'growth-kind'}, h('h3', {}, heading),
-    h('ul', {}, ...sorted.slice(0, MOST).map(line)), sorted.length > MOST ?
-      h('p', {class: 'cut'}, format.say('andMore', {n: format.number(sorted.length - MOST)})) : null) : null;
+  return sorted.length ? h('div', {class: 'growth-kind'}, h('h3', {}, heading), ...cutBars(
+    sorted, MOST, some => h('ul', {}, ...some.map(line)))) : null;
 }
 
 function choice(sinces, chosen, change) {
@@ -61,12 +63,10 @@ export function growth(rows, facts, {heading, csv}) {
     format.nameOf('nav', report), changesOf(kind, since, rows, facts))).filter(Boolean));
   const chosen = sinces.includes(stateOf('growth.since')) ? stateOf('growth.since') : sinces[0];
   draw(chosen);
-  const details = h('details', {}, h('summary', {}, format.say('chartData')));
-  details.addEventListener('toggle', () => details.append(growthTable(rows, heading, csv)), {once: true});
   return [sinces.length ? choice(sinces, chosen, since => {
     keep('growth.since', since, 'growth');
     draw(since);
-  }) : null, place, details];
+  }) : null, place, fold(ROWS, format.say('chartData'), () => growthTable(rows, heading, csv))];
 }
 
 function growthTable(rows, heading, csv) {
@@ -74,5 +74,5 @@ function growthTable(rows, heading, csv) {
     sayOf(SINCE, since), sayOf(GROWN, kind), share, kind === 'type' ? typeName(name) : name, bytes, files]);
   return table([['since', 'text', {low: true}], ['kind', 'text', {low: true}], ['share', 'name'], ['name', 'text'],
                 ['grown', 'change'], ['filesGrown', 'countChange', {low: true}]],
-               lines, {key: 'growth', caption: heading, csv});
+               lines, {key: ROWS, caption: heading, csv});
 }

@@ -5,11 +5,13 @@ import {line} from 'd3-shape';
 
 import {drawnIn} from './charts.js';
 import {h, shown, shownPlain, svg} from './dom.js';
+import {fold} from './folds.js';
 import * as format from './format.js';
 import {jumpText, outlookText} from './outlook.js';
 import {table} from './table.js';
 
 const DAY = 86400;
+const SAMPLES = 'volume_usage.samples';
 const HEIGHT = 128, LEFT = 40, RIGHT = 8, TOP = 8, BOTTOM = 20;
 const DIAMOND = 'M0-6 6 0 0 6-6 0Z';
 const TICK_WIDTH = 84;
@@ -18,9 +20,14 @@ const isGrowing = ({forecast}) => forecast.state === 'growing' && forecast.days 
 // A sample may tell the volume's size at its time.
 const percentAt = (volume, {used, size = volume.size}) => used / size * 100;
 
-// The line of a volume: its samples, and what it holds now.
-function pointsOf(volume, now) {
-  const points = volume.samples.map(sample => ({date: sample.date, percent: percentAt(volume, sample)}));
+// The line of a volume, up to what it holds now: its samples, or its rows of `before` where there are
+// more of those.
+function pointsOf(volume, now, before) {
+  const rows = (before?.get(volume.id) ?? []).map(
+    ([date, percent]) => ({date: Number(date), percent: parseFloat(percent)})).filter(
+    ({date, percent}) => date > 0 && date <= now && percent >= 0).reverse();
+  const points = rows.length > volume.samples.length ? rows :
+    volume.samples.map(sample => ({date: sample.date, percent: percentAt(volume, sample)}));
   return points.at(-1)?.date > now - DAY ? points : [...points, {date: now, percent: percentAt(volume, volume)}];
 }
 
@@ -39,9 +46,9 @@ function forecastOf(volume, from, last) {
 }
 
 // The time that all drawings show: what was, and at most half as much of what will be.
-function spanOf(volumes, now) {
-  const first = Math.min(now - DAY, ...volumes.map(({samples}) => samples[0]?.date ?? now));
-  const days = volumes.filter(isGrowing).map(({forecast}) => forecast.days_high ?? forecast.days);
+function spanOf(courses, now) {
+  const first = Math.min(now - DAY, ...courses.map(({points}) => points[0].date));
+  const days = courses.map(({volume}) => volume).filter(isGrowing).map(({forecast}) => forecast.days_high ?? forecast.days);
   const past = now - first;
   return {first, now, last: now + Math.min(Math.max(past / 20, Math.max(0, ...days) * DAY * 1.05), past / 2)};
 }
@@ -98,8 +105,8 @@ function draw(volume, points, span, width) {
 
 // The drawing of one volume. `point` shows its sample nearest to a moment, or the newest again.
 class Chart {
-  constructor(volume, span, pointAll) {
-    this.points = pointsOf(volume, span.now);
+  constructor({volume, points}, span, pointAll) {
+    this.points = points;
     this.said = h('span', {class: 'said-value'});
     this.path = volume.path;
     const place = drawnIn(h('div', {class: 'place'}), width => {
@@ -126,15 +133,15 @@ class Chart {
   }
 }
 
-function historyTable(volumes) {
-  const rows = volumes.flatMap(volume => volume.samples.map(sample => [
-    volume.path, String(sample.date), String(percentAt(volume, sample))]));
+function historyTable(courses) {
+  const rows = courses.flatMap(({volume, points}) => points.map(
+    ({date, percent}) => [volume.path, String(date), String(percent)]));
   return table([['volume', 'name'], ['time', 'time'], ['percent', 'percent']], rows.reverse(),
-               {key: 'volume_usage.samples', caption: format.say('history')});
+               {key: SAMPLES, caption: format.say('history')});
 }
 
 // All drawings. Pointed at one, all say what they held then; arrow keys do the same.
-function drawings(volumes, span) {
+function drawings(courses, span) {
   const days = Math.round((span.now - span.first) / DAY);
   const figure = h('div', {class: 'charts', role: 'slider', tabindex: 0, 'aria-label': format.say('history'),
                            'aria-valuemin': -days, 'aria-valuemax': 0});
@@ -143,7 +150,7 @@ function drawings(volumes, span) {
     figure.setAttribute('aria-valuenow', -ago);
     figure.setAttribute('aria-valuetext', `${format.day(span.now - ago * DAY)}: ${words.join(', ')}`);
   };
-  const charts = volumes.map(volume => new Chart(volume, span, wall => wall !== undefined && point(
+  const charts = courses.map(course => new Chart(course, span, wall => wall !== undefined && point(
     wall, Math.max(0, Math.round((format.wallClock(span.now) - wall) / DAY / 1000)))));
   let ago = 0;
   figure.addEventListener('pointerleave', () => point(undefined, 0));
@@ -161,17 +168,18 @@ function drawings(volumes, span) {
   return figure;
 }
 
-// The drawings with their data as a table; a note when there is nothing to draw.
-export function history(volumes, finished) {
+// The drawings with their data as a table; a note when there is nothing to draw. `before`: Map of a
+// volume's id to rows of time and percent, the newest first, if the page has those.
+export function history(volumes, finished, before) {
   const drawn = volumes.filter(({size}) => size > 0);
   if (drawn.every(({samples}) => samples.length < 2)) {
     return [h('p', {class: 'note'}, format.say('historyShort'))];
   }
   const now = Math.max(finished, ...drawn.map(({samples}) => samples.at(-1)?.date ?? 0));
+  const courses = drawn.map(volume => ({volume, points: pointsOf(volume, now, before)}));
   const text = [['historyText', true], ['forecastText', drawn.some(isGrowing)],
                 ['jumpText', drawn.some(({forecast}) => forecast.jump)]].filter(
     ([, isThere]) => isThere).map(([key]) => format.say(key)).join(' ');
-  const details = h('details', {}, h('summary', {}, format.say('chartData')));
-  details.addEventListener('toggle', () => details.append(historyTable(drawn)), {once: true});
-  return [h('p', {class: 'lead'}, text), drawings(drawn, spanOf(drawn, now)), details];
+  return [h('p', {class: 'lead'}, text), drawings(courses, spanOf(courses, now)),
+          fold(SAMPLES, format.say('chartData'), () => historyTable(courses))];
 }

@@ -5,7 +5,7 @@ import {copyOriginals, h, shown, shownPlain} from './dom.js';
 import {readReports} from './facts.js';
 import * as format from './format.js';
 import {history} from './history.js';
-import {readAddress} from './state.js';
+import {begin} from './state.js';
 import {forgetTables, table} from './table.js';
 import {levelElement} from './volumes.js';
 
@@ -62,5 +62,5 @@ format.loadDictionaries(document);
 useRemembered(data.language || undefined);
 format.chooseZone(data.time_zone);
 document.addEventListener('copy', copyOriginals);
-readAddress();
+begin();
 render();

@@ -5,13 +5,15 @@ import {languageChoice, themeChoice, useRemembered} from './choices.js';
 import {hasBlock, piecesOf, readReport, readVariable} from './data.js';
 import {readFacts} from './facts.js';
 import * as format from './format.js';
+import {unfold} from './folds.js';
 import {fillSection, REPORTS} from './sections.js';
-import {anchorOf, followAnchor, keep, readAddress, stateOf} from './state.js';
+import {anchorOf, begin, followAnchor, keep, stateOf} from './state.js';
 import {attention, glance, incidents, marksOf, next} from './summary.js';
-import {forgetTables, foundIn, isSought, seek} from './table.js';
+import {forgetTables, foundIn, isSought, seek, showAllRows, showFewRows} from './table.js';
 import {cards, levelElement} from './volumes.js';
 
 const MOST_BESIDE = 6;  // cards of volumes that stand beside what needs attention
+const SERIES_COLUMNS = 2;  // time and value
 const main = document.querySelector('main');
 const header = document.querySelector('header');
 const blocks = document.getElementById('data').content;
@@ -23,9 +25,10 @@ const written = new Map([...main.querySelectorAll('section[data-report]')].map(
 const data = new Map();
 function read(name) {
   if (!data.has(name) && written.has(name) && REPORTS[name]) {
-    const {variable, columns, mode} = REPORTS[name];
+    const {variable, columns, mode, series} = REPORTS[name];
     const report = readReport(pieces, variable, columns);
     if (report) {
+      report.before = series && readReport(pieces, series, SERIES_COLUMNS)?.tables;
       report.mode = mode && readVariable(pieces, mode);
       report.heading = name + (report.mode ?? '');
     }
@@ -52,35 +55,40 @@ function emptyReports() {
 
 // --- Header -------------------------------------------------------------------------------------
 
-// Looks in all tables, folded ones too: sections without a find step aside.
-function search(text) {
-  if (text) {
-    main.querySelectorAll('section[data-report] details:not([open])').forEach(each => {
-      each.open = true;
-      each.dataset.opened = '';
-    });
-  } else {
-    main.querySelectorAll('details[data-opened]').forEach(each => {
-      each.open = false;
-      delete each.dataset.opened;
-    });
+// Opens all that is folded in `part`, and what was folded in that.
+function unfoldAll(part) {
+  const opened = [];
+  for (let each; (each = part.querySelector('details:not([open])'));) {
+    unfold(each);
+    opened.push(each);
   }
-  // Folded tables are made when they open, which a browser tells in a task of its own.
-  setTimeout(() => {
-    seek(text);
-    let all = 0;
-    for (const [name, section] of written) {
-      const found = isSought() ? foundIn(section) : 0;
-      all += found;
-      section.hidden = isSought() && !found;
-      const hits = main.querySelector(`nav a[href="#${name}"] .hits`);
-      if (hits) {
-        hits.textContent = found ? format.number(found) : '';
-      }
+  return () => opened.forEach(each => { each.open = false; });
+}
+
+// Looks for what the reader has asked for in all tables, folded ones too: sections without a find step
+// aside, and so do their links.
+let foldAgain = [];
+function search() {
+  const text = stateOf('find');
+  if (text) {
+    written.forEach(section => foldAgain.push(unfoldAll(section)));
+  } else {
+    foldAgain.splice(0).forEach(fold => fold());
+  }
+  seek(text);
+  main.classList.toggle('searched', isSought());
+  let all = 0;
+  for (const link of main.querySelectorAll('nav a')) {
+    const section = written.get(link.hash.slice(1));
+    const found = isSought() && section ? foundIn(section) : 0;
+    all += found;
+    link.hidden = isSought() && !found;
+    link.querySelector('.hits').textContent = found ? format.number(found) : '';
+    if (section) {
+      section.hidden = link.hidden;
     }
-    main.classList.toggle('searched', isSought());
-    header.querySelector('.hits').textContent = isSought() ? format.say('found', {n: format.number(all)}) : '';
-  });
+  }
+  header.querySelector('.hits').textContent = isSought() ? format.say('found', {n: format.number(all)}) : '';
 }
 
 function searchBox() {
@@ -88,11 +96,9 @@ function searchBox() {
                             'aria-label': format.say('search')});
   let waiting;
   input.addEventListener('input', () => {
+    keep('find', input.value.trim());
     clearTimeout(waiting);
-    waiting = setTimeout(() => {
-      keep('find', input.value.trim());
-      search(input.value.trim());
-    }, 150);
+    waiting = setTimeout(search, 150);
   });
   return h('span', {class: 'search'}, input, h('span', {class: 'hits', role: 'status'}));
 }
@@ -141,7 +147,8 @@ function navigation(names) {
     'a', {href: `#${name}`}, format.nameOf('nav', name), marks.has(name) ?
       levelElement(marks.get(name), false) : null, h('span', {class: 'hits'})));
   const all = [...facts?.incidents.length ? [h('a', {href: '#incidents', class: 'marked'}, format.nameOf(
-    'nav', 'incidents'), levelElement(facts.complete ? 'warning' : 'error', false))] : [], ...links];
+    'nav', 'incidents'), levelElement(facts.complete ? 'warning' : 'error', false), h('span', {class: 'hits'}))] :
+    [], ...links];
   return h('nav', {'aria-label': format.say('sections')}, ...all);
 }
 
@@ -156,6 +163,8 @@ function watchPlaces() {
     const here = [...links.keys()].find(id => inView.has(id));
     links.forEach((link, id) => id === here ? link.setAttribute('aria-current', 'true') :
       link.removeAttribute('aria-current'));
+    const link = links.get(here);
+    link?.parentElement.scrollTo({left: link.offsetLeft - link.parentElement.clientWidth / 2});
   }, {rootMargin: '-15% 0px -70% 0px'});
   main.querySelectorAll('section').forEach(section => seen.observe(section));
 }
@@ -174,6 +183,7 @@ const pause = () => new Promise(resolve => setTimeout(resolve));
 let turn = 0;
 
 // The first look at once, then a section in a task of its own, so that the page answers meanwhile.
+// Whether it came to its end: the page may be made anew meanwhile.
 async function render() {
   const mine = ++turn;
   document.documentElement.lang = format.currentLanguage();
@@ -199,45 +209,58 @@ async function render() {
   for (const name of names) {
     await pause();
     if (mine !== turn) {
-      return;
+      return false;
     }
     fillOrSay(name, {data: read(name), facts, emptyReports: empty, mark: marks.get(name), others});
   }
   watchPlaces();
+  if (stateOf('find') || isSought()) {
+    search();
+  }
   document.body.dataset.ready = '';
-  if (stateOf('find')) {
-    search(stateOf('find'));
+  return true;
+}
+
+// Where the reader is to be when the page is made: at `place`, or else where the address leads.
+let place;
+function goToPlace() {
+  const target = document.getElementById(place ? place.id : anchorOf());
+  if (place) {
+    window.scrollTo({top: target ? window.scrollY + target.getBoundingClientRect().top - place.top : place.scrollY,
+                     behavior: 'instant'});
+  } else {
+    target?.scrollIntoView();
   }
 }
 
-// Another language, with the page where it is and what was open still open.
-async function translate() {
-  const open = [...main.querySelectorAll('details, .opener')].map(
-    each => each.open ?? each.getAttribute('aria-expanded') === 'true');
-  const parts = [...main.querySelectorAll('section')];
-  const here = parts.find(each => each.getBoundingClientRect().bottom > 0);
-  const before = here?.getBoundingClientRect().top;
-  const {scrollY} = window;
+async function renderInPlace() {
   main.style.minBlockSize = `${main.offsetHeight}px`;
-  await render();
+  if (await render()) {
+    main.style.minBlockSize = '';
+    goToPlace();
+    place = undefined;
+  }
+}
+
+// Another language, with the page where it is. One that is chosen while the page is still being made
+// finds it where it was before that.
+function translate() {
+  if ('ready' in document.body.dataset) {
+    const here = [...main.querySelectorAll('section')].find(each => each.getBoundingClientRect().bottom > 0);
+    place = {id: here?.id, top: here?.getBoundingClientRect().top, scrollY: window.scrollY};
+  }
+  renderInPlace();
   header.querySelector('select').focus({preventScroll: true});
-  [...main.querySelectorAll('details, .opener')].forEach((each, i) => {
-    if (open[i]) {
-      'open' in each ? each.open = true : each.click();
-    }
-  });
-  main.style.minBlockSize = '';
-  const now = here?.id && document.getElementById(here.id);
-  window.scrollTo({top: now ? window.scrollY + now.getBoundingClientRect().top - before : scrollY,
-                   behavior: 'instant'});
 }
 
 // A print holds what is shown; this one all there is.
-async function printAll() {
-  main.querySelectorAll('details:not([open])').forEach(each => { each.open = true; });
-  await pause();
-  main.querySelectorAll('button.more:not([hidden], .less)').forEach(each => each.click());
-  await new Promise(resolve => setTimeout(resolve, 500));
+function printAll() {
+  const foldAll = unfoldAll(main);
+  showAllRows();
+  window.addEventListener('afterprint', () => {
+    foldAll();
+    showFewRows();
+  }, {once: true});
   window.print();
 }
 
@@ -247,10 +270,10 @@ format.chooseZone(facts?.time_zone || main.dataset.zone);
 format.callVolumes(facts?.volumes ?? []);
 document.addEventListener('copy', copyOriginals);
 document.addEventListener('click', ({target}) => target.closest('.long')?.classList.toggle('open'));
-// Goes where the address leads, also if that has changed while the page was made.
-const goToAnchor = () => document.getElementById(anchorOf())?.scrollIntoView();
-const renderAtAnchor = () => render().then(goToAnchor);
-readAddress();
-// The browser has gone there by itself, but a page that was being made may have gone elsewhere since.
-window.addEventListener('hashchange', () => followAnchor() ? renderAtAnchor() : goToAnchor());
-renderAtAnchor();
+begin();
+// Now the reader is where the address leads, also while the page is still being made.
+window.addEventListener('hashchange', () => {
+  place = undefined;
+  followAnchor() ? renderInPlace() : goToPlace();
+});
+renderInPlace();

@@ -1,5 +1,5 @@
 // Whose the files are, and where each one's lie.
-import {h} from './dom.js';
+import {fold} from './folds.js';
 import * as format from './format.js';
 import {table, withParts} from './table.js';
 
@@ -40,11 +40,10 @@ function sumsBy(owners, key, caption) {
   const rows = [...sums].flatMap(([place, {total, owners: all}]) => [...all].map(
     ([name, bytes]) => [place, name, String(bytes), String(bytes / total * 100)]))
     .sort((one, two) => two[2] - one[2]);
-  const details = h('details', {}, h('summary', {}, caption));
-  details.addEventListener('toggle', () => details.append(table(
+  const name = `file_owner.by-${key}`;
+  return fold(name, caption, () => table(
     [[key, 'name'], ['owner', 'text'], ['size', 'size', {bar: true}], ['part', 'part']],
-    rows, {key: `file_owner.by-${key}`, caption, sorted: 2})), {once: true});
-  return details;
+    rows, {key: name, caption, sorted: 2}));
 }
 
 // `rows`: owner, share, files, bytes.
@@ -60,7 +59,7 @@ export function owners(rows, facts, {heading, csv}) {
   const named = new Map(all.map(owner => [owner.name, owner]));
   const isOnVolumes = all.some(({places}) => places.some(({volume}) => volume));
   return [table(columns, lines, {key: 'file_owner', caption: heading, csv, sorted: 1,
-                                 detail: ([name]) => placesTable(named.get(name))}),
+                                 detail: {name: ([name]) => name, make: ([name]) => placesTable(named.get(name))}}),
           sumsBy(all, 'share', format.say('byShare', {name: heading})),
           isOnVolumes ? sumsBy(all, 'volume', format.say('byVolume', {name: heading})) : null];
 }

@@ -7,9 +7,12 @@
 //   cut       what is said when the page lacks rows of it
 //   mode      a variable whose value chooses the heading
 //   noted     the cut is said above the table, for that shows a part of the rows
+//   partly    only a part of the section lacks what is cut, and says so itself
+//   series    a variable with what was before, by the first column: `before` of what was read
 //   show      the section's content, a list of elements, from what was read: {tables, heading, csv}
-//             (`csv`: address of the file with its rows; `beyond`: rows that only that has) and the
-//             facts, and what it may ask of others, see fillSection()
+//             (`csv`: address of the file with its rows; `beyond`: rows that only that has; `cut`: a
+//             note of rows that the page lacks) and the facts, and what it may ask of others, see
+//             fillSection()
 import {reports as FORMATS} from 'report_format';
 
 import {ages} from './ages.js';
@@ -65,7 +68,8 @@ function duplicates({tables, heading, csv, beyond}) {
   return [table([['file', 'name'], ['copies', 'count', {sum: true}], ['size', 'size', {low: true}],
                  ['frees', 'size', {bar: true, sum: true}], ['group', 'count', {low: true}]],
                 rows, {key: 'duplicate_file', caption: heading, csv, beyond, sorted: 3,
-                       detail: ([, , , , number]) => copiesOf(named.get(number).files)})];
+                       detail: {name: ([, , , , number]) => number,
+                                make: ([, , , , number]) => copiesOf(named.get(number).files)}})];
 }
 
 // The shares with their course and growth.
@@ -98,7 +102,7 @@ function usageTable(data, facts) {
       text: volume ? outlookText(volume) : format.UNKNOWN,
       order: volume ? outlookOrder(volume) : NaN}];
   });
-  const columns = [['volume', 'name'], ['percent', 'percent'], ['used', 'size', {sum: true}],
+  const columns = [['volume', 'name'], ['percent', 'percent'], ['used', 'size', {sum: true, low: true}],
                    ['free', 'size', {sum: true, low: true}]];
   return table(facts ? [...columns.slice(0, 2), ['days', 'outlook'], ...columns.slice(2)] : columns,
                pick(bySize(rows, 1), ...facts ? [0, 1, 4, 2, 3] : [0, 1, 2, 3]),
@@ -110,11 +114,9 @@ function usageTable(data, facts) {
 function explainedTable(facts) {
   const ofIndex = new Set(facts.shares?.filter(({index}) => index).map(({volume}) => volume));
   const volumes = facts.volumes.filter(({explained}) => explained !== undefined);
-  const rows = volumes.map(({path, used, explained, outside}) => [
-    path, String(used), String(explained),
-    {text: outside < 0 ? format.say('outsideLess') : format.size(outside), order: outside}]);
+  const rows = volumes.map(({path, used, explained, outside}) => [path, used, explained, outside].map(String));
   return rows.length ? [
-    table([['volume', 'name'], ['used', 'size'], ['explained', 'size'], ['outside', 'outlook']], rows,
+    table([['volume', 'name'], ['used', 'size'], ['explained', 'size'], ['outside', 'outside']], rows,
           {key: 'coverage.volumes', caption: format.say('volumes')}),
     ...volumes.filter(({path}) => ofIndex.has(path)).map(
       ({path}) => h('p', {class: 'note'}, format.say('partlyByIndex', {name: shownPlain(path)})))] : [];
@@ -126,8 +128,9 @@ const filesTable = (key, columns, rows, {heading, csv, beyond}, sorted) => [
 export const REPORTS = {
   volume_usage: {
     always: true,
+    series: 'vornVolumeUsageDataHistory',
     show: (data, facts) => {
-      const drawn = facts ? history(facts.volumes, facts.finished) : [];
+      const drawn = facts ? history(facts.volumes, facts.finished, data.before) : [];
       return [...drawn.slice(0, 2), usageTable(data, facts), ...drawn.slice(2)];
     }
   },
@@ -149,6 +152,7 @@ export const REPORTS = {
   },
   file_group: {
     cut: 'cutRows',
+    partly: true,
     show: (data, facts) => types(data.tables, facts, data)
   },
   file_age: {
@@ -203,10 +207,15 @@ function absence({always, missing, empty}, facts, known, emptyReports) {
     {none: 'missing', all: 'noRows', some: 'unclear'}[emptyReports]);
 }
 
-// What the section says besides its rows: of failure, damage, a cut, and of nothing to show.
-// `facts`: those of the run, and `known`: those about the report, if any; `beyond`: rows that the
-// table itself says the CSV file has.
-function notesOf(report, data, {facts, known, emptyReports, beyond}) {
+// What is said of rows that the page lacks; null where it has all, or the table itself says of so many,
+// `beyond`, that the CSV file has them.
+const cutNote = (report, data, known, beyond) =>
+  known && known.shown < known.rows && !(beyond && rowsOf(data).length) ?
+    note(report.cut ?? 'firstRows', {n: format.number(known.limit ?? known.shown)}) : null;
+
+// What the section says besides its rows: of failure, damage, `cut`, and of nothing to show.
+// `facts`: those of the run, and `known`: those about the report, if any.
+function notesOf(report, data, {facts, known, emptyReports, cut}) {
   const notes = known?.ok === false ? [note('failed')] : [];
   if (!data) {
     return notes.length ? notes : [note(absence(report, facts, known, emptyReports))];
@@ -218,10 +227,7 @@ function notesOf(report, data, {facts, known, emptyReports, beyond}) {
   } else if (rows === 0) {
     notes.push(note('noRows'));
   }
-  if (known && known.shown < known.rows && !(beyond && rows)) {
-    notes.push(note(report.cut ?? 'firstRows', {n: format.number(known.limit ?? known.shown)}));
-  }
-  return notes;
+  return [...notes, report.partly ? null : cut];
 }
 
 // What a reader sees of a section: content of report `name`. `data` is undefined without a block,
@@ -235,12 +241,13 @@ export function fillSection(section, name, {data, facts, emptyReports, mark, oth
   const csv = report?.hasCsv && !(known && known.csv === undefined) ? `csv/${name}.csv` : undefined;
   const isTold = csv && known && report.limitOf === 'rows' && !report.noted;
   const beyond = isTold ? Math.max(0, known.rows - known.shown) : 0;
-  section.replaceChildren(
+  const cut = data && report ? cutNote(report, data, known, beyond) : null;
+  section.replaceChildren(...[
     h('h2', {id: `${name}-heading`}, name === 'volume_usage' ? format.say('history') : heading,
       mark ? levelElement(mark, false) : null),
-    ...report ? notesOf(report, data, {facts, known, emptyReports, beyond}) : [note('unknown')],
-    ...data && rowsOf(data).length ? report.show({...data, heading, csv, beyond}, facts, others)
-      .filter(Boolean) : []);
+    ...report ? notesOf(report, data, {facts, known, emptyReports, cut}) : [note('unknown')],
+    ...data && rowsOf(data).length ? report.show({...data, heading, csv, beyond, cut}, facts, others) : []
+  ].filter(Boolean));
   for (const title of section.querySelectorAll('.title')) {
     title.textContent = title.textContent === heading ? '' : title.textContent;
   }

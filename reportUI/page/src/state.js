@@ -4,7 +4,7 @@
 const state = new Map();
 let anchor = '';
 
-export function readAddress() {
+function readAddress() {
   const [name, words = ''] = location.hash.slice(1).split(/\?(.*)/s);
   try {
     anchor = decodeURIComponent(name);
@@ -17,14 +17,27 @@ export function readAddress() {
 }
 export const anchorOf = () => anchor;
 
-function writeAddress() {
-  const words = new URLSearchParams([...state].filter(([, value]) => value)).toString();
+const wordsOf = () => new URLSearchParams([...state].filter(([, value]) => value)).toString();
+const WHOLE = 'whole';  // marks an address that tells all of the state
+function setAddress(address) {
   try {
-    history.replaceState(null, '', `#${encodeURIComponent(anchor)}${words && `?${words}`}`);
+    history.replaceState(WHOLE, '', address);
   } catch { /* where a page may have no address, as in a viewer's frame */ }
+}
+function writeAddress() {
+  const words = wordsOf();
+  setAddress(`#${encodeURIComponent(anchor)}${words && `?${words}`}`);
+}
+
+export function begin() {
+  readAddress();
+  setAddress(undefined);
 }
 
 export const stateOf = key => state.get(key) ?? '';
+// Whether something of `key`, or of what belongs to it, differs from how a page begins.
+export const hasState = key => [...state].some(
+  ([each, value]) => value && (each === key || each.startsWith(`${key}.`)));
 
 // The address of a section with some of that.
 export const addressOf = (section, values) => `#${section}?${new URLSearchParams(values)}`;
@@ -38,12 +51,14 @@ export function keep(key, value, section = anchor) {
   }
 }
 
-// A link within the page brings its own anchor, and loses the rest. Whether it brought more.
+// A link within the page brings its own anchor, and adds to the rest; the way back leads to an address
+// that tells all. Whether anything but the anchor has changed.
 export function followAnchor() {
-  const hasWords = location.hash.includes('?');
-  readAddress();
-  if (!hasWords) {
-    writeAddress();
+  const before = wordsOf();
+  if (history.state === WHOLE) {
+    state.clear();
   }
-  return hasWords;
+  readAddress();
+  writeAddress();
+  return wordsOf() !== before;
 }

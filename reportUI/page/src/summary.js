@@ -3,6 +3,7 @@
 import {attention as FORMATS} from 'report_format';
 
 import {h, shown} from './dom.js';
+import {fold} from './folds.js';
 import * as format from './format.js';
 import {fillsText} from './outlook.js';
 import {ageOrder, sizeElement} from './table.js';
@@ -45,12 +46,11 @@ function attentionLine(entry, sections) {
 }
 
 // A list of which a long one's rest is folded, and says how many there are.
-function cutList(lines, most) {
+function cutList(lines, most, key) {
   const list = part => h('ul', {class: 'notices'}, ...part);
-  const shown = lines.length <= most + FEW_MORE ? lines.length : most;
-  return [list(lines.slice(0, shown)), lines.length > shown ? h('details', {},
-    h('summary', {}, format.say('andMore', {n: format.number(lines.length - shown)})),
-    list(lines.slice(shown))) : null];
+  const count = lines.length <= most + FEW_MORE ? lines.length : most;
+  return h('div', {}, list(lines.slice(0, count)), lines.length > count ? fold(
+    key, format.say('andMore', {n: format.number(lines.length - count)}), list(lines.slice(count))) : null);
 }
 
 const isWorry = ({level}) => level !== 'ok';
@@ -63,15 +63,13 @@ export function attention({attention: found, volumes, quotas}, sections) {
   if (!worries.length) {
     return volumes.length || quotas ? h('p', {class: 'calm'}, format.say('nothing')) : null;
   }
-  return h('div', {}, ...cutList(worries.map(entry => attentionLine(entry, sections)), MOST_WORRIES)
-    .filter(Boolean));
+  return cutList(worries.map(entry => attentionLine(entry, sections)), MOST_WORRIES, 'attention');
 }
 
 // What the run found besides, for which there is nothing to do. Null without any.
 export function glance({attention: found}, sections) {
   const calm = found.filter(entry => !isWorry(entry) && !isGain(entry));
-  return calm.length ? h('div', {}, ...cutList(calm.map(entry => attentionLine(entry, sections)),
-                                               MOST_CALM).filter(Boolean)) : null;
+  return calm.length ? cutList(calm.map(entry => attentionLine(entry, sections)), MOST_CALM, 'glance') : null;
 }
 
 const sumOf = (list, isMeant) => (list ?? []).filter(isMeant).reduce((sum, {bytes}) => sum + bytes, 0);
@@ -125,8 +123,7 @@ export function incidents({incidents: all}, sections) {
   }
   const sorted = [...all.filter(({level}) => level === 'error'),
                   ...all.filter(({level}) => level !== 'error')];
-  return h('div', {}, ...cutList(sorted.map(incident => incidentLine(incident, sections)),
-                                 MOST_INCIDENTS).filter(Boolean));
+  return cutList(sorted.map(incident => incidentLine(incident, sections)), MOST_INCIDENTS, 'incidents');
 }
 
 // The worst level of the incidents that concern each report.

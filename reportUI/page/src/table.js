@@ -2,6 +2,7 @@
 // Rows become elements when they are shown.
 import {copyText, copyable, h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
+import {isOpened, noteOpened} from './folds.js';
 import {addressOf, keep, stateOf} from './state.js';
 
 const FIRST_ROWS = 10;
@@ -10,8 +11,9 @@ const AT_ONCE = 100;  // rows that become elements in one go
 const FILTER_FROM = 6;  // fewer rows are taken in at a glance
 
 // Number, decimals and unit in boxes of their own, so that they stand below each other.
+const partsOf = text => /^(.*?\d)([.,]\d+)?(\D*)$/.exec(text)?.slice(1) ?? [text];
 function aligned(text) {
-  const [, whole, decimals, unit] = /^(.*?\d)(\D\d+)?(\u00a0.*)?$/.exec(text) ?? [null, text];
+  const [whole, decimals, unit] = partsOf(text);
   return unit === undefined ? [text] : [whole, h('span', {class: 'decimals'}, decimals ?? ''),
                                         h('span', {class: 'unit'}, unit)];
 }
@@ -28,6 +30,10 @@ export function sizeElement(bytes, tabindex = 0, content = format.size(bytes)) {
 
 const cellOfSize = bytes => sizeElement(bytes, -1, aligned(format.size(bytes)));
 const cellOfChange = bytes => sizeElement(bytes, -1, aligned(format.sizeChange(bytes)));
+function cellOfPercent(value) {
+  const [whole, ...rest] = partsOf(format.percent(value));
+  return h('span', {}, whole, h('span', {class: 'hundredths'}, ...rest));
+}
 
 export function barElement(share, content) {
   const bar = h('span', {class: 'bar', 'aria-hidden': 'true'});
@@ -86,11 +92,16 @@ const KINDS = {
   count: {number: true, key: known, cell: format.number, sum: format.number},
   change: {number: true, key: signed, cell: cellOfChange, sum: cellOfChange},
   countChange: {number: true, key: signed, cell: format.numberChange, sum: format.numberChange},
-  part: {number: true, key: Number, cell: value => format.percent(Number(value))},
+  part: {number: true, key: Number, cell: value => cellOfPercent(Number(value))},
   percent: {
     number: true,
     key: value => parseFloat(value),
-    cell: value => barElement(parseFloat(value), format.percent(parseFloat(value)))
+    cell: value => barElement(parseFloat(value), cellOfPercent(parseFloat(value)))
+  },
+  // What is left of a volume's use: less than nothing where files share blocks.
+  outside: {
+    number: true, key: Number,
+    cell: value => Number(value) < 0 ? format.say('outsideLess') : cellOfSize(value)
   },
   outlook: {key: value => value.order, cell: value => value.text, text: value => value.text},
   element: {key: value => value.order, cell: value => value.make()},
@@ -126,11 +137,17 @@ const wordsOf = text => text.toLocaleLowerCase().split(/\s+/).filter(Boolean);
 // What is looked for in all tables, and the tables that are there.
 let sought = [];
 const tables = new Set();
-export const forgetTables = () => tables.clear();
+export function forgetTables() {
+  tables.forEach(({waiting}) => clearTimeout(waiting));
+  tables.clear();
+}
 export function seek(text) {
   sought = wordsOf(text);
-  tables.forEach(each => each.update());
+  tables.forEach(each => each.element.isConnected ? each.update() : tables.delete(each));
 }
+// Shows all rows that fit, at once, until update() is called.
+export const showAllRows = () => tables.forEach(each => each.fill(each.found.length, Infinity));
+export const showFewRows = () => tables.forEach(each => each.update());
 export const isSought = () => sought.length > 0;
 // Rows found in a part of the page.
 export const foundIn = part => [...tables].filter(({element}) => part.contains(element)).reduce(
@@ -193,10 +210,11 @@ class Table {
     if (this.filter && named >= 0) {
       cells[named].append(this.linkTo(this.columns[named].kind.text(row.values[named])));
     }
+    row.lines = [line];
     if (this.detail) {
-      cells[0].prepend(this.opener(row, line));
+      cells[0].prepend(this.opener(row));
     }
-    return line;
+    return row.lines;
   }
 
   // The address of the table with this row alone.
@@ -206,16 +224,24 @@ class Table {
   }
 
   // A button that opens what belongs to a row below it.
-  opener({values}, line) {
-    const button = h('button', {type: 'button', class: 'opener', 'aria-expanded': 'false',
-                                'aria-label': format.say('open')});
+  opener(row) {
+    const [line] = row.lines;
+    const button = h('button', {type: 'button', class: 'opener', 'aria-label': format.say('open')});
+    const key = `${this.key}.${this.detail.name(row.values)}`;
     let below;
+    const set = isOpen => {
+      button.setAttribute('aria-expanded', String(isOpen));
+      below ??= isOpen ? h('tr', {class: 'below'}, h('td', {colspan: this.columns.length},
+                                                    this.detail.make(row.values))) : undefined;
+      row.lines = isOpen ? [line, below] : [line];
+    };
     button.addEventListener('click', () => {
-      const isOpen = button.getAttribute('aria-expanded') === 'true';
-      button.setAttribute('aria-expanded', String(!isOpen));
-      below ??= h('tr', {class: 'below'}, h('td', {colspan: this.columns.length}, this.detail(values)));
+      const isOpen = row.lines.length > 1;
+      noteOpened(key, !isOpen);
+      set(!isOpen);
       isOpen ? below.remove() : line.after(below);
     });
+    set(isOpened(key));
     return button;
   }
 
@@ -293,7 +319,8 @@ class Table {
     const few = length <= FIRST_ROWS + FEW_MORE;
     this.fill(this.all || few ? length : FIRST_ROWS);
     const numbers = {n: format.number(length), m: format.number(this.rows.length)};
-    this.count.textContent = [format.say('rowCount', numbers), this.beyond > 0 &&
+    // What the total says isn't said again.
+    this.count.textContent = [(words.length || this.beyond > 0) && format.say('rowCount', numbers), this.beyond > 0 &&
       format.say('moreInCsv', {n: format.number(this.beyond)})].filter(Boolean).join(' ');
     this.more.hidden = few;
     this.more.classList.toggle('less', this.all);
@@ -302,14 +329,17 @@ class Table {
   }
 
   // The first rows at once, the others when the browser has time for them.
-  fill(count) {
+  fill(count, atOnce = AT_ONCE) {
     clearTimeout(this.waiting);
     const add = from => {
-      const lines = this.found.slice(from, Math.min(count, from + AT_ONCE)).map(
-        row => row.line ??= this.line(row));
-      from ? this.body.append(...lines) : this.body.replaceChildren(...lines);
-      if (from + AT_ONCE < count) {
-        this.waiting = setTimeout(() => add(from + AT_ONCE));
+      const lines = this.found.slice(from, Math.min(count, from + atOnce)).flatMap(
+        row => row.lines ?? this.line(row));
+      // Many values at once would not fit on the stack.
+      const added = document.createDocumentFragment();
+      lines.forEach(line => added.append(line));
+      from ? this.body.append(added) : this.body.replaceChildren(added);
+      if (from + atOnce < count) {
+        this.waiting = setTimeout(() => add(from + atOnce));
       }
     };
     add(0);
@@ -362,8 +392,8 @@ class Table {
 //   rows      a value for each column
 //   options   key: of its state, begins with the section's name; caption; csv: address of the file;
 //             sorted: index of the column that the rows come sorted by (numbers from the greatest,
-//             texts from the first); beyond: rows that only the file has; detail: makes, of a row's
-//             values, what a button opens below it
+//             texts from the first); beyond: rows that only the file has; detail: {name, make} of a
+//             row's values, for what a button opens below it
 export function table(columns, rows, options) {
   return new Table(columns, rows, options).element;
 }

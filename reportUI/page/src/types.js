@@ -1,13 +1,15 @@
 // What kinds of files there are: over all of them and in each share, from the facts; of each user, as
 // far as the page has rows.
-import {legend, stack} from './charts.js';
+import {cutBars, legend, stack} from './charts.js';
 import {h, shown, shownPlain} from './dom.js';
+import {fold} from './folds.js';
 import * as format from './format.js';
 import {sizeElement, table, typeName, withParts} from './table.js';
 
 const MOST_TYPES = 7;  // with colours of their own; the rest share one
 const MOST_SHARES = 15;
 const ALL = 'vornAll';  // the table of all files
+const OWNERS = 'file_group.owners';
 
 const isOther = type => type.endsWith('_other');
 // The number of bytes of each key, of rows.
@@ -49,28 +51,25 @@ function drawing(records) {
   const types = records.map(({type}) => type).filter(type => !isOther(type)).slice(0, MOST_TYPES);
   const places = records.flatMap(({type, shares}) => shares.map(place => ({...place, type})));
   const shares = [...sumsOf(places, ({share}) => share, ({bytes}) => bytes)].sort((one, two) => two[1] - one[1]);
-  const barOf = (name, inShare) => bar(name, sumsOf(inShare, ({type}) => type, ({bytes}) => bytes), types);
+  const barOf = share => bar(shown(share), sumsOf(
+    places.filter(place => place.share === share), ({type}) => type, ({bytes}) => bytes), types);
   return h('figure', {}, legend([...types.map((type, i) => [`series${i}`, typeName(type)]),
                                  ['rest', format.nameOf('types', 'other')]]),
     bar(format.say('allFiles'), new Map(records.map(({type, bytes}) => [type, bytes])), types),
-    ...shares.length > 1 ? shares.slice(0, MOST_SHARES).map(([share]) => barOf(
-      shown(share), places.filter(place => place.share === share))) : [],
-    shares.length > MOST_SHARES ? h('p', {class: 'cut'}, format.say('andMore', {
-      n: format.number(shares.length - MOST_SHARES)})) : null);
+    ...shares.length > 1 ? cutBars(shares, MOST_SHARES, some => h('div', {}, ...some.map(
+      ([share]) => barOf(share)))) : []);
 }
 
 function userTable(name, rows) {
   const caption = name === ALL ? format.say('allFiles') : shownPlain(name);
-  const details = h('details', {}, h('summary', {}, caption));
-  details.addEventListener('toggle', () => details.append(table(
+  const key = `${OWNERS}.${name}`;
+  return fold(key, caption, () => table(
     [['type', 'type'], ['share', 'text'], ['size', 'size', {bar: true, sum: true}]],
-    rows.toSorted((one, two) => (Number(two[2]) || 0) - (Number(one[2]) || 0)),
-    {key: `file_group.${name}`, caption, sorted: 2})), {once: true});
-  return details;
+    rows.toSorted((one, two) => (Number(two[2]) || 0) - (Number(one[2]) || 0)), {key, caption, sorted: 2}));
 }
 
-// `tables`: Map of user to rows of type, share and size.
-export function types(tables, facts, {heading}) {
+// `tables`: Map of user to rows of type, share and size; `cut`: a note that these lack some, if they do.
+export function types(tables, facts, {heading, cut}) {
   const records = typesOf(tables, facts);
   const grows = records.some(({grown}) => grown?.month);
   const [columns, rows] = withParts(
@@ -81,6 +80,6 @@ export function types(tables, facts, {heading}) {
       type, String(bytes), ...facts?.types ? [String(files)] : [],
       ...grows ? [String(grown?.month?.bytes ?? '')] : []]), 1);
   return [drawing(records), table(columns, rows, {key: 'file_group', caption: heading, sorted: 1}),
-          h('details', {}, h('summary', {}, format.say('byOwner', {name: heading})),
-            ...[...tables].filter(([, all]) => all.length).map(([name, all]) => userTable(name, all)))];
+          fold(OWNERS, format.say('byOwner', {name: heading}), () => h('div', {}, cut,
+            ...[...tables].filter(([, all]) => all.length).map(([name, all]) => userTable(name, all))))];
 }
