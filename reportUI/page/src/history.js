@@ -12,7 +12,7 @@ import {table} from './table.js';
 
 const DAY = 86400;
 const SAMPLES = 'volume_usage.samples';
-const HEIGHT = 128, LEFT = 40, RIGHT = 8, TOP = 8, BOTTOM = 20;
+const HEIGHT = 128, LEFT = 44, RIGHT = 8, TOP = 8, BOTTOM = 20;
 const DIAMOND = 'M0-6 6 0 0 6-6 0Z';
 const TICK_WIDTH = 84;
 

@@ -65,6 +65,13 @@ function pathElement(path) {
            copyButton(path));
 }
 
+// The clock in an element of its own, which a phone leaves out.
+function timeElement(value) {
+  const [time, day] = [format.time(value), format.day(value)];
+  return time === day || !time.startsWith(day) ? time : h('span', {}, day, h('span', {class: 'clock'},
+                                                                            time.slice(day.length)));
+}
+
 // A number to compare, or NaN for what is shown as unknown.
 const known = text => format.isNumber(text) ? Number(text) : NaN;
 const signed = text => format.isSigned(text) ? Number(text) : NaN;
@@ -105,7 +112,7 @@ const KINDS = {
   },
   outlook: {key: value => value.order, cell: value => value.text, text: value => value.text},
   element: {key: value => value.order, cell: value => value.make()},
-  time: {number: true, key: value => known(value) || NaN, cell: format.time}
+  time: {number: true, key: value => known(value) || NaN, cell: timeElement}
 };
 
 export function typeName(label) {
