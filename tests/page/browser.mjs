@@ -37,8 +37,11 @@ after(async () => {
   fs.rmSync(folder, {recursive: true, force: true});
 });
 
-// The page is filled piece by piece.
-export const isReady = page => page.locator('body[data-ready]').waitFor({state: 'attached'});
+// The page is filled piece by piece, and drawings learn their width in the frame after that.
+export async function isReady(page) {
+  await page.locator('body[data-ready]').waitFor({state: 'attached'});
+  await page.evaluate(() => new Promise(done => { requestAnimationFrame(() => setTimeout(done)); }));
+}
 
 // What is folded is made when it is opened, and so is what is folded in that.
 export const openAll = page => page.evaluate(() => {

@@ -184,6 +184,13 @@ test('types and owners are those of all files, however few rows the page has', (
   }
 }));
 
+test('an age has one colour, also where others are missing', () => withPage(read('hostile'), async page => {
+  const legendOf = name => page.$$eval(`#${name} .legend li`, all => all.map(each => [each.textContent, each.className]));
+  const all = await legendOf('folder_usage'), some = await legendOf('file_age');
+  assert.ok(all.length === 7 && some.length < 7 && some.every(([text, colour]) => all.some(
+    each => each[0] === text && each[1] === colour)), some.join());
+}));
+
 test('every drawing has its data as a table', () => withPage(fileOf('server'), async page => {
   await openAll(page);
   for (const [name, drawing] of [['volume_usage', '.history'], ['folder_usage', '.treemap'], ['file_group', '.stack'], ['file_age', '.stack'], ['growth', '.sides']]) {

@@ -1,5 +1,5 @@
 // How old the files are: a bar for each share, and what is older than so many years.
-import {cutBars, legend, stack} from './charts.js';
+import {ageClass, cutBars, legend, stack} from './charts.js';
 import {h, shown} from './dom.js';
 import {fold} from './folds.js';
 import * as format from './format.js';
@@ -22,8 +22,6 @@ function totalsOf(rows) {
   return [...totals.values()].sort(([one], [two]) => ageOrder(one) - ageOrder(two));
 }
 
-const classOf = (age, ages) => age === 'future' ? 'noage' : `age${ages.indexOf(age)}`;
-
 function shareBars(rows, ages) {
   const shares = new Map();
   for (const [share, age, , bytes] of rows) {
@@ -35,7 +33,7 @@ function shareBars(rows, ages) {
   const sorted = [...shares].map(([share, sizes]) => [share, sizes, sum(sizes)]).sort((one, two) => two[2] - one[2]);
   return cutBars(sorted.filter(([, , total]) => total > 0), MOST_BARS, some => h('div', {}, ...some.map(
     ([share, sizes, total]) => h('div', {class: 'stackrow'}, h('span', {class: 'who long'}, shown(share)),
-      stack(ages.map(age => [classOf(age, ages), ageName(age), sizes.get(age) ?? 0]), total),
+      stack(ages.map(age => [ageClass(age), ageName(age), sizes.get(age) ?? 0]), total),
       h('span', {class: 'amount'}, sizeElement(total, null))))));
 }
 
@@ -43,7 +41,7 @@ function olderLines(totals, hasOldest) {
   const all = totals.reduce((sum, [, bytes]) => sum + bytes, 0);
   const lines = OLDER.map(years => [years, totals.filter(
     ([age]) => ageOrder(age) >= years * YEAR && ageOrder(age) < Infinity).reduce((sum, [, bytes]) => sum + bytes, 0)]);
-  return all > 0 ? h('ul', {class: 'older'}, ...lines.map(([years, bytes]) => h('li', {},
+  return all > 0 ? h('ul', {class: 'older'}, ...lines.filter(([, bytes]) => bytes > 0).map(([years, bytes]) => h('li', {},
     h('span', {}, format.days(years * YEAR)), h('b', {}, sizeElement(bytes, null)),
     h('span', {class: 'soft'}, format.percent(bytes / all * 100)))),
     hasOldest ? h('li', {class: 'way'}, h('a', {href: '#least_modify'}, format.say('toOldest'))) : null) : null;
@@ -61,6 +59,6 @@ export function ages(rows, {heading, csv, hasOldest}) {
     [['share', 'name'], ['age', 'age'], ['size', 'size', {bar: true, sum: true}], ['files', 'count', {low: true}]],
     rows.map(([share, age, files, bytes]) => [share, age, bytes, files]), {key, caption}));
   return [olderLines(totals, hasOldest), h('figure', {}, legend(known.map(
-    age => [classOf(age, known), ageName(age)])), ...shareBars(rows, known)),
+    age => [ageClass(age), ageName(age)])), ...shareBars(rows, known)),
   table(columns, lines, {key: 'file_age', caption: heading, csv}), details];
 }

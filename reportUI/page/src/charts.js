@@ -60,6 +60,10 @@ export function cutBars(list, most, draw) {
     'andMore', {n: format.number(list.length - count)})) : null];
 }
 
+// The ages of files as their report has them, and the colour of each, which is the same in all drawings.
+export const AGES = ['0-7', '7-30', '30-90', '90-365', '365-1095', '1095-1825', '1825-'];
+export const ageClass = age => AGES.includes(age) ? `age${AGES.indexOf(age)}` : 'noage';
+
 // A bar of parts, [class, text of what it is, bytes] each, with a gap between them.
 export function stack(parts, total) {
   const bar = h('div', {class: 'stack', 'aria-hidden': 'true'});

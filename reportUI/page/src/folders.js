@@ -2,7 +2,7 @@
 // a volume besides its shares, and what is free there, is drawn as well.
 import {hierarchy, treemap} from 'd3-hierarchy';
 
-import {drawnIn, fit, fitWhole, legend} from './charts.js';
+import {ageClass, AGES, drawnIn, fit, fitWhole, legend} from './charts.js';
 import {fileAddress, h, shown, shownPlain, svg} from './dom.js';
 import * as format from './format.js';
 import {keep, stateOf} from './state.js';
@@ -12,14 +12,13 @@ const HEADER = 20, LINE = 16;
 const LEAST = 6;  // pixels that a box needs to be drawn
 const MOST_BOXES = 400;
 const DAY = 86400;
-const AGES = ['0-7', '7-30', '30-90', '90-365', '365-1095', '1095-1825', '1825-'];
 
-// The number of the age, as the report of ages has them, of a last change.
-function ageClass(newest, now) {
+// The number of the age of a last change.
+function ageNumber(newest, now) {
   const days = (now - newest) / DAY;
   return newest > 0 ? AGES.findLastIndex(age => days >= parseInt(age, 10)) : -1;
 }
-const ageLegend = () => legend(AGES.map((age, i) => [`age${i}`, ageName(age)]), format.nameOf('columns', 'newest'));
+const ageLegend = () => legend(AGES.map(age => [ageClass(age), ageName(age)]), format.nameOf('columns', 'newest'));
 
 // --- The tree -----------------------------------------------------------------------------------
 
@@ -224,9 +223,9 @@ class Treemap {
     const size = format.size(value);
     const age = data.newest ? ` · ${format.nameOf('columns', 'newest')}: ${format.day(data.newest)}` : '';
     const label = format.say('selected', {name: plain, size, percent: format.percent(value / total * 100)}) + age;
-    const number = ageClass(data.newest ?? 0, this.now);
+    const number = ageNumber(data.newest ?? 0, this.now);
     const kind = ['free', 'outside'].includes(data.kind) ? data.kind : children ? 'group' :
-      number < 0 ? 'noage' : `age${number}`;
+      ageClass(AGES[number]);
     const transform = `translate(${x0},${y0})`;
     const element = svg('g', {class: `box ${kind}${canEnter(data) ? ' way' : ''}`, transform, tabindex: -1,
                               role: canEnter(data) ? 'button' : 'img', 'aria-label': label},

@@ -67,7 +67,7 @@ function unfoldAll(part) {
 
 // Looks for what the reader has asked for in all tables, folded ones too: sections without a find step
 // aside, and so do their links.
-let foldAgain = [];
+const foldAgain = [];
 function search() {
   const text = stateOf('find');
   if (text) {
