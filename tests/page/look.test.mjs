@@ -85,6 +85,12 @@ test('a print has what is shown, on white, on few pages, and nothing to press', 
     const pagesOf = async () => (await page.pdf({preferCSSPageSize: true})).toString('latin1').match(/\/Type\s*\/Page\b/g).length;
     const few = await pagesOf();
     assert.ok(few > 2 && few <= 10, `${few} pages`);
+    // Drawings are made anew for the paper, and for the screen again.
+    const widthAfter = name => page.evaluate(event => {
+      dispatchEvent(new Event(event));
+      return document.querySelector('.history').viewBox.baseVal.width;
+    }, name);
+    assert.ok(await widthAfter('beforeprint') < 400 && await widthAfter('afterprint') > 500);
     // Everything is there for who asks for it.
     await page.evaluate(() => { window.print = () => { document.title = 'printed'; }; });
     await page.locator('.everything').click();

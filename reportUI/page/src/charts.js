@@ -37,9 +37,14 @@ const watcher = new ResizeObserver(entries => entries.forEach(({target, contentR
   }
 }));
 
-// `element`, in which `draw` is called with its width, and again whenever that changes.
-export function drawnIn(element, draw) {
-  drawers.set(element, {draw});
+// A print is laid out without a word of the widths in it.
+window.addEventListener('beforeprint', () => drawers.forEach(({draw, paper}) => draw(paper)));
+window.addEventListener('afterprint', () => drawers.forEach(({draw, width}) => width && draw(width)));
+
+// `element`, in which `draw` is called with its width, and again whenever that changes; `paper`: its
+// width in print.
+export function drawnIn(element, draw, paper) {
+  drawers.set(element, {draw, paper});
   watcher.observe(element);
   return element;
 }

@@ -11,6 +11,7 @@ import {ageName, copyButton, table} from './table.js';
 const HEADER = 20, LINE = 16;
 const LEAST = 6;  // pixels that a box needs to be drawn
 const MOST_BOXES = 400;
+const PAPER = 700;  // pixels
 const DAY = 86400;
 
 // The number of the age of a last change.
@@ -142,7 +143,7 @@ class Treemap {
     Object.assign(this, {tree, now, key, entered});
     this.trail = h('p', {class: 'trail'});
     this.chosen = h('p', {class: 'chosen', 'aria-hidden': 'true'});
-    this.place = drawnIn(h('div', {class: 'place'}), width => this.draw(width));
+    this.place = drawnIn(h('div', {class: 'place'}), width => this.draw(width), PAPER);
     this.element = h('figure', {class: 'folders'}, this.trail, ageLegend(), this.place, this.chosen);
     this.way = [tree];
     for (const name of stateOf(key).split('\n').filter(Boolean)) {

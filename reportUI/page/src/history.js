@@ -15,6 +15,7 @@ const SAMPLES = 'volume_usage.samples';
 const HEIGHT = 128, LEFT = 44, RIGHT = 8, TOP = 8, BOTTOM = 20;
 const DIAMOND = 'M0-6 6 0 0 6-6 0Z';
 const TICK_WIDTH = 84;
+const PAPER = 340;  // pixels of one of two columns
 
 const isGrowing = ({forecast}) => forecast.state === 'growing' && forecast.days !== undefined;
 // A sample may tell the volume's size at its time.
@@ -112,7 +113,7 @@ class Chart {
     const place = drawnIn(h('div', {class: 'place'}), width => {
       this.drawn = draw(volume, this.points, span, width);
       place.replaceChildren(this.drawn.drawing);
-    });
+    }, PAPER);
     place.addEventListener('pointermove', ({clientX}) => pointAll(
       this.drawn?.dateAt(clientX - place.getBoundingClientRect().left)));
     this.element = h('div', {class: `chart ${volume.level}`, title: shownPlain(volume.path)},
