@@ -24,7 +24,15 @@ struct ReleaseWith {
   }
 };
 
-using SqliteHandle = std::unique_ptr<sqlite3, ReleaseWith<&sqlite3_close>>;
+// With the statements that the connection keeps, which would hold it open.
+inline int close_sqlite(sqlite3* db) {
+  while (sqlite3_stmt* kept = sqlite3_next_stmt(db, nullptr)) {
+    sqlite3_finalize(kept);
+  }
+  return sqlite3_close(db);
+}
+
+using SqliteHandle = std::unique_ptr<sqlite3, ReleaseWith<&close_sqlite>>;
 using SqliteText = std::unique_ptr<char, ReleaseWith<&sqlite3_free>>;
 using FileHandle = std::unique_ptr<FILE, ReleaseWith<&std::fclose>>;
 using DirHandle = std::unique_ptr<DIR, ReleaseWith<&closedir>>;

@@ -86,6 +86,35 @@ TEST_F(GatheringTest, AStatementCutAtItsBufferIsRefused) {
   EXPECT_EQ(rows("select length(path) from file_stat"), "4095\n");
 }
 
+// The columns make numbers of what looks like one; how a file goes in must make no difference.
+TEST_F(GatheringTest, AFileIsStoredAsItsTextSaysIt) {
+  struct stat status {};
+  status.st_uid = 0xFFFFFFFFU;
+  status.st_mtime = -1;
+  status.st_size = INT64_MAX;
+  for (const char* name :
+       {"1e3", "007", " 5", "0x1f", "9223372036854775808", "-0.0", "", "\xff\xc3", "?1", "n'1"}) {
+    rows("delete from file_stat");
+    const FileInfo info{"12", "/12/a", name, "1.0", &status};
+    ASSERT_EQ(ReportDBAddFile(db_.get(), &info), 0);
+    std::string quoted = name;
+    if (const size_t quote = quoted.find('\''); quote != std::string::npos) {
+      quoted.insert(quote, 1, '\'');
+    }
+    rows(
+        "insert into file_stat (owner, mtime, size, share, path, filename, ext) values "
+        "(4294967295, "
+        "4294967295, 9223372036854775807, '12', '/12/a', '" +
+        quoted + "', '1.0')");
+    EXPECT_EQ(
+        rows("select count(*) from (select distinct owner, mtime, size, share, path, hex(path), "
+             "typeof(share), filename, hex(filename), typeof(filename), typeof(ext), ext from "
+             "file_stat)"),
+        "1\n")
+        << name;
+  }
+}
+
 TEST_F(GatheringTest, WalkJudgesEveryFileSystemByItsKind) {
   const std::string top = folder_.path("top");
   write_file(top + "/here", "");
