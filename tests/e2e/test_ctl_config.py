@@ -268,7 +268,7 @@ class Profiles(ControlTest):
                 ('language', 'tlh', 'there are de, en'), ('mail_to', 'a@b, c', '"c" is no mail'),
                 ('mail_from', 'a', 'no mail address'), ('smtp_url', 'http://x', 'smtp://host'),
                 ('smtp_user', 'u', 'needs smtp_password_file'),
-                ('smtp_password_file', '/etc/passwd', 'open to every user'),
+                ('smtp_password_file', '/etc/passwd', 'changed by others'),
                 ('report_dir', 'r', 'not absolute'), ('report_dir', '/etc/passwd/r', 'no folder'),
                 ('link_base', 'x', 'http'), ('limit_user', 'nobody,rot', '"rot" is no user'),
                 ('language', "de-'", 'not installed'),

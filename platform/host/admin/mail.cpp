@@ -5,6 +5,7 @@
 #include <memory>
 
 #include "admin/section_hash.hpp"
+#include "config/password_file.hpp"
 #include "mail/mail.hpp"
 
 namespace admin {
@@ -65,8 +66,7 @@ std::string smtp_url_problem(const std::string& value) {
 
 std::string password_file_problem(const std::string& value) {
   std::string password;
-  const char* problem = host::password_problem(value, password);
-  return problem == nullptr ? "" : problem;
+  return host::password_problem(value, password);
 }
 
 }  // namespace admin

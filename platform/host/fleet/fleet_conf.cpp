@@ -1,15 +1,14 @@
 #include "fleet/fleet_conf.hpp"
 
 #include <curl/curl.h>
-#include <fcntl.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <memory>
 
 #include "base/text_containers.hpp"
+#include "config/password_file.hpp"
 #include "config/shares.hpp"
 #include "report_format/values.hpp"
 #include "vorn/base/file_io.hpp"
@@ -62,27 +61,6 @@ bool is_identifier(std::string_view name, std::string_view others) {
            return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||
                   others.find(c) != std::string_view::npos;
          });
-}
-
-// Reads the first line of the file; a sentence's end when it isn't to be had.
-std::string password_error(const std::string& path, std::string& password) {
-  constexpr std::size_t kLargest = 4096;
-  if (!path.starts_with('/')) {
-    return "is not absolute; write password_file = /...";
-  }
-  const Fd file = open_regular(AT_FDCWD, path.c_str());
-  struct stat status {};
-  if (!file || fstat(file.get(), &status) != 0) {
-    return std::string("can't be read (") + std::strerror(errno) +
-           "); make it a regular file with the password as its first line";
-  }
-  if ((status.st_mode & (S_IRWXO | S_IWGRP)) != 0 ||
-      (status.st_uid != 0 && status.st_uid != geteuid())) {
-    return "can be read or changed by others; run chown root and chmod 600 on it";
-  }
-  password = read_start(file.get(), kLargest).value_or("");
-  password.resize(std::min(password.find_first_of("\r\n"), password.size()));
-  return password.empty() ? "holds no password in its first line" : "";
 }
 
 std::string host_name() {
@@ -147,7 +125,7 @@ std::string take(const std::vector<std::pair<std::string, std::string>>& entries
   if (conf.user.empty()) {
     return "password_file is set, but no user";
   }
-  const std::string error = password_error(password_file, conf.password);
+  const std::string error = password_problem(password_file, conf.password);
   return error.empty() ? "" : "password_file " + password_file + " " + error;
 }
 

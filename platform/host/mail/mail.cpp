@@ -2,7 +2,6 @@
 
 #include <curl/curl.h>
 #include <sys/random.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -13,6 +12,7 @@
 #include <optional>
 
 #include "base/host_log.hpp"
+#include "config/password_file.hpp"
 #include "config/profile.hpp"
 #include "mail/mail_delivery.hpp"
 #include "report_format/facts_file.hpp"
@@ -90,8 +90,8 @@ bool read_credentials(const char* profile, const VLIBCSzHash& hash, MailServer& 
     return true;
   }
   const std::string path = value_of(hash, "smtp_password_file");
-  if (const char* problem = password_problem(path, server.password); problem != nullptr) {
-    log_line(R"(profile "%s": smtp_password_file "%s" %s)", profile, path.c_str(), problem);
+  if (const std::string problem = password_problem(path, server.password); !problem.empty()) {
+    log_line(R"(profile "%s": smtp_password_file "%s" %s)", profile, path.c_str(), problem.c_str());
     return false;
   }
   return true;
@@ -194,24 +194,6 @@ std::string mail_host(const std::string& smtp_url) {
   }
   const bool is_mail = scheme == "smtp" || scheme == "smtps";
   return is_mail && !has_more ? url_part(url.get(), CURLUPART_HOST) : "";
-}
-
-const char* password_problem(const std::string& path, std::string& password) {
-  struct stat status {};
-  if (!path.starts_with('/')) {
-    return "is not absolute; write smtp_password_file = /...";
-  }
-  if (stat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode)) {
-    return "is no readable file; make one with the password as its first line";
-  }
-  if ((status.st_mode & S_IRWXO) != 0) {
-    return "is open to every user; run chmod 600 on it";
-  }
-  constexpr std::size_t kLargestFile = 65536;
-  const std::optional<std::string> content = read_file(path, kLargestFile);
-  password = content.value_or("");
-  password.resize(std::min(password.find_first_of("\r\n"), password.size()));
-  return password.empty() ? "holds no password in its first line" : nullptr;
 }
 
 bool wants_mail(const VLIBCSzHash& hash) {

@@ -38,10 +38,6 @@ bool valid_address(std::string_view address);
 // The host of an URL smtp://host:port or smtps://host:port; empty for any other text.
 std::string mail_host(const std::string& smtp_url);
 
-// What keeps the password file `path` from being used ("is open to every user; ..."), or null with
-// `password` filled.
-const char* password_problem(const std::string& path, std::string& password);
-
 // What became of the runs of a profile before the one that a mail is about, as times; 0 is nothing.
 struct EarlierRuns {
   std::time_t unfinished = 0;  // the last one began then and didn't finish
