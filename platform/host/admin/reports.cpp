@@ -55,7 +55,7 @@ bool remove_report(const std::string& folder, const std::string& name) {
 }
 
 void update_index(const std::string& folder) {
-  host::update_index(folder);
+  host::update_index(folder, folder.substr(folder.rfind('/') + 1));  // which is its profile's name
 }
 
 bool remove_all_reports(const std::string& folder) {
@@ -87,7 +87,7 @@ bool move_reports(const std::string& folder, const std::string& to) {
   }
   // Above it, too, nobody else can put something in its place.
   if (renameat2(AT_FDCWD, folder.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) {
-    host::update_index(to);  // it names the profile
+    update_index(to);  // it names the profile
     return true;
   }
   host::log_line("%s can't be renamed to %s (%s); see what stands there", folder.c_str(),

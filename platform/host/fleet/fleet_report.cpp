@@ -14,6 +14,7 @@
 #include "base/text_containers.hpp"
 #include "base/trusted_folder.hpp"
 #include "outcome/run_outcome.hpp"
+#include "run/report_index.hpp"
 #include "run/run_paths.hpp"
 #include "run/run_temporary.hpp"
 #include "vorn/fleet.h"
@@ -91,8 +92,12 @@ int end(bool is_made) {
   }
   remove_temporary_names(getpid());
   const bool is_whole = end_report(*report_run(), is_made);
+  const std::string folder = report_run()->finished.substr(0, report_run()->finished.rfind('/'));
   report_run().reset();
-  folder_in_use() = Fd();
+  folder_in_use() = Fd();  // the list has a turn of its own
+  if (is_whole) {
+    update_index(folder, kName);
+  }
   return is_whole ? 0 : -1;
 }
 

@@ -222,7 +222,7 @@ int update_status(const std::string& profile, std::string_view word) {
     if (ended->keep > 0) {
       remove_old_reports(folder, ended->keep, status.report);
     }
-    update_index(folder);
+    update_index(folder, profile);
   }
   return status.word == word ? 0 : 1;
 }

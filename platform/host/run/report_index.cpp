@@ -213,7 +213,7 @@ void tell_failed(const std::string& folder, const char* name, const char* why) {
            folder.c_str(), name, why);
 }
 
-void update(const std::string& folder) {
+void update(const std::string& folder, const std::string& profile) {
   const Fd opened = open_report_folder(folder);
   if (!opened) {
     return;
@@ -228,17 +228,17 @@ void update(const std::string& folder) {
   }
   if (index_standing(opened) == Standing::foreign) {
     tell_foreign(folder, kIndex);
-  } else if (!write_index(opened, data_of(opened, folder.substr(folder.rfind('/') + 1), reports))) {
+  } else if (!write_index(opened, data_of(opened, profile, reports))) {
     tell_failed(folder, kIndex, std::strerror(errno));
   }
 }
 
 }  // namespace
 
-void update_index(const std::string& folder) noexcept {
+void update_index(const std::string& folder, const std::string& profile) noexcept {
   const ErrnoKeeper keeper;
   try {
-    update(folder);
+    update(folder, profile);
   } catch (const std::exception& error) {
     tell_failed(folder, kIndex, error.what());
   }

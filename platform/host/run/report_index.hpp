@@ -9,10 +9,10 @@
 
 namespace host {
 
-// Brings both up to date in `folder`, which belongs to one profile. Something else of such a name,
-// which isn't ours, stays as it is. One log line for that, and for what can't be read or written;
-// no report depends on it.
-void update_index(const std::string& folder) noexcept;
+// Brings both up to date in `folder`, which belongs to `profile` alone. Something else of such a
+// name, which isn't ours, stays as it is. One log line for that, and for what can't be read or
+// written; no report depends on it.
+void update_index(const std::string& folder, const std::string& profile) noexcept;
 
 // Removes both from the open folder of a profile's reports, where they are ours.
 void remove_index(const Fd& folder);
