@@ -37,6 +37,9 @@ std::string status_text(const RunStatus& status) {
   if (status.mail_failed) {
     text += "mail = failed\n";
   }
+  if (status.fleet_failed) {
+    text += "fleet = failed\n";
+  }
   for (const auto& [key, time] : kTimes) {
     text += status.*time > 0 ? key + (" = " + std::to_string(status.*time) + "\n") : "";
   }
@@ -56,6 +59,8 @@ RunStatus status_of(std::string_view text) {
       std::from_chars(count->data(), count->data() + count->size(), status.incidents);
     } else if (value_in(line, "mail") == "failed") {
       status.mail_failed = true;
+    } else if (value_in(line, "fleet") == "failed") {
+      status.fleet_failed = true;
     }
     for (const auto& [key, time] : kTimes) {
       if (const auto value = is_first ? std::nullopt : value_in(line, key)) {

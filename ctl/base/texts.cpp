@@ -41,6 +41,11 @@ std::string unsent_mail(const std::string& profile) {
   return "the mail of the last report reached nobody; run vornctl profile test-mail " + profile;
 }
 
+std::string missing_from_fleet(const std::string& profile) {
+  return "the last report is missing from the fleet, the system log says why; run vornctl run " +
+         profile + " when the engine answers";
+}
+
 std::string overdue_text(std::time_t begun, std::time_t due) {
   constexpr std::time_t kDay = 86400;
   const std::time_t days = (std::time(nullptr) - begun) / kDay;

@@ -14,6 +14,8 @@ namespace ctl {
 const char* word_for(admin::RunState state);
 // What is said of a profile whose last report's mail reached nobody.
 std::string unsent_mail(const std::string& profile);
+// What is said of one whose last report was finished, but not taken by the fleet.
+std::string missing_from_fleet(const std::string& profile);
 // What is said of a profile whose report was due at `due`; `begun`: the last run, 0 when there was
 // none.
 std::string overdue_text(std::time_t begun, std::time_t due);

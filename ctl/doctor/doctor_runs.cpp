@@ -167,6 +167,9 @@ void check_last_runs(Findings& findings, const Configuration& configuration) {
     if (last.status.mail_failed) {
       findings.add(Level::warning, subject, unsent_mail(profile.name));
     }
+    if (last.status.fleet_failed) {
+      findings.add(Level::warning, subject, missing_from_fleet(profile.name));
+    }
     const bool is_cut = state == RunState::ended_early;
     const std::time_t begun =
         std::max(last.status.report_started, is_cut ? last.status.started : 0);

@@ -223,6 +223,7 @@ void show_report(const Options& options, const Section& profile,
   }
   told["report"] = json_of(*report, facts);
   told["mail_failed"] = status.mail_failed;
+  told["fleet_failed"] = status.fleet_failed;
   if (!options.json) {
     print_line(report->page);
   }
@@ -232,7 +233,10 @@ void show_report(const Options& options, const Section& profile,
   if (status.mail_failed) {
     warn(unsent_mail(profile.name));
   }
-  if (!facts->incidents.empty() || status.mail_failed) {
+  if (status.fleet_failed) {
+    warn(missing_from_fleet(profile.name));
+  }
+  if (!facts->incidents.empty() || status.mail_failed || status.fleet_failed) {
     throw Failure("", kWithIncidents);
   }
 }
@@ -278,7 +282,8 @@ void run_profile(const Options& options, const Section& profile, Json& told) {
 int run_and_tell(const Options& options, const Section& profile, Json& list) {
   Json told{{"profile", profile.name}, {"kind", options.data ? "data" : "report"},
             {"status", "success"},     {"report", nullptr},
-            {"mail_failed", false},    {"error", nullptr}};
+            {"mail_failed", false},    {"fleet_failed", false},
+            {"error", nullptr}};
   int exit_status = 0;
   try {
     run_profile(options, profile, told);

@@ -31,6 +31,7 @@ struct ProfileStatus {
   std::string name;
   admin::RunState state = admin::RunState::unknown;
   bool mail_failed = false;
+  bool fleet_failed = false;
   std::time_t started = 0;             // the last run, 0 when that isn't known
   std::time_t begun = 0;               // the last run that was to make a report, likewise
   std::optional<std::time_t> overdue;  // since when a report is
@@ -67,6 +68,7 @@ ProfileStatus status_of(const Section& profile, const std::vector<Job>& jobs, st
   const admin::LastRun last = admin::last_run(profile.name);
   status.state = last.state;
   status.mail_failed = last.status.mail_failed;
+  status.fleet_failed = last.status.fleet_failed;
   status.started = last.status.started;
   const bool is_cut = status.state == admin::RunState::ended_early;
   status.begun = std::max(last.status.report_started, is_cut ? status.started : 0);
@@ -100,6 +102,7 @@ void print_as_json(const std::vector<ProfileStatus>& all) {
     Json entry{{"profile", status.name},
                {"status", word_for(status.state)},
                {"mail_failed", status.mail_failed},
+               {"fleet_failed", status.fleet_failed},
                {"started", nullptr},
                {"overdue_since", nullptr},
                {"last_report", nullptr},
@@ -161,6 +164,9 @@ void print_remarks(const ProfileStatus& status) {
   }
   if (status.mail_failed) {
     print_line(status.name + ": " + unsent_mail(status.name));
+  }
+  if (status.fleet_failed) {
+    print_line(status.name + ": " + missing_from_fleet(status.name));
   }
   if (!status.facts) {
     return;

@@ -23,6 +23,7 @@
 #include "report_format/fleet.hpp"
 #include "report_format/reports.hpp"
 #include "vorn/fleet.h"
+#include "vorn/report.h"
 #include "vorn/user.h"
 #include "vornreport/error_log.hpp"
 #include "vornreport/fleet_rows.hpp"
@@ -352,6 +353,7 @@ void ship_run(const char* facts_path) {
   }
   REPORT_LOG_ERR(kModule, __LINE__, "this run is missing from the fleet: %s\n",
                  VORNFleetProblem(g_sent->fleet.get()));
+  VornQazStatusFleetFailed();
 }
 
 }  // namespace vornreport

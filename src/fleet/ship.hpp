@@ -18,7 +18,8 @@ struct ShipLookUps {
 void ship_rows(const VLIBCSzHash* profile_hash, const ShipLookUps& look_ups);
 
 // The report is finished: sends the run's line with the facts in `facts_path`, by which the rows
-// count. Without rows that have been sent nothing is done; a failure is logged.
+// count. Without rows that have been sent nothing is done. A failure is logged, and told by the
+// run's mail and status, since its facts are closed.
 void ship_run(const char* facts_path);
 
 }  // namespace vornreport

@@ -295,6 +295,8 @@ int VornQazProgressUpdate(const char* /*profile*/, const char* text) {
 
 void VornQazStatusMailFailed(void) {}
 
+void VornQazStatusFleetFailed(void) {}
+
 void VornQazDataFailed(const char* /*profile*/) {}
 
 void VornQazProgressEnd(const char* profile) {

@@ -201,16 +201,17 @@ bool wants_mail(const VLIBCSzHash& hash) {
 }
 
 int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
-                const EarlierRuns& earlier, const MailLimits& limits) {
+                const LateNews& news, const MailLimits& limits) {
   if (!wants_mail(hash)) {
     return 0;
   }
-  const std::optional<Posting> posting = prepare(profile, hash, earlier);
+  const std::optional<Posting> posting = prepare(profile, hash, news.earlier);
   if (!posting) {
     return -1;
   }
   MailTopic topic = posting->topic;
   topic.link = link;
+  topic.is_missing_from_fleet = news.is_missing_from_fleet;
   const std::string page = value_of(hash, "real_path_report_final");
   const auto facts = report_format::read_facts(page.substr(0, page.rfind('/')));
   const MailContent content = report_mail(posting->texts, topic, facts);

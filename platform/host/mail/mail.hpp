@@ -44,13 +44,19 @@ struct EarlierRuns {
   std::time_t missed = 0;      // one was due then and never began
 };
 
+// What the mail of a report tells besides its facts, which were closed before.
+struct LateNews {
+  EarlierRuns earlier{};
+  bool is_missing_from_fleet = false;
+};
+
 // Whether a mail of the profile has somebody to go to.
 bool wants_mail(const VLIBCSzHash& hash);
 
 // As VornQazSendReport. The mail tells the facts beside the finished page, whose path is in `hash`
 // (real_path_report_final).
 int send_report(const char* profile, const char* link, const VLIBCSzHash& hash,
-                const EarlierRuns& earlier, const MailLimits& limits);
+                const LateNews& news, const MailLimits& limits);
 
 // Sends the mail of a run that failed, with what it has said to the log, as send_report sends one.
 // Those who were served.

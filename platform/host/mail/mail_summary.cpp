@@ -130,14 +130,17 @@ class Summary {
     return cut(std::move(lines));
   }
 
-  // What became of the runs before this one.
-  std::vector<std::string> earlier(const MailTopic& topic) const {
+  // What became of the runs before this one, and of this one since its facts were closed.
+  std::vector<std::string> late_news(const MailTopic& topic) const {
     std::vector<std::string> told;
     if (!topic.unfinished.empty()) {
       told.push_back(say("unfinished", {{"time", topic.unfinished}}));
     }
     if (!topic.missed.empty()) {
       told.push_back(say("missed", {{"time", topic.missed}}));
+    }
+    if (topic.is_missing_from_fleet) {
+      told.push_back(say("missingFromFleet", {}));
     }
     return told;
   }
@@ -248,7 +251,7 @@ std::string plain_body(const Summary& plain, const MailTopic& topic,
                        const std::optional<Facts>& facts) {
   const std::string headline = facts ? plain.headline(*facts) : "";
   std::string text = headline.empty() ? "" : headline + "\n\n";
-  text += plain.ready(topic, facts) + "\n\n" + paragraphs(plain.earlier(topic), "", "\n\n");
+  text += plain.ready(topic, facts) + "\n\n" + paragraphs(plain.late_news(topic), "", "\n\n");
   if (facts && !facts->incidents.empty()) {
     for (const auto& [label, sentence, details] : plain.incidents(*facts)) {
       text += sentence + "\n" + (details.empty() ? "" : "    " + details + "\n");
@@ -318,7 +321,7 @@ std::string html_body(const Summary& html, const MailTopic& topic,
   const std::string headline = facts ? html.headline(*facts) : "";
   std::string body = headline.empty() ? "" : "<p><strong>" + headline + "</strong></p>\n";
   body += "<p>" + html.ready(topic, facts) + "</p>\n" +
-          paragraphs(html.earlier(topic), "<p>", "</p>\n");
+          paragraphs(html.late_news(topic), "<p>", "</p>\n");
   if (facts && !facts->incidents.empty()) {
     body += html_incidents(html.incidents(*facts));
   }
@@ -345,10 +348,10 @@ MailContent failure_mail(const Texts& texts, const MailTopic& topic,
   MailContent mail;
   mail.subject = plain.about("failedSubject", topic);
   mail.plain = plain.about("failed", topic) + "\n\n" +
-               paragraphs(plain.earlier(topic), "", "\n\n") + plain.about("failedRemedy", topic) +
+               paragraphs(plain.late_news(topic), "", "\n\n") + plain.about("failedRemedy", topic) +
                "\n";
   std::string body = "<p>" + html.about("failed", topic) + "</p>\n" +
-                     paragraphs(html.earlier(topic), "<p>", "</p>\n") + "<p>" +
+                     paragraphs(html.late_news(topic), "<p>", "</p>\n") + "<p>" +
                      html.about("failedRemedy", topic) + "</p>\n";
   if (!log.empty()) {
     mail.plain += "\n" + plain.say("failedLog") + "\n\n";

@@ -20,6 +20,7 @@ struct MailTopic {
   std::string report_list;   // as the profile has it
   std::string unfinished{};  // when the run before began, which didn't finish; else empty
   std::string missed{};      // when a run was due that never began; else empty
+  bool is_missing_from_fleet = false;
 };
 
 // A mail's subject (one line of any characters) and its body in both forms. The HTML stands alone:

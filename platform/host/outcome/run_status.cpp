@@ -115,7 +115,8 @@ Outcome outcome_of(const ReportRun& run, std::string_view word) {
   auto facts = is_whole ? report_format::read_facts(run.finished) : std::nullopt;
   if (word == report_format::kSuccess && facts && is_durable(run)) {
     const int incidents = static_cast<int>(facts->incidents.size());
-    return {{std::string(word), name_of(run), incidents, run.mail_failed}, std::move(facts)};
+    return {{std::string(word), name_of(run), incidents, run.mail_failed, run.fleet_failed},
+            std::move(facts)};
   }
   if (word == report_format::kSuccess && !facts) {
     log_line(
@@ -172,7 +173,7 @@ void tell_end(const std::string& profile, const Outcome& outcome,
   if (has_failed) {
     tell_failure(*course(), settings);
   } else if (outcome.facts) {
-    tell_report(*course(), *outcome.facts, settings, outcome.status.mail_failed);
+    tell_report(*course(), *outcome.facts, settings, outcome.status);
   }
 }
 
@@ -304,6 +305,12 @@ void VornQazDataFailed(const char* profile) try {
   host::tell_failure(*host::course(), host::readable_settings(profile));
 } catch (const std::exception&) {
   // The log has what failed.
+}
+
+void VornQazStatusFleetFailed(void) {
+  if (host::report_run()) {
+    host::report_run()->fleet_failed = true;
+  }
 }
 
 void VornQazStatusMailFailed(void) {

@@ -5,6 +5,7 @@
 #include "config/profile.hpp"
 #include "mail/mail.hpp"
 #include "outcome/course.hpp"
+#include "run/run_paths.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/report.h"
 
@@ -17,7 +18,8 @@ int VornQazSendReport(const char* profile, const char* link, const VLIBCSzHash* 
     const auto& course = host::course();
     const host::EarlierRuns earlier =
         course && course->profile == profile ? host::earlier_runs(*course) : host::EarlierRuns{};
-    return host::send_report(profile, link, *hash, earlier, host::MailLimits{});
+    const bool is_missing = host::report_run() && host::report_run()->fleet_failed;
+    return host::send_report(profile, link, *hash, {earlier, is_missing}, host::MailLimits{});
   });
 } catch (...) {
   errno = ENOMEM;

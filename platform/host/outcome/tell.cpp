@@ -60,16 +60,20 @@ void tell_failure(const Course& course, const VLIBCSzHash& settings) {
 }
 
 void tell_report(const Course& course, const report_format::Facts& facts,
-                 const VLIBCSzHash& settings, bool mail_failed) {
-  if (mail_failed) {
+                 const VLIBCSzHash& settings, const report_format::RunStatus& status) {
+  if (status.mail_failed) {
     complain("profile " + course.profile +
              ": the mail of its report reached nobody; vornctl profile test-mail " +
              course.profile + " says why");
   }
-  if (!mail_failed && wants_mail(settings)) {
+  if (!status.mail_failed && wants_mail(settings)) {
     return;
   }
   complain_of(earlier_runs(course), course.profile);
+  if (status.fleet_failed) {
+    complain("profile " + course.profile + ": its report is missing from the fleet; vornctl run " +
+             course.profile + " tries again");
+  }
   for (const report_format::Incident& incident : facts.incidents) {
     complain("profile " + course.profile + ": " + incident.text);
   }

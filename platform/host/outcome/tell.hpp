@@ -15,9 +15,9 @@ namespace host {
 void tell_failure(const Course& course, const VLIBCSzHash& settings);
 
 // What no mail has told goes to standard error: what the report lacks, what became of the runs
-// before, that its mail reached nobody.
+// before, that it is missing from the fleet, that its mail reached nobody.
 void tell_report(const Course& course, const report_format::Facts& facts,
-                 const VLIBCSzHash& settings, bool mail_failed);
+                 const VLIBCSzHash& settings, const report_format::RunStatus& status);
 
 }  // namespace host
 

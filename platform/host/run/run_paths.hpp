@@ -52,6 +52,7 @@ struct ReportRun {
   std::string report_list{};  // of the profile
   std::size_t keep = 0;       // reports that the profile keeps; 0: all
   bool mail_failed = false;
+  bool fleet_failed = false;
   VLIBCSzHash settings{0};  // the profile's section
 };
 

@@ -58,6 +58,10 @@ void VornQazNoteLogLine(const char* line);
 // Notes that the mail of the report run in progress reached nobody; its status will tell it.
 void VornQazStatusMailFailed(void);
 
+// Notes that the report in progress, finished though it is, is missing from the fleet; its mail and
+// its status will tell it.
+void VornQazStatusFleetFailed(void);
+
 // Adds to `*hash` the paths that don't depend on a profile: `real_path_base`, `real_path_stat_db`.
 // `flags` must be 0. 0 or -1.
 int VornQazInitLocation(VLIBCSzHash** hash, int flags);

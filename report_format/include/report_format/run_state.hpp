@@ -20,9 +20,10 @@ inline constexpr const char* kFail = "fail";
 // Behind it stand "key = value" lines; a reader leaves keys aside that it doesn't know.
 struct RunStatus {
   std::string word;
-  std::string report{};      // folder name of the finished report; only of kSuccess
-  int incidents = 0;         // that the report tells
-  bool mail_failed = false;  // its mail reached nobody
+  std::string report{};       // folder name of the finished report; only of kSuccess
+  int incidents = 0;          // that the report tells
+  bool mail_failed = false;   // its mail reached nobody
+  bool fleet_failed = false;  // it is missing from the fleet, which the report couldn't tell
   // Seconds since the epoch, 0 where there is none: of this run, then of runs before it, too.
   std::int64_t started = 0;
   std::int64_t ended = 0;
