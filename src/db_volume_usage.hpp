@@ -27,6 +27,7 @@ struct VolumeUsageSample {
 // A volume and its samples: the current one, then the stored ones from newest to oldest.
 struct VolumeUsageNode {
   FixedText<32> name;          // mount path; empty for a stored volume that is no longer mounted
+  std::string path;            // all of it
   int32_t days;                // until it is full; -1: no estimate
   VolumeUsageSample* samples;  // owned
   std::string fleet_name;      // of a server of the fleet: "server:/path"; `name` is empty then

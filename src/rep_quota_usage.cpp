@@ -209,11 +209,25 @@ void keep_for_fleet(const QuotaVolume& volume, const char* path) {
   }
 }
 
+// Of each user on a volume the row of the newest run that tells of both: each profile has users of
+// its own.
 constexpr char kOverFleet[] =
     "select concat(server, ':', value[1]), value[2], value[3], value[4], value[5], value[6], "
     "value[7], value[8] from report_row where {runs} and report = 'quota_usage' and "
-    "(server, run) global in (select server, max(run) from report_row "
-    "where {runs} and report = 'quota_usage' group by server) order by server, position";
+    "(server, value[1], value[6], run) global in (select server, value[1], value[6], max(run) "
+    "from report_row where {runs} and report = 'quota_usage' group by server, value[1], value[6]) "
+    "order by server, run desc, position";
+
+// Null when the list has none of that name. Rows of one volume mostly follow each other.
+QuotaVolume* fleet_volume(const QAZLLNode* list, std::string_view name) {
+  if (list != nullptr && quota_volume_of(list->last)->fleet_name == name) {
+    return quota_volume_of(list->last);
+  }
+  while (list != nullptr && quota_volume_of(list)->fleet_name != name) {
+    list = list->next;
+  }
+  return list != nullptr ? quota_volume_of(list) : nullptr;
+}
 
 int add_fleet_user(void* context, int columns, char** values, char** /*names*/) noexcept {
   enum Column { kVolume, kTotal, kMaxQuota, kMaxUsed, kUsers, kUser, kUsedKiB, kQuotaKiB, kCount };
@@ -223,21 +237,22 @@ int add_fleet_user(void* context, int columns, char** values, char** /*names*/) 
   }
   const auto number = [&](Column column) { return std::strtoull(values[column], nullptr, 10); };
   auto& list = *static_cast<QAZLLNode**>(context);
-  if (list == nullptr || quota_volume_of(list->last)->fleet_name != values[kVolume]) {
-    std::unique_ptr<QuotaVolume> volume(new (std::nothrow) QuotaVolume{});
-    if (!volume || QAZLLadd(&list, volume.get(), nullptr) < 0) {
+  QuotaVolume* volume = fleet_volume(list, values[kVolume]);
+  if (volume == nullptr) {
+    std::unique_ptr<QuotaVolume> made(new (std::nothrow) QuotaVolume{});
+    if (!made || QAZLLadd(&list, made.get(), nullptr) < 0) {
       return -1;
     }
+    volume = made.release();
     volume->fleet_name = values[kVolume];
     volume->totalKiB = number(kTotal);
-    volume->maxQuota = number(kMaxQuota);
-    volume->maxUserUsed = number(kMaxUsed);
-    volume->filteredUsers = number(kUsers);
-    static_cast<void>(volume.release());
   }
-  QuotaVolume& volume = *quota_volume_of(list->last);
-  volume.users.emplace(number(kUsedKiB),
-                       QuotaUser{values[kUser], number(kUsedKiB), number(kQuotaKiB)});
+  volume->maxQuota = std::max<uint64_t>(volume->maxQuota, number(kMaxQuota));
+  volume->maxUserUsed = std::max<uint64_t>(volume->maxUserUsed, number(kMaxUsed));
+  QuotaUserInsert(volume->users, QuotaUser{values[kUser], number(kUsedKiB), number(kQuotaKiB)});
+  // Of two profiles' users nobody knows how many more are the same.
+  volume->filteredUsers =
+      std::max<uint64_t>({volume->filteredUsers, number(kUsers), volume->users.size()});
   return 0;
 }
 

@@ -55,7 +55,9 @@ void fill_state(const VORNMountVolInfo& volume, VolumeUsageSample& sample) {
 // False, logged, when the volume has no identifier and is left out.
 bool volume_id(const VolumeUsageNode& node, VolumeId& id) {
   if (!node.fleet_name.empty()) {
-    return VornQazEscChar(node.fleet_name.c_str(), id.data(), id.size(), '\'') >= 0;
+    // One that is no longer mounted has none.
+    return !node.fleet_name.ends_with(':') &&
+           VornQazEscChar(node.fleet_name.c_str(), id.data(), id.size(), '\'') >= 0;
   }
   if (VornQazVolumeGetId(node.name.c_str(), id.data(), id.size()) >= 0) {
     return true;
@@ -156,18 +158,20 @@ void keep_for_fleet(const QAZLLNode* list) {
     }
     for (const VolumeUsageSample* sample = node.samples; sample != nullptr; sample = sample->next) {
       keep_fleet_row(report_format::kVolumeUsage.name,
-                     {node.name.c_str(), std::to_string(node.days), sample->sampleDate.c_str(),
+                     {node.path, std::to_string(node.days), sample->sampleDate.c_str(),
                       sample->sizeUse.c_str(), sample->sizeFree.c_str(), sample->percent.c_str()});
     }
   }
 }
 
-// Of two profiles of a server the newer run's rows. A volume's first is the current one.
+// Of each volume the rows of the newest run that tells of it, whichever profile's. A volume's first
+// is the current one.
 constexpr char kOverFleet[] =
     "select concat(server, ':', value[1]), value[2], value[3], value[4], value[5], value[6] "
-    "from report_row where {runs} and report = 'volume_usage' and (server, run) global in "
-    "(select server, max(run) from report_row where {runs} and report = 'volume_usage' "
-    "group by server) order by server, position";
+    "from report_row where {runs} and report = 'volume_usage' and (server, value[1], run) global "
+    "in "
+    "(select server, value[1], max(run) from report_row where {runs} and report = 'volume_usage' "
+    "group by server, value[1]) order by server, run desc, position";
 
 int add_fleet_sample(void* context, int columns, char** values, char** /*names*/) noexcept {
   enum Column { kVolume, kDays, kDate, kUsed, kFree, kPercent, kCount };
@@ -227,6 +231,7 @@ int32_t VolumeUsageAddVolume(const VORNMountVolInfo* volumeRecord, QAZLLNode** l
   }
   fill_state(*volumeRecord, *sample);
   node->name.format("%s", volumeRecord->path);
+  node->path = volumeRecord->path;
   node->samples = sample.get();
   if (QAZLLadd(list, node.get(), keep_order) < 0) {
     REPORT_LOG_ERR(kModule, __LINE__, "add list failed");

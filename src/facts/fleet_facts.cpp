@@ -3,11 +3,13 @@
 #include <algorithm>
 #include <map>
 #include <optional>
+#include <set>
 #include <tuple>
 #include <utility>
 
 #include "facts/amount.hpp"
 #include "facts/attention.hpp"
+#include "facts/growth_facts.hpp"
 #include "facts/tallies.hpp"
 #include "report_format/reports.hpp"
 
@@ -95,7 +97,10 @@ void merge(std::optional<std::vector<Record>>& list, std::string Record::*name,
 
 void name_causes(std::optional<std::vector<report_format::Cause>>& causes,
                  const std::string& server) {
-  for (report_format::Cause& cause : causes ? *causes : std::vector<report_format::Cause>{}) {
+  if (!causes) {
+    return;
+  }
+  for (report_format::Cause& cause : *causes) {
     if (!cause.share.empty()) {
       cause.share = fleet_name(server, cause.share);
     }
@@ -114,6 +119,7 @@ void name_parts(Facts& facts, const std::string& server) {
   if (facts.shares) {
     for (report_format::ShareFacts& share : *facts.shares) {
       name(share.name);
+      name(share.path);
       name(share.volume);
     }
   }
@@ -160,16 +166,70 @@ void add_ages(Facts& all, const Facts& facts) {
   }
 }
 
-// Of two profiles of one server that tell of one volume, the first stays.
-void drop_repeated_volumes(std::vector<report_format::VolumeFacts>& volumes) {
-  std::map<std::string, int> seen;
-  std::erase_if(volumes, [&](const auto& volume) { return ++seen[volume.path] > 1; });
+// What another profile of the server knows of a volume besides. `is_apart`: no share is in both.
+void add_to_volume(report_format::VolumeFacts& volume, report_format::VolumeFacts&& more,
+                   bool is_apart) {
+  if (more.explained && (is_apart || !volume.explained)) {
+    volume.explained = bounded_sum(volume.explained.value_or(0), *more.explained);
+    volume.outside = static_cast<int64_t>(volume.used) - *volume.explained;
+  }
+  if (!volume.grown_by) {
+    volume.grown_by = std::move(more.grown_by);
+  }
+  if (!more.filled_by) {
+    return;
+  }
+  auto& causes = volume.filled_by ? *volume.filled_by : volume.filled_by.emplace();
+  for (report_format::Cause& cause : *more.filled_by) {
+    const auto known = std::find_if(causes.begin(), causes.end(), [&](const auto& one) {
+      return std::tie(one.kind, one.share, one.name) ==
+             std::tie(cause.kind, cause.share, cause.name);
+    });
+    if (known == causes.end()) {
+      causes.push_back(std::move(cause));
+    } else if (is_apart) {
+      known->bytes = bounded_sum(known->bytes, cause.bytes);
+    }
+  }
+  std::stable_sort(causes.begin(), causes.end(),
+                   [](const auto& one, const auto& two) { return one.bytes > two.bytes; });
+  causes.resize(std::min(causes.size(), kMostCauses));
 }
+
+// The volumes of all servers, each once.
+class Volumes {
+ public:
+  void add(Facts& facts) {
+    bool is_apart = true;
+    if (facts.shares) {
+      for (const report_format::ShareFacts& share : *facts.shares) {
+        is_apart = shares_.insert(share.name).second && is_apart;
+      }
+    }
+    for (report_format::VolumeFacts& volume : facts.volumes) {
+      const auto [place, is_new] = places_.try_emplace(volume.path, list_.size());
+      if (is_new) {
+        list_.push_back(std::move(volume));
+      } else {
+        add_to_volume(list_[place->second], std::move(volume), is_apart);
+      }
+    }
+  }
+  std::vector<report_format::VolumeFacts> take() { return std::move(list_); }
+
+ private:
+  std::vector<report_format::VolumeFacts> list_;
+  std::map<std::string, size_t> places_;  // by path
+  std::set<std::string> shares_;          // of the servers so far
+};
 
 void bound_quotas(Facts& all, RunFacts& run) {
   if (!all.quotas) {
     return;
   }
+  std::set<std::pair<std::string, std::string>> told;
+  std::erase_if(*all.quotas,
+                [&](const auto& user) { return !told.emplace(user.volume, user.user).second; });
   std::stable_sort(all.quotas->begin(), all.quotas->end(), [](const auto& one, const auto& two) {
     return std::tie(one.level, one.percent) > std::tie(two.level, two.percent);
   });
@@ -218,9 +278,16 @@ void forget_unasked(Facts& facts, const FactsSource& source) {
   }
 }
 
+std::string volume_of(const report_format::Attention& entry) {
+  const auto* value = entry.find("volume");
+  const auto* volume = value != nullptr ? std::get_if<std::string>(value) : nullptr;
+  return volume != nullptr ? *volume : "";
+}
+
 // What only the servers themselves can tell: what grew, and the oldest file of all.
 void add_attention(Facts& all, const std::vector<FleetMember>& members, const FactsSource& source) {
   std::optional<report_format::Attention> oldest;
+  std::set<std::string> grown;  // volumes of which that is told
   const auto date_of = [](const report_format::Attention& entry) {
     const auto* date = entry.find("date");
     const auto* number = date != nullptr ? std::get_if<int64_t>(date) : nullptr;
@@ -229,7 +296,8 @@ void add_attention(Facts& all, const std::vector<FleetMember>& members, const Fa
   for (const FleetMember& member : members) {
     for (const report_format::Attention& entry : member.facts.attention) {
       if (entry.code.starts_with("volume_grew") && asks_for(source, report_format::kGrowth) &&
-          (asks_for(source, report_format::kFileOwner) || entry.code != "volume_grew_in_by")) {
+          (asks_for(source, report_format::kFileOwner) || entry.code != "volume_grew_in_by") &&
+          grown.insert(volume_of(entry)).second) {
         all.attention.push_back(entry);
       } else if (entry.code == "data_oldest" && asks_for(source, report_format::kLeastModify) &&
                  (!oldest || date_of(entry) < date_of(*oldest))) {
@@ -261,10 +329,11 @@ void take_over_incidents(const std::vector<FleetMember>& members) {
 
 Facts fleet_facts(std::vector<FleetMember> members, RunFacts& run, const FactsSource& source) {
   Facts all;
+  Volumes volumes;
   for (FleetMember& member : members) {
     Facts& facts = member.facts;
     name_parts(facts, member.server);
-    std::move(facts.volumes.begin(), facts.volumes.end(), std::back_inserter(all.volumes));
+    volumes.add(facts);
     append(all.shares, std::move(facts.shares));
     append(all.owners, std::move(facts.owners));
     append(all.types, std::move(facts.types));
@@ -281,8 +350,8 @@ Facts fleet_facts(std::vector<FleetMember> members, RunFacts& run, const FactsSo
   all.complete = std::none_of(run.incidents.begin(), run.incidents.end(), [](const auto& incident) {
     return incident.level == report_format::IncidentLevel::kError;
   });
+  all.volumes = volumes.take();
   forget_unasked(all, source);
-  drop_repeated_volumes(all.volumes);
   put_pressing_first(all.volumes);
   merge(all.owners, &report_format::OwnerFacts::name, &report_format::OwnerFacts::places);
   merge(all.types, &report_format::TypeFacts::type, &report_format::TypeFacts::shares);

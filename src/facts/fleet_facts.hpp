@@ -21,7 +21,8 @@ std::string fleet_name(const std::string& server, const std::string& name);
 // Records what the servers' reports lack, by server, for a report of the reports in `report_list`.
 void take_over_incidents(const std::vector<FleetMember>& members);
 
-// What is told of the lists is what `source.report_list` asks for and the servers' reports tell.
+// What is told of the lists is what `source.report_list` asks for and the servers' reports tell. Of
+// two members of one server the first one counts where both tell the same.
 report_format::Facts fleet_facts(std::vector<FleetMember> members, RunFacts& run,
                                  const FactsSource& source);
 

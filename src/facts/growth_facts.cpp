@@ -14,8 +14,6 @@ namespace {
 using report_format::Cause;
 using report_format::facts_text;
 
-constexpr size_t kMostCauses = 5;
-
 // --- The snapshot -------------------------------------------------------------------------------
 
 SnapshotPart part_of(const VolumeTally& tally, const RunFacts& run, bool has_owners,

@@ -30,7 +30,11 @@ struct VolumeGrowth {
 // holds what is mounted below it.
 std::optional<VolumeGrowth> growth_on(const Growth& growth, const std::string& volume);
 
-// The shares and owners that take the most on the volume, at most 5; owners only of `names`.
+// What is told of a volume: so much of what fills it, and of what grew.
+inline constexpr size_t kMostCauses = 5;
+
+// The shares and owners that take the most on the volume, the greatest first; owners only of
+// `names`.
 std::vector<report_format::Cause> filled_by(const Tallies& tallies,
                                             const std::map<unsigned, std::string>* names,
                                             const std::string& volume);

@@ -1,8 +1,10 @@
 #include "fleet_action.hpp"
 
+#include <algorithm>
 #include <csignal>
 #include <cstdlib>
 #include <ctime>
+#include <map>
 #include <optional>
 #include <set>
 #include <string_view>
@@ -68,11 +70,12 @@ std::set<std::string, std::less<>> words_of(std::string_view list) {
   return words;
 }
 
-// The newest complete ones of the servers asked for; none, after a complaint, when one has none.
+// The newest complete ones of the servers asked for, by server, the newest first; none, after a
+// complaint, when one has none.
 std::vector<Run> choose_runs(VORNFleet* fleet, const std::string& servers) {
   constexpr char kNewest[] =
       "select server, profile, toString(max(run)), argMax(started, run), argMax(since_last, run) "
-      "from run group by server, profile order by server, profile";
+      "from run group by server, profile order by server, max(run) desc, profile";
   std::vector<Run> runs;
   if (VORNFleetSelect(fleet, kNewest, add_run, &runs) < 0) {
     complain(VORNFleetProblem(fleet));
@@ -110,33 +113,38 @@ std::string condition_of(const std::vector<Run>& runs) {
   return condition + ")";
 }
 
-int take_text(void* context, int columns, char** values, char** /*names*/) noexcept {
-  if (columns != 1 || values[0] == nullptr) {
+using FactsOfRuns = std::map<std::pair<std::string, std::string>, report_format::Facts>;
+
+int add_facts(void* context, int columns, char** values, char** /*names*/) noexcept {
+  if (columns != 3 ||
+      std::any_of(values, values + columns, [](const char* value) { return value == nullptr; })) {
     return -1;
   }
-  *static_cast<std::string*>(context) = values[0];
+  if (auto facts = report_format::facts_of(values[2])) {
+    (*static_cast<FactsOfRuns*>(context))[{values[0], values[1]}] = std::move(*facts);
+  }
   return 0;
 }
 
-// What each run has found out; a run whose facts can't be understood fails the report.
+// What each run has found out, in their order; a run whose facts can't be understood fails the
+// report.
 std::optional<std::vector<FleetMember>> read_members(VORNFleet* fleet,
                                                      const std::vector<Run>& runs) {
+  FactsOfRuns found;
+  const std::string sql = "select server, profile, report from run where " + condition_of(runs);
+  if (VORNFleetSelect(fleet, sql.c_str(), add_facts, &found) < 0) {
+    complain(VORNFleetProblem(fleet));
+    return std::nullopt;
+  }
   std::vector<FleetMember> members;
   for (const Run& run : runs) {
-    std::string text;
-    const std::string sql =
-        "select report from run where (server, profile, run) = " + key_of(run) + " limit 1";
-    if (VORNFleetSelect(fleet, sql.c_str(), take_text, &text) < 0) {
-      complain(VORNFleetProblem(fleet));
-      return std::nullopt;
-    }
-    auto facts = report_format::facts_of(text);
+    auto facts = found.extract({run.server, run.profile});
     if (!facts) {
       complain("the facts of server " + run.server + " can't be understood; run its profile " +
                run.profile + " again, or vornctl fleet forget it");
       return std::nullopt;
     }
-    members.push_back({run.server, std::move(*facts)});
+    members.push_back({run.server, std::move(facts.mapped())});
   }
   return members;
 }
