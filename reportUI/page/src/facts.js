@@ -73,7 +73,7 @@ export function readReports(json) {
 }
 
 // The facts by their keys, with `reports` as a Map by name and samples as {date, used}; undefined
-// when they are missing or broken.
+// when they are missing or broken. `isFleet`: they are of more servers, see pathOf() in sections.js.
 export function readFacts(pieces) {
   const json = readJson(pieces, VARIABLE);
   if (json?.format !== FORMAT) {
@@ -82,5 +82,8 @@ export function readFacts(pieces) {
   const facts = readFields(json);
   withDates([...facts.volumes, ...facts.shares ?? []]);
   facts.reports = new Map(facts.reports.map(report => [report.name, report]));
+  // A server's volumes are paths; with others' beside them each begins with its server's name.
+  facts.isFleet = [...facts.volumes.map(({path}) => path), ...facts.shares?.map(({volume}) => volume) ?? []]
+    .some(path => path && !path.startsWith('/'));
   return facts;
 }

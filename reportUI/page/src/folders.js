@@ -173,7 +173,7 @@ class Treemap {
       button.addEventListener('click', () => this.go(way.slice(0, i + 1), true));
       return [button, ' › '];
     }), ' ', h('span', {class: 'amount'}, last.bytes === undefined ? '' : format.size(last.bytes)),
-    ...last.path ? [copyButton(last.path), ...location.protocol === 'file:' ? [
+    ...last.path ? [copyButton(last.path), ...location.protocol === 'file:' && last.path.startsWith('/') ? [
       h('a', {class: 'go', href: fileAddress(last.path)}, format.say('openFolder'))] : []] : []);
     this.chosen.textContent = format.say('treemapHelp');
     if (this.width) {

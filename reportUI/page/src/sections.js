@@ -32,6 +32,11 @@ const FILES = [['file', 'path'], ['size', 'size', {bar: true, sum: true}], ['cha
                ['share', 'text', {low: true}]];
 
 const rowsOf = ({tables}) => [...tables.values()].flat();
+// Where a file of a share lies. In a report over many servers this begins with its server's name, as
+// the share's does: a path may be on each of them.
+const pathOf = (share, file, facts) => facts?.isFleet ? share.slice(0, share.indexOf(':') + 1) + file : file;
+const filesOf = (data, facts) => rowsOf(data).map(
+  ([share, file, ...others]) => [share, pathOf(share, file, facts), ...others]);
 const pick = (rows, ...order) => rows.map(row => order.map(index => row[index]));
 
 const bySize = (rows, index) => rows.toSorted(
@@ -39,11 +44,11 @@ const bySize = (rows, index) => rows.toSorted(
 
 // The groups of duplicates: {number, size, files, frees}, `files` a Map of path to time. A file that
 // two shares hold in common is one file.
-function groupsOf(rows) {
+function groupsOf(rows, facts) {
   const groups = new Map();
-  for (const [number, , file, size, time] of rows) {
+  for (const [number, share, file, size, time] of rows) {
     const group = groups.get(number) ?? {number, size, files: new Map()};
-    group.files.set(file, time);
+    group.files.set(pathOf(share, file, facts), time);
     groups.set(number, group);
   }
   return [...groups.values()].map(group => ({
@@ -56,8 +61,8 @@ const copiesOf = files => h('ul', {class: 'copies'}, ...[...files].map(([file, t
   h('span', {class: 'soft'}, format.time(time)))));
 
 // A row for each group, which opens to its files.
-function duplicates({tables, heading, csv, beyond}) {
-  const groups = groupsOf([...tables.values()].flat()).sort((one, two) => two.frees > one.frees ? 1 :
+function duplicates({tables, heading, csv, beyond}, facts) {
+  const groups = groupsOf([...tables.values()].flat(), facts).sort((one, two) => two.frees > one.frees ? 1 :
     two.frees < one.frees ? -1 : 0);
   const named = new Map(groups.map(group => [group.number, group]));
   const rows = groups.map(({number, files, size, frees}) => {
@@ -170,18 +175,18 @@ export const REPORTS = {
   duplicate_file: {
     cut: 'firstGroups',
     mode: 'vornDuplicateHashMatch',
-    show: data => duplicates(data)
+    show: duplicates
   },
   large_file: {
-    show: data => filesTable('large_file', [...FILES.slice(0, 2), FILES[3]], pick(rowsOf(data), 1, 2, 0),
+    show: (data, facts) => filesTable('large_file', [...FILES.slice(0, 2), FILES[3]], pick(filesOf(data, facts), 1, 2, 0),
                              data, 1)
   },
   least_modify: {
     // The large ones first: they are worth a look.
-    show: data => filesTable('least_modify', FILES, bySize(pick(rowsOf(data), 1, 2, 3, 0), 1), data, 1)
+    show: (data, facts) => filesTable('least_modify', FILES, bySize(pick(filesOf(data, facts), 1, 2, 3, 0), 1), data, 1)
   },
   most_modify: {
-    show: data => filesTable('most_modify', FILES, pick(rowsOf(data), 1, 2, 3, 0), data)
+    show: (data, facts) => filesTable('most_modify', FILES, pick(filesOf(data, facts), 1, 2, 3, 0), data)
   },
   coverage: {
     show: (data, facts) => [
