@@ -261,7 +261,14 @@ class Engine::Transfer {
     if (code == CURLE_OK) {
       return "its answer ends within a row";
     }
-    return error_[0] != '\0' ? static_cast<const char*>(error_) : curl_easy_strerror(code);
+    std::string text =
+        error_[0] != '\0' ? static_cast<const char*>(error_) : curl_easy_strerror(code);
+    if (code == CURLE_PEER_FAILED_VERIFICATION) {
+      text +=
+          "; let it have a certificate for that name from an authority that this server trusts "
+          "(update-ca-certificates adds one)";
+    }
+    return text;
   }
 
   // The address is what counts, whatever name led to it.
