@@ -1,12 +1,13 @@
 #!/usr/bin/python3
 """Measures a fleet on two engines on this machine (as root: packages clickhouse-server, -client).
 
-    bench/fleet.py FOLDER [--ship FILES] [--rows N] [--servers N] [--build DIR]
+    bench/fleet.py FOLDER [--ship FILES] [--rows N] [--servers N,...] [--build DIR]
 
     ship    a run over a tree of FILES files, without a fleet and with one: what the sending costs,
             and the peak memory of both
     report  N rows of as many servers as --servers, on two shards: bytes a row on disk, and the time
-            of each of the reports over the fleet and of all nine
+            of each of the reports over the fleet and of all nine. With several numbers of servers
+            they are made one after another
 """
 import argparse
 import os
@@ -77,10 +78,10 @@ def ctl(made, *arguments):
     return done.stdout
 
 
-def fill(options, shards):
+def fill(options, servers, shards):
     """Rows as a walk has them: paths in folders, sizes of all kinds, one file in five a duplicate."""
-    rows = options.rows // options.servers
-    for server in range(options.servers):
+    rows = options.rows // servers
+    for server in range(servers):
         for first in range(0, rows, BATCH):
             count = min(BATCH, rows - first)
             random = f'cityHash64(n, {server}, %d)'
@@ -102,22 +103,24 @@ def fill(options, shards):
         now = int(time.time())
         facts = '{"format": 1, "shares": [' + ', '.join(
             f'{{"name": "share{i}", "path": "/srv/share{i}"}}' for i in range(8)) + ']}'
-        for i in range(8):
-            shards.ask(f"""insert into report_row values ('server{server}', 'weekly',
-                {10 ** 15 + server}, 'share', {i}, ['share{i}', '/srv/share{i}', '/srv'])""")
+        shards.ask('insert into report_row values ' + ', '.join(
+            f"('server{server}', 'weekly', {10 ** 15 + server}, 'share', {i}, "
+            f"['share{i}', '/srv/share{i}', '/srv'])" for i in range(8)))
         shards.ask(f"""insert into run values ('server{server}', 'weekly', {10 ** 15 + server}, {now},
             {now}, {rows}, 0, 0, '{facts}')""")
 
 
-def report(options, shards):
+def report(options, servers, shards):
     made = machine(options)
+    for engine in shards.engines:
+        engine.ask('drop database if exists vornreport')
     ctl(made, 'fleet', 'set', '--url', shards.urls, '--cluster', 'shards')
     ctl(made, 'fleet', 'init')
-    fill(options, shards)
+    fill(options, servers, shards)
     on_disk = [engine.ask("select sum(bytes_on_disk), sum(rows) from system.parts where active and "
                           "table = 'file_part'").split() for engine in shards.engines]
     size, rows = (sum(int(one[i]) for one in on_disk) for i in (0, 1))
-    print(f"{rows} rows on {len(shards.engines)} shards ({', '.join(one[1] for one in on_disk)}): "
+    print(f"{rows} rows of {servers} servers on {len(shards.engines)} shards ({', '.join(one[1] for one in on_disk)}): "
           f"{size / rows:.0f} bytes a row")
     for names in (*((name,) for name in NINE), NINE):
         seconds = []
@@ -139,8 +142,8 @@ class Bench(unittest.TestCase):
         shards = Shards(self)
         if self.options.ship:
             ship(self.options, shards)
-        if self.options.rows:
-            report(self.options, shards)
+        for servers in self.options.servers.split(',') if self.options.rows else ():
+            report(self.options, int(servers), shards)
 
 
 if __name__ == '__main__':
@@ -148,7 +151,7 @@ if __name__ == '__main__':
     parser.add_argument('folder', type=Path)
     parser.add_argument('--ship', type=int, default=1_000_000)
     parser.add_argument('--rows', type=int, default=10_000_000)
-    parser.add_argument('--servers', type=int, default=10)
+    parser.add_argument('--servers', default='10')
     parser.add_argument('--rounds', type=int, default=3)
     parser.add_argument('--build', type=Path, default=ROOT / 'build')
     Bench.options = parser.parse_args()

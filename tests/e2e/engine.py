@@ -1,8 +1,10 @@
 """Real engines of a fleet on loopback: each is a server of its own with folders of its own, and all
 of them are the shards of the cluster "shards"."""
+import asyncio
 import socket
 import subprocess
 import tempfile
+import threading
 import time
 import urllib.error
 import urllib.parse
@@ -78,6 +80,39 @@ class Engine:
             self.process.kill()
             self.process.wait()
             self.process = None
+
+
+class Relay:
+    """A way to an engine, with TLS where `tls` is a context for it: each connection waits `delay`
+    seconds for its first answer, and the first one ends after `cut` bytes of what is sent."""
+
+    def __init__(self, test, engine, tls=None, delay=0, cut=None):
+        self.engine, self.delay, self.cut = engine, delay, cut
+        loop = asyncio.new_event_loop()
+        server = loop.run_until_complete(asyncio.start_server(self.pass_on, '127.0.0.1', 0, ssl=tls))
+        self.port = server.sockets[0].getsockname()[1]
+        thread = threading.Thread(target=loop.run_forever)
+        thread.start()
+        for end in (loop.close, server.close, thread.join):
+            test.addCleanup(end)
+        test.addCleanup(loop.call_soon_threadsafe, loop.stop)
+
+    async def pass_on(self, reader, writer):
+        there, back = await asyncio.open_connection('127.0.0.1', self.engine.http)
+        cut, self.cut = self.cut, None
+
+        async def copy(source, target, delay=0, most=1 << 40):
+            while data := await source.read(min(most, 1 << 16)):
+                await asyncio.sleep(delay)
+                target.write(data)
+                await target.drain()
+                delay, most = 0, most - len(data)
+        ways = [asyncio.ensure_future(way) for way in (copy(reader, back, 0, cut or 1 << 40),
+                                                       copy(there, writer, self.delay))]
+        await asyncio.wait(ways, return_when=asyncio.FIRST_COMPLETED)
+        writer.close()
+        back.close()
+        await asyncio.gather(*ways, return_exceptions=True)
 
 
 class Shards:

@@ -4,13 +4,15 @@ import os
 import re
 import signal
 import socket
+import ssl
 import subprocess
 import time
 import unittest
 
-from engine import PASSWORD, Shards
+from engine import PASSWORD, Relay, Shards
 from expected import DAY, Tree, csv, facts, local_time, totals
-from harness import ALL, ROOT, ProductTest, make_files, needs_root, private_mounts
+from harness import (ALL, BUILD, ROOT, MailServer, ProductTest, call, make_files, needs_root,
+                     private_mounts)
 
 ACCOUNTS = {'root': 0, 'ann': 3001, 'bob': 3002}
 
@@ -170,6 +172,20 @@ class Fleet(ProductTest):
         self.assertEqual(facts(only)['owners'], None)
         self.assertIn('no complete run of server nobody', self.ctl(
             first, 'fleet', 'report', first.base / 'fleet', '--servers', 'nobody', status=1).err)
+        # A server whose runs stay out; and what people see of all that.
+        self.shards.ask("insert into run (server, profile, run, started, report) values "
+                        "('left', 'daily', 1, 1, '{\"format\": 1}')")
+        page = self.report(first, status=3)
+        self.assertEqual([(entry['kind'], entry['what']) for entry in facts(page)['incidents']],
+                         [('server_overdue', 'left (daily)')])
+        done = subprocess.run(
+            ['node', ROOT / 'tests/page/fleet.mjs'], stdout=subprocess.PIPE, stderr=subprocess.STDOUT,
+            text=True, env=os.environ | {
+                'VORN_PAGES': str(page.parent), 'VORN_FLEET': page.name,
+                'VORN_FORMAT': str(BUILD / 'report_format.json'),
+                'VORN_NODE_MODULES': str(BUILD / 'reportUI/page/node_modules')})
+        self.assertEqual(done.returncode, 0, done.stdout)
+        self.ctl(first, 'fleet', 'forget', 'left')
         # A server that goes.
         self.ctl(first, 'fleet', 'forget', 'b-2')
         self.assertEqual(self.shards.ask("select count() from file where server = 'b-2'"), '0\n')
@@ -177,6 +193,46 @@ class Fleet(ProductTest):
         self.assertEqual([(run['server'], run['files']) for run in listed],
                          [(name, len(servers[name][1].files)) for name in ('alpha', 'c.example')])
 
+    @needs_root
+    def test_two_profiles_of_a_server_are_one_server(self):
+        m = self.server('two', share_list='photos', limit_user='root,ann')
+        m.profile('other', report_list=ALL, fleet='true', share_list='backup', limit_user='ann,bob')
+        tree = self.fill(m)
+        tree.add('photos', 'real', b'x' * 9000)
+        tree.add('backup', 'real', b'x' * 5000)
+        volume = '/tmp/quotas-on-a-volume-with-a-long-name'
+        m.share('quotas', volume, inside=True)
+        tool = m.base / 'repquota'
+        own = []
+        for profile, used in (('daily', 8), ('other', 9)):
+            tool.write_text(f"#!/bin/sh\n[ $1 = {volume} ] || exit 1\ncat <<'END'\n*** Report\nUser used\n"
+                            '-----\n' + ''.join(f'{user} -- {kib} 9 0 0 0 0 0\n' for user, kib in (
+                                ('root', 3), ('ann', used), ('bob', 5))) + 'END\n')
+            tool.chmod(0o755)
+            if not own:
+                m.options += ['--tmpfs', 4 << 20, volume, '--bind', tool,
+                              os.path.realpath('/sbin/repquota')]
+                self.ctl(m, 'fleet', 'init')
+            m.run('--report', profile)
+            own.append(facts(m.report_folders(profile)[-1]))
+        made = self.report(m)
+        told = facts(made)
+        self.assertEqual(sorted(volume['path'] for volume in told['volumes']),
+                         sorted('two:' + volume['path'] for volume in own[0]['volumes']))
+        held = next(volume for volume in told['volumes'] if volume['explained'])
+        self.assertEqual(held['explained'], sum(
+            volume['explained'] for facts_ in own for volume in facts_['volumes']))
+        self.assertEqual({cause['share'] for cause in held['filled_by'] if cause['kind'] == 'share'},
+                         {'two:photos', 'two:backup'})
+        # Of a user whom both tell of the newer one counts.
+        users = {'root': 3, 'ann': 9, 'bob': 5}
+        self.assertEqual({user['user']: user['used'] >> 10 for user in told['quotas']}, users)
+        page = (made / 'report.html').read_text()
+        rows = re.findall(r"^\['(\w+)', 9216, (\d+),", page.split('vornQuotaUsageTable = ')[1],
+                          re.MULTILINE)
+        self.assertEqual({user: int(used) >> 10 for user, used in rows}, users)
+        self.assertEqual(len(rows), len(users))
+        self.assertIn(f"\n[ 'two:{volume}', ", page)
     @needs_root
     def test_only_complete_runs_are_seen_and_the_newest_counts(self):
         m = self.server('seen')
@@ -248,6 +304,75 @@ class Fleet(ProductTest):
         secret.write_text(PASSWORD + '\n')
         self.ctl(m, 'fleet', 'set', '--user', 'careful', '--password-file', '/usr/vorn/etc/secret')
         self.send(m)
+
+    @needs_root
+    def test_an_engine_in_trouble_half_way(self):
+        m = self.server('half')
+        files = len(self.fill(m).files)
+        self.ctl(m, 'fleet', 'init')
+        good = (m.vorn / 'etc/fleet.conf').read_text()
+        for ways in ({'cut': 900}, {'delay': 2}):
+            relay = Relay(self, self.shards.engines[0], **ways)
+            (m.vorn / 'etc/fleet.conf').write_text(re.sub(
+                'url = .*', f'url = http://127.0.0.1:{relay.port}/', good))
+            self.send(m)
+            self.assertEqual(self.shards.ask('select count() from file where run global in '
+                                             '(select max(run) from run)'), f'{files}\n', ways)
+        (m.vorn / 'etc/fleet.conf').write_text(good)
+        # Gone while the page is made: there again in time for the run's line, or not. What the
+        # page can't tell any more, others do.
+        mails = MailServer(self, m.base / 'mails')
+        text = m.config.read_text()
+        for comes_back, mail in ((True, False), (False, False), (False, True)):
+            with self.subTest(comes_back=comes_back, mail=mail):
+                m.config.write_text(text + (
+                    f'mail_to = a@b.example\nsmtp_url = smtp://127.0.0.1:{mails.port}\n' * mail))
+                before = self.shards.ask('select max(run) from run')
+                m.stop_at('body 2')
+                run = m.start('--report', 'daily')
+                m.stopped_pid()
+                for engine in self.shards.engines:
+                    engine.stop()
+                    if comes_back:
+                        engine.start()
+                m.go_on()
+                run.finish()
+                for engine in self.shards.engines:
+                    if not comes_back:
+                        engine.start()
+                self.assertEqual((run.status, m.status('daily')), (0, 'success'), run.err)
+                self.assertEqual(facts(m.report_folders('daily')[-1])['incidents'], [])
+                for told in (mails.mails()[-1].get_body(('plain',)).get_content() if mail else run.err,
+                             self.ctl(m, 'status', 'daily').out):
+                    self.assertEqual('missing from the fleet' in told, not comes_back, told)
+                self.assertEqual('vornreport: ' in run.err, not comes_back and not mail, run.err)
+                self.assertEqual(self.shards.ask('select max(run) from run') > before, comes_back)
+
+    @needs_root
+    def test_the_way_is_verified(self):
+        m = self.server('far')
+        self.fill(m)
+        key, ca = m.base / 'key', m.base / 'ca'
+        call('openssl', 'req', '-x509', '-newkey', 'ec', '-pkeyopt', 'ec_paramgen_curve:P-256', '-nodes',
+             '-subj', '/CN=engine', '-addext', 'subjectAltName=DNS:localhost', '-keyout', key, '-out', ca)
+        context = ssl.create_default_context(ssl.Purpose.CLIENT_AUTH)
+        context.load_cert_chain(ca, key)
+        port = Relay(self, self.shards.engines[0], tls=context).port
+        trust = ['--bind', ca, '/etc/ssl/certs/ca-certificates.crt']
+        before, known = (m.vorn / 'etc/fleet.conf').read_text(), m.options
+        for host, options, words in (('localhost', [], 'self-signed certificate'),
+                                     ('127.0.0.1', trust, 'subject name'), ('localhost', trust, '')):
+            with self.subTest(host, words=words):
+                m.options = known + options
+                done = self.ctl(m, 'fleet', 'set', '--url', f'https://{host}:{port}/',
+                                '--cluster', '', status=1 if words else 0)
+                self.assertIn(words, done.err)
+                self.assertEqual((m.vorn / 'etc/fleet.conf').read_text() == before, bool(words))
+                if words:
+                    self.assertRegex(done.err, r'^vornctl: [^\n]*update-ca-certificates[^\n]*\n$')
+        self.ctl(m, 'fleet', 'init')
+        self.send(m)
+        self.report(m)
 
     @needs_root
     def test_a_shard_that_is_down_or_full(self):
