@@ -7,7 +7,7 @@
             and the peak memory of both
     report  N rows of as many servers as --servers, on two shards: bytes a row on disk, and the time
             of each of the reports over the fleet and of all nine. With several numbers of servers
-            they are made one after another
+            that is done for each; every server has 8 shares
 """
 import argparse
 import os
