@@ -1,7 +1,5 @@
 #include "vornreport/statements_ahead.hpp"
 
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
@@ -29,18 +27,11 @@ namespace {
 // them a machine of many cores would need more than a small one has.
 constexpr size_t kThreads = 2;
 // The longest statement is what all others end up waiting for: SQLite sorts a run of its rows on a
-// further thread while it collects the next. That takes half as much memory again, so it is for
-// databases whose sorts need little.
+// further thread while it collects the next.
 constexpr char kSortBeside[] = "PRAGMA threads=1;";
-constexpr off_t kLargestSortedBeside = off_t{512} << 20;
-
-bool is_sorted_beside(const char* path) {
-  struct stat status {};
-  return stat(path, &status) == 0 && status.st_size <= kLargestSortedBeside;
-}
 // Bytes of rows that are handed over at once. A statement ahead holds two such batches at most,
 // then it waits; large enough for the ten thousand rows of most reports.
-constexpr size_t kBatchBytes = size_t{768} * 1024;
+constexpr size_t kBatchBytes = size_t{512} * 1024;
 
 // Rows, one after another. Of malloc, since on a thread `new` must not come to the handler that
 // ends a run without memory.
@@ -276,7 +267,7 @@ void StatementsAhead::Work::run(Statement& statement) {
   if (is_open) {
     constexpr int kStepsBetweenLooks = 10'000;
     sqlite3_progress_handler(db.get(), kStepsBetweenLooks, stop_when_dropped, &statement);
-    if (&statement == longest_ && is_sorted_beside(path_.c_str())) {
+    if (&statement == longest_) {
       // Whether it takes effect or not, the rows are the same.
       static_cast<void>(sqlite3_exec(db.get(), kSortBeside, nullptr, nullptr, nullptr));
     }

@@ -294,12 +294,15 @@ SqliteHandle VORNReportDBInit(const VLIBCSzHash* profile_hash) {
 }
 
 SqliteHandle open_further(const char* path) {
+  // Statements pass the rows once, so pages that were read are of no use; memory is for sorting.
+  constexpr char kFewPages[] = "PRAGMA cache_size=-256;";
   sqlite3* raw = nullptr;
   // Writable, to roll back what a failed transaction has left; but it makes no file.
   const int opened = sqlite3_open_v2(path, &raw, SQLITE_OPEN_READWRITE, nullptr);
   SqliteHandle db(raw);
   if (opened != SQLITE_OK || sqlite3_busy_timeout(raw, kLockWaitMs) != SQLITE_OK ||
       define_sum(raw) != SQLITE_OK ||
+      sqlite3_exec(raw, kFewPages, nullptr, nullptr, nullptr) != SQLITE_OK ||
       sqlite3_exec(raw, kCreateTable, nullptr, nullptr, nullptr) != SQLITE_OK) {
     return nullptr;
   }

@@ -86,15 +86,24 @@ class WaitingBuckets {
     work_ = 0;
   }
 
-  // One by one in their order. 0, or -1 (logged) when one's samples could not be read.
+  // In their order. 0, or -1 (logged) when one's samples could not be read.
   int handle(const VLIBCSzHash* profile_hash, QAZLLNode** groups) {
     int result = 0;
     if (!buckets_.empty() && !past_compare_limit(buckets_.front().file_size())) {
       if (g_readers && work_ >= kWorthThreads) {
         read_ahead(*g_readers);
       }
-      for (; !buckets_.empty(); buckets_.pop_front()) {
-        result = std::min(result, handle(profile_hash, groups, buckets_.front()));
+      for (Bucket& bucket : buckets_) {
+        result = std::min(result, find_groups(groups, bucket));
+      }
+      if (*groups != nullptr) {
+        count_groups(*groups);
+        write_data_groups(*groups, kMostDataGroups, GroupsAre::kContinued);
+        write_csv_groups(profile_hash, *groups, GroupsAre::kContinued);
+      }
+      for (Bucket& bucket : buckets_) {
+        count_unread(bucket);
+        bucket.release(groups);
       }
     }
     clear();
@@ -126,22 +135,13 @@ class WaitingBuckets {
     readers.for_each(Readers::Kind::kDigests, files.size(), before_deadline(&compute_digest_ahead));
   }
 
-  static int handle(const VLIBCSzHash* profile_hash, QAZLLNode** groups, Bucket& bucket) {
-    int result = 0;
+  static int find_groups(QAZLLNode** groups, Bucket& bucket) {
     if (bucket.read_samples() < 0) {
       REPORT_LOG_ERR_NESTED(kDuplicateModule, __LINE__, "fast digest list failed");
-      result = -1;
-    } else {
-      bucket.find_groups(groups);
-      if (*groups != nullptr) {
-        count_groups(*groups);
-        write_data_groups(*groups, kMostDataGroups, GroupsAre::kContinued);
-        write_csv_groups(profile_hash, *groups, GroupsAre::kContinued);
-      }
+      return -1;
     }
-    count_unread(bucket);
-    bucket.release(groups);
-    return result;
+    bucket.find_groups(groups);
+    return 0;
   }
 
   std::deque<Bucket> buckets_;

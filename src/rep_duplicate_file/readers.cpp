@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <ctime>
 #include <system_error>
 
 #include "signals_blocked.hpp"
@@ -10,8 +11,9 @@
 namespace vornreport {
 namespace {
 
-constexpr std::chrono::milliseconds kStretch{100};  // of the search for the number of threads
-constexpr std::chrono::milliseconds kShortestWait{10};
+// Of the search for the number of threads, where they wait for a disk, and where they hardly do.
+constexpr std::chrono::milliseconds kStretch{100};
+constexpr std::chrono::milliseconds kBusyStretch{20};
 constexpr size_t kSamplePortion = 16;  // of which each takes microseconds
 
 thread_local Readers* t_readers = nullptr;  // that this thread belongs to
@@ -19,6 +21,13 @@ thread_local Readers* t_readers = nullptr;  // that this thread belongs to
 // Digests are a matter of processors as well as of the disk, and each has a buffer of a MiB.
 unsigned most_digests() {
   return std::clamp(std::thread::hardware_concurrency(), 1U, Readers::kMost);
+}
+
+// That the process has used.
+std::chrono::nanoseconds cpu_time() {
+  struct timespec time {};
+  clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &time);
+  return std::chrono::seconds(time.tv_sec) + std::chrono::nanoseconds(time.tv_nsec);
 }
 
 }  // namespace
@@ -52,6 +61,7 @@ void Readers::for_each(Kind kind, size_t count, const std::function<void(size_t)
   portion_ = kind == Kind::kSamples ? kSamplePortion : 1;
   bytes_done_ = 0;
   mark_ = Clock::now();
+  cpu_mark_ = cpu_time();
   start_threads();
   if (threads_.empty()) {
     next_ = count;
@@ -60,8 +70,7 @@ void Readers::for_each(Kind kind, size_t count, const std::function<void(size_t)
     }
   }
   const auto is_done = [this] { return next_ == count_ && active_ == 0 && paused_ == 0; };
-  while (!done_.wait_for(lock, std::max<Clock::duration>(kStretch - pace_->time, kShortestWait),
-                         is_done)) {
+  while (!done_.wait_for(lock, kBusyStretch, is_done)) {
     measure();
     start_threads();
   }
@@ -142,16 +151,20 @@ void Readers::pause_if_too_many(uint64_t bytes) {
 // Adds what was done since the mark to the stretch, unless others than the wanted number did it.
 void Readers::measure() {
   const Clock::time_point now = Clock::now();
+  const Clock::duration cpu = cpu_time();
   if (active_ == wanted()) {
     pace_->time += now - mark_;
+    pace_->cpu += cpu - cpu_mark_;
     pace_->done += bytes_done_;
   }
   mark_ = now;
+  cpu_mark_ = cpu;
   bytes_done_ = 0;
-  if (pace_->time >= kStretch) {
+  const bool is_busy = pace_->cpu * 5 >= pace_->time * wanted() * 4;
+  if (pace_->time >= (is_busy ? kBusyStretch : kStretch)) {
     const std::chrono::duration<double> seconds = pace_->time;
     pace_->threads.end_stretch(static_cast<double>(pace_->done) / seconds.count(), false);
-    pace_->time = {};
+    pace_->time = pace_->cpu = {};
     pace_->done = 0;
   }
 }

@@ -5,7 +5,8 @@
 //   tally.
 // - How many work is found by trying (thread_count.hpp), beginning with one, so that a head that
 //   must seek has one reader. One too many stops between two parts of a file, not only at its end:
-//   a trial with two huge files would else last as long as they do.
+//   a trial with two huge files would else last as long as they do. Trials are short where threads
+//   wait for nothing: what lies in the cache is read before long ones end.
 // - Threads take no signals, and the handler of SIGTERM needs no lock of theirs.
 #pragma once
 
@@ -50,6 +51,7 @@ class Readers {
     ThreadCount threads;
     uint64_t done = 0;  // bytes
     Clock::duration time{};
+    Clock::duration cpu{};  // of all processors together
   };
 
   static void step(unsigned long long bytes);
@@ -76,6 +78,7 @@ class Readers {
   bool is_stopping_ = false;
   uint64_t bytes_done_ = 0;  // since the mark
   Clock::time_point mark_;
+  Clock::duration cpu_mark_{};  // of the process
 };
 
 }  // namespace vornreport

@@ -12,13 +12,13 @@
 namespace host {
 namespace {
 
-// Size classes: 16 of 64 bytes' step up to 1 KiB, then four for each doubling up to 16 KiB.
-// A page of SQLite's cache (4 KiB and its header) falls into the class of 5 KiB.
+// Size classes: 16 of 64 bytes' step up to 1 KiB, then four for each doubling up to 4 KiB. Pages of
+// the statistics database are larger: a sort that merges has hundreds, which it should give back.
 constexpr unsigned kSmallStepBits = 6;
 constexpr unsigned kSmallLimit = 1024;
 constexpr unsigned kSmallClasses = kSmallLimit >> kSmallStepBits;
-constexpr unsigned kPooledLimit = 16 * 1024;
-constexpr unsigned kClassCount = kSmallClasses + 4 * 4;
+constexpr unsigned kPooledLimit = 4 * 1024;
+constexpr unsigned kClassCount = kSmallClasses + 4 * 2;
 constexpr std::size_t kSlabSize = std::size_t{128} * 1024;
 
 // A free block holds the link where a used one holds the caller's bytes.
@@ -99,7 +99,7 @@ constexpr unsigned class_size(unsigned index) {
   return (above % 4 + 5) << (above / 4 + 8);
 }
 static_assert(class_size(class_of(1)) == 64 && class_size(class_of(1024)) == 1024);
-static_assert(class_size(class_of(1025)) == 1280 && class_size(class_of(4360)) == 5120);
+static_assert(class_size(class_of(1025)) == 1280 && class_size(class_of(3600)) == 4096);
 static_assert(class_of(kPooledLimit) == kClassCount - 1);
 static_assert(class_size(kClassCount - 1) == kPooledLimit);
 
