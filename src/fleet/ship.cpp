@@ -7,6 +7,7 @@
 #include <array>
 #include <charconv>
 #include <chrono>
+#include <deque>
 #include <functional>
 #include <limits>
 #include <optional>
@@ -35,6 +36,8 @@ namespace {
 
 constexpr char kModule[] = "src/fleet";
 constexpr size_t kRowsOfBatch = 100'000;
+// What an engine on this machine's two cores reads at once beside what is sent.
+constexpr size_t kBatchesBeside = 2;
 constexpr int kAttempts = 2;
 
 using report_format::append_fleet_text;
@@ -49,10 +52,9 @@ std::optional<Sent> g_sent;
 
 // The number under which one attempt's rows stand; see report_format/fleet.hpp.
 uint64_t new_run_number() {
-  const auto now = std::chrono::duration_cast<std::chrono::microseconds>(
-      std::chrono::system_clock::now().time_since_epoch());
-  return static_cast<uint64_t>(run_facts().started) * report_format::kRunsInSecond +
-         static_cast<uint64_t>(now.count()) % report_format::kRunsInSecond;
+  return static_cast<uint64_t>(std::chrono::duration_cast<std::chrono::microseconds>(
+                                   std::chrono::system_clock::now().time_since_epoch())
+                                   .count());
 }
 
 std::string prefix_of(const VORNFleet* fleet) {
@@ -74,50 +76,64 @@ enum class Next : uint8_t { kRow, kEnd, kFailed };
 // Appends the next row to `out`, with its line end.
 using NextRow = std::function<Next(std::string& out)>;
 
+// Rows that several batches take from. Once there are no more, nothing is asked again.
+class Rows {
+ public:
+  explicit Rows(NextRow next) : next_(std::move(next)) {}
+
+  bool append_next(std::string& out) {
+    last_ = last_ == Next::kRow ? next_(out) : last_;
+    return last_ == Next::kRow;
+  }
+  bool have_failed() const { return last_ == Next::kFailed; }
+
+ private:
+  const NextRow next_;
+  Next last_ = Next::kRow;
+};
+
 // A batch of rows as the bytes that the platform asks for.
 class Batch {
  public:
-  explicit Batch(const NextRow& next) : next_(next) {}
+  // `first` is its first row: it was asked for to see whether there is one.
+  Batch(Rows& rows, std::string first) : rows_(rows), pending_(std::move(first)) {}
 
   size_t read(char* out, size_t size) {
     pending_.erase(0, std::exchange(at_, 0));  // less than a row is left of the last time
-    while (pending_.size() < size && last_ == Next::kRow && rows_ < kRowsOfBatch) {
-      last_ = next_(pending_);
-      rows_ += last_ == Next::kRow ? 1 : 0;
+    while (pending_.size() < size && count_ < kRowsOfBatch && rows_.append_next(pending_)) {
+      ++count_;
     }
     at_ = pending_.copy(out, size);
     return at_;
   }
-  // Puts the row in front of what is read: it was asked for to see whether there is one.
-  void begin_with(std::string row) {
-    pending_ = std::move(row);
-    rows_ = 1;
-  }
-  Next last() const { return last_; }
 
  private:
-  const NextRow& next_;
+  Rows& rows_;
   std::string pending_;
   size_t at_ = 0;  // what of it has been read
-  size_t rows_ = 0;
-  Next last_ = Next::kRow;
+  size_t count_ = 1;
 };
 
-// All rows, batch by batch. An engine that takes a batch takes all of it.
-bool send(VORNFleet* fleet, const char* table, const NextRow& next) {
-  for (;;) {
-    std::string first;
-    if (const Next found = next(first); found != Next::kRow) {
-      return found == Next::kEnd;
+// All rows, batch by batch, and several beside each other when there are many. An engine that takes
+// a batch takes all of it.
+bool send(VORNFleet* fleet, const char* table, NextRow next) {
+  Rows rows(std::move(next));
+  const auto source = [](void* context, char* out, size_t size) {
+    return static_cast<Batch*>(context)->read(out, size);
+  };
+  for (size_t beside = 1;; beside = kBatchesBeside) {
+    std::deque<Batch> batches;
+    std::vector<void*> contexts;
+    for (std::string first; batches.size() < beside && rows.append_next(first); first.clear()) {
+      contexts.push_back(&batches.emplace_back(rows, std::move(first)));
     }
-    Batch batch(next);
-    batch.begin_with(std::move(first));
-    const auto source = [](void* context, char* out, size_t size) {
-      return static_cast<Batch*>(context)->read(out, size);
-    };
-    const bool was_sent = VORNFleetInsert(fleet, table, source, &batch) == 0;
-    if (!was_sent || batch.last() != Next::kRow) {
-      return was_sent && batch.last() == Next::kEnd;
+    const bool was_sent = contexts.empty() || VORNFleetInsert(fleet, table, source, contexts.data(),
+                                                              contexts.size()) == 0;
+    if (!was_sent || rows.have_failed()) {
+      return false;
+    }
+    if (contexts.empty()) {
+      return true;
     }
   }
 }

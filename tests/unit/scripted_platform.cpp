@@ -274,7 +274,7 @@ const char* VORNFleetProblem(const VORNFleet* /*fleet*/) {
   return "";
 }
 int VORNFleetInsert(VORNFleet* /*fleet*/, const char* /*table*/, VORNFleetSource /*source*/,
-                    void* /*context*/) {
+                    void* const* /*contexts*/, size_t /*count*/) {
   return -1;
 }
 int VORNFleetSelect(VORNFleet* /*fleet*/, const char* /*sql*/, VORNFleetRow /*row*/,

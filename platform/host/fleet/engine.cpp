@@ -180,10 +180,12 @@ class Engine::Transfer {
     set(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(sql.size()));
     set(CURLOPT_TIMEOUT, kSelectSeconds);
     set(CURLOPT_LOW_SPEED_LIMIT, 0L);
-    return perform(node, query, {}, &rows);
+    prepare(node, query, {}, &rows);
+    return finish(curl_ && headers_ ? curl_easy_perform(curl_.get()) : CURLE_OUT_OF_MEMORY);
   }
 
-  bool insert(std::size_t node, const std::string& query, Upload& upload) {
+  // Ready to be performed, then finish() says how it went.
+  void prepare_insert(std::size_t node, const std::string& query, Upload& upload) {
     set(CURLOPT_POSTFIELDS, static_cast<char*>(nullptr));
     set(CURLOPT_POSTFIELDSIZE_LARGE, curl_off_t{-1});
     set(CURLOPT_READFUNCTION, &Transfer::on_read);
@@ -195,11 +197,32 @@ class Engine::Transfer {
     constexpr const char* kBytes = "Content-Type: application/octet-stream";
     if (is_here(conf_.urls[node])) {
       upload.compress(false);
-      return perform(node, query, {kChunked, kBytes}, nullptr);
+      prepare(node, query, {kChunked, kBytes}, nullptr);
+    } else {
+      upload.compress(true);
+      prepare(node, query, {kChunked, kBytes, "Content-Encoding: gzip"}, nullptr);
     }
-    upload.compress(true);
-    return perform(node, query, {kChunked, kBytes, "Content-Encoding: gzip"}, nullptr);
   }
+
+  // What came of it, `code` by libcurl's word. False with problem_.
+  bool finish(CURLcode code) {
+    set(CURLOPT_HTTPHEADER, static_cast<curl_slist*>(nullptr));
+    long status = 0;
+    curl_easy_getinfo(curl_.get(), CURLINFO_RESPONSE_CODE, &status);
+    constexpr long kFine = 200;
+    is_refused_ = status != 0 && status != kFine;
+    if (is_refused_) {
+      problem_ = conf_.urls[asked_] + " refused: " + first_line(refusal_);
+      return false;
+    }
+    if (code != CURLE_OK || (rows_ != nullptr && rows_->is_within_a_row())) {
+      problem_ = conf_.urls[asked_] + " can't be used: " + reason(code);
+      return false;
+    }
+    return true;
+  }
+
+  CURL* handle() const { return curl_.get(); }
 
   std::string escaped(const std::string& text) const {
     char* raw = curl_easy_escape(curl_.get(), text.c_str(), static_cast<int>(text.size()));
@@ -218,39 +241,25 @@ class Engine::Transfer {
     curl_easy_setopt(curl_.get(), option, value);
   }
 
-  bool perform(std::size_t node, const std::string& query,
+  void prepare(std::size_t node, const std::string& query,
                std::initializer_list<const char*> headers, Rows* rows) {
     const std::string url =
         conf_.urls[node] + (conf_.urls[node].ends_with('/') ? "?" : "/?") + query;
-    SlistPtr list(curl_slist_append(nullptr, "Expect:"));
+    headers_.reset(curl_slist_append(nullptr, "Expect:"));
     for (const char* header : headers) {
-      curl_slist* longer = curl_slist_append(list.get(), header);
-      static_cast<void>(list.release());
-      list.reset(longer);
+      curl_slist* longer = curl_slist_append(headers_.get(), header);
+      static_cast<void>(headers_.release());
+      headers_.reset(longer);
     }
     set(CURLOPT_URL, url.c_str());
     set(CURLOPT_POST, 1L);
-    set(CURLOPT_HTTPHEADER, list.get());
+    set(CURLOPT_HTTPHEADER, headers_.get());
     in_clear_ = !conf_.urls[node].starts_with("https:");
     is_kept_secret_ = false;
+    asked_ = node;
     rows_ = rows;
     refusal_.clear();
     error_[0] = '\0';
-    const CURLcode code = curl_ && list ? curl_easy_perform(curl_.get()) : CURLE_OUT_OF_MEMORY;
-    set(CURLOPT_HTTPHEADER, static_cast<curl_slist*>(nullptr));
-    long status = 0;
-    curl_easy_getinfo(curl_.get(), CURLINFO_RESPONSE_CODE, &status);
-    constexpr long kFine = 200;
-    is_refused_ = status != 0 && status != kFine;
-    if (is_refused_) {
-      problem_ = conf_.urls[node] + " refused: " + first_line(refusal_);
-      return false;
-    }
-    if (code != CURLE_OK || (rows != nullptr && rows->is_within_a_row())) {
-      problem_ = conf_.urls[node] + " can't be used: " + reason(code);
-      return false;
-    }
-    return true;
   }
 
   std::string reason(CURLcode code) const {
@@ -302,13 +311,84 @@ class Engine::Transfer {
   }
 
   Rows* rows_ = nullptr;
+  std::size_t asked_ = 0;  // the node
+  SlistPtr headers_;
   std::string refusal_;
   bool in_clear_ = false, is_kept_secret_ = false;
   char error_[CURL_ERROR_SIZE] = "";
   const CurlPtr curl_{curl_easy_init()};  // last, since its cleanup still calls back
 };
 
-Engine::Engine(const FleetConf& conf) : transfer_(std::make_unique<Transfer>(conf)) {}
+// Several inserts under way at once: an engine reads the rows of one on one processor, and puts
+// them into their place while nothing more comes.
+class Engine::Beside {
+ public:
+  // As Transfer's, of each upload; false, and the others are given up, when one fails. Not more of
+  // them than Transfers that there is memory for.
+  bool insert(const FleetConf& conf, std::size_t node, const std::string& query,
+              const std::vector<std::unique_ptr<Upload>>& uploads) {
+    while (transfers_.size() < uploads.size()) {
+      transfers_.push_back(std::make_unique<Transfer>(conf));
+    }
+    std::size_t running = 0;
+    for (; running < uploads.size(); ++running) {
+      Transfer& transfer = *transfers_[running];
+      transfer.prepare_insert(node, query, *uploads[running]);
+      if (curl_multi_add_handle(multi_.get(), transfer.handle()) != CURLM_OK) {
+        break;
+      }
+    }
+    failed_ = running < uploads.size() ? transfers_[running].get() : nullptr;
+    if (failed_ != nullptr) {
+      failed_->finish(CURLE_OUT_OF_MEMORY);
+    }
+    for (std::size_t left = running; left > 0 && failed_ == nullptr;) {
+      left -= perform();
+    }
+    for (std::size_t i = 0; i < running; ++i) {
+      curl_multi_remove_handle(multi_.get(), transfers_[i]->handle());
+    }
+    return failed_ == nullptr;
+  }
+  // The one that failed last.
+  const Transfer& failed() const { return *failed_; }
+
+ private:
+  // Goes on for a moment. How many have ended.
+  std::size_t perform() {
+    constexpr int kMomentMs = 1000;
+    int still = 0;
+    CURLMcode code = curl_multi_perform(multi_.get(), &still);
+    std::size_t ended = 0;
+    int waiting = 0;
+    while (const CURLMsg* message = curl_multi_info_read(multi_.get(), &waiting)) {
+      const auto transfer =
+          std::find_if(transfers_.begin(), transfers_.end(),
+                       [&](const auto& each) { return each->handle() == message->easy_handle; });
+      ++ended;
+      failed_ = (*transfer)->finish(message->data.result) ? failed_ : transfer->get();
+    }
+    if (code == CURLM_OK && ended == 0) {
+      code = curl_multi_poll(multi_.get(), nullptr, 0, kMomentMs, nullptr);
+    }
+    if (code != CURLM_OK) {
+      failed_ = transfers_.front().get();
+      failed_->finish(CURLE_OUT_OF_MEMORY);
+    }
+    return ended;
+  }
+
+  struct MultiCleanup {
+    void operator()(CURLM* multi) const { curl_multi_cleanup(multi); }
+  };
+
+  const std::unique_ptr<CURLM, MultiCleanup> multi_{curl_multi_init()};
+  std::vector<std::unique_ptr<Transfer>> transfers_;
+  Transfer* failed_ = nullptr;
+};
+
+Engine::Engine(const FleetConf& conf)
+    : transfer_(std::make_unique<Transfer>(conf)), inserts_(std::make_unique<Beside>()) {}
 Engine::~Engine() = default;
 
 namespace {
@@ -340,25 +420,33 @@ bool Engine::select(const std::string& sql, const OnRow& on_row) {
   return false;
 }
 
-bool Engine::insert(const std::string& table, const Source& source) {
+bool Engine::insert(const std::string& table, const std::vector<Source>& sources) {
   Transfer& transfer = *transfer_;
-  Upload upload(source);
+  std::vector<std::unique_ptr<Upload>> uploads;
+  bool ok = true;
+  for (const Source& source : sources) {
+    uploads.push_back(std::make_unique<Upload>(source));
+    ok = ok && uploads.back()->ok();
+  }
   const std::string query = "database=" + transfer.conf_.database +
                             "&insert_distributed_sync=1&query=" +
                             transfer.escaped("INSERT INTO " + table + " FORMAT TabSeparated");
   std::string before;
-  for (std::size_t tried = 0; tried < nodes() && upload.ok(); ++tried) {
+  for (std::size_t tried = 0; tried < nodes() && ok; ++tried) {
     const std::size_t node = (transfer.node_ + tried) % nodes();
-    if (transfer.insert(node, query, upload)) {
+    if (inserts_->insert(transfer.conf_, node, query, uploads)) {
       transfer.node_ = node;
       return true;
     }
-    if (upload.has_begun()) {
+    const Transfer& failed = inserts_->failed();
+    if (std::any_of(uploads.begin(), uploads.end(),
+                    [](const auto& upload) { return upload->has_begun(); })) {
       // What comes next goes elsewhere, unless it is the engine that didn't want it.
-      transfer.node_ = transfer.is_refused_ ? node : (node + 1) % nodes();
+      transfer.node_ = failed.is_refused_ ? node : (node + 1) % nodes();
+      transfer.problem_ = failed.problem_;
       break;
     }
-    before += before.empty() ? transfer.problem_ : "; " + transfer.problem_;
+    before += before.empty() ? failed.problem_ : "; " + failed.problem_;
     transfer.problem_ = before;
   }
   return false;

@@ -29,10 +29,10 @@ class Engine {
 
   // Fills `out` with the next bytes of rows in the TabSeparated format; 0 at their end.
   using Source = std::function<std::size_t(char* out, std::size_t size)>;
-  // Sends rows to `table`, compressed unless the node is this machine's own. All of them are in its
-  // place when it returns true; after false nobody knows how many are. Another node is tried as
-  // long as nothing was asked of `source`.
-  bool insert(const std::string& table, const Source& source);
+  // Sends the rows of each source to `table`, beside each other, compressed unless the node is this
+  // machine's own. All of them are in their place when it returns true; after false nobody knows
+  // how many are. Another node is tried as long as nothing was asked of a source.
+  bool insert(const std::string& table, const std::vector<Source>& sources);
 
   // Runs a statement on one node, outside of the configured database.
   bool execute(std::size_t node, const std::string& sql);
@@ -45,7 +45,9 @@ class Engine {
 
  private:
   class Transfer;
+  class Beside;
   std::unique_ptr<Transfer> transfer_;
+  std::unique_ptr<Beside> inserts_;
 };
 
 }  // namespace host

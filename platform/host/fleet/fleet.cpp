@@ -4,6 +4,7 @@
 #include <exception>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "fleet/engine.hpp"
 #include "fleet/fleet_conf.hpp"
@@ -68,10 +69,16 @@ const char* VORNFleetProblem(const VORNFleet* fleet) {
   return fleet != nullptr ? fleet->problem.c_str() : "there is no memory for it";
 }
 
-int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetSource source, void* context) {
+int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetSource source,
+                    void* const* contexts, size_t count) {
   return with_engine(fleet, [&](host::Engine& engine) {
-    return engine.insert(table,
-                         [&](char* out, std::size_t size) { return source(context, out, size); });
+    std::vector<host::Engine::Source> sources;
+    for (size_t i = 0; i < count; ++i) {
+      sources.emplace_back([source, context = contexts[i]](char* out, std::size_t size) {
+        return source(context, out, size);
+      });
+    }
+    return engine.insert(table, sources);
   });
 }
 

@@ -198,8 +198,7 @@ std::string drop_old_runs(Engine& engine, const std::vector<FleetRun>& newest, s
     });
     const bool is_replaced = found != newest.end() && partition.run < found->run &&
                              found->finished < now - kLongestReport;
-    const std::int64_t begun =
-        static_cast<std::int64_t>(partition.run / report_format::kRunsInSecond);
+    const auto begun = static_cast<std::int64_t>(partition.run / report_format::kRunsInSecond);
     const bool is_complete = found != newest.end() && partition.run == found->run;
     return is_replaced || (!is_complete && begun < now - kDay &&
                            (found == newest.end() || partition.run > found->run));

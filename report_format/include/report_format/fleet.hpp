@@ -10,8 +10,8 @@
 namespace report_format {
 
 // A run's rows carry the server, the profile and a number of the run that grows: the time at which
-// it began in microseconds, of which those below the second are the shipping's own. So rows of two
-// shippings of one run stay apart.
+// they began to be shipped, in microseconds. So rows of two shippings of one run stay apart, and of
+// two runs of one second the later one has the greater number.
 struct FleetTable {
   const char* name;
   // Behind `server String, profile String, run UInt64`, in the order in which they are shipped.
