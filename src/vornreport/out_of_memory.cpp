@@ -23,7 +23,7 @@ std::unique_ptr<char[]> g_reserve;
 
 [[noreturn]] void end_run() {
   std::set_new_handler(nullptr);  // what is written below may throw, but not come here again
-  g_reserve.reset();              // what is written below needs some
+  release_memory_reserve();       // what is written below needs some
   try {
     REPORT_LOG_ERR(kDriverModule, __LINE__, "out of memory, the run ends\n");
     end_running_command();
@@ -48,6 +48,10 @@ void end_without_memory(const char* profile, const VLIBCSzHash* profile_hash) {
   if (!g_reserve) {
     g_reserve = std::make_unique<char[]>(kReserve);
   }
+}
+
+void release_memory_reserve() {
+  g_reserve.reset();
 }
 
 }  // namespace vornreport

@@ -10,4 +10,7 @@ namespace vornreport {
 // stay the caller's and live until the next call.
 void end_without_memory(const char* profile, const VLIBCSzHash* profile_hash);
 
+// Makes room for what a run that fails has to do still: calls that were refused memory fail it too.
+void release_memory_reserve();
+
 }  // namespace vornreport

@@ -193,6 +193,7 @@ int make_report(const char* profile, const VLIBCSzHash* profile_hash, bool& has_
 // -1 when the report isn't what it seemed to be.
 int end_run(const char* profile, const VLIBCSzHash* profile_hash, int result) {
   if (result < 0) {
+    release_memory_reserve();
     VornQazReportCleanTmp(profile, profile_hash);
     VornQazStatusUpdate(profile, "fail");
     return result;
