@@ -133,15 +133,16 @@ TEST(SqliteMemory, KeepsEveryByteOfEveryBlock) {
 // Blocks are freed by other threads than took them, and outlive the thread they are from; whatever
 // a thread leaves free, the next one takes.
 TEST(SqliteMemory, OutlivesItsThreads) {
+  constexpr int kSize = 3000;  // larger ones are the system's
   std::set<void*> seen;
   std::array<Block, 100> blocks{};
   for (int round = 0; round < 50; ++round) {
     std::thread([&] {
       for (Block& block : blocks) {
         memory.xFree(block.bytes);
-        block = {static_cast<unsigned char*>(memory.xMalloc(5000)), 5000,
+        block = {static_cast<unsigned char*>(memory.xMalloc(kSize)), kSize,
                  static_cast<unsigned char>(round)};
-        std::memset(block.bytes, block.fill, 5000);
+        std::memset(block.bytes, block.fill, kSize);
         seen.insert(block.bytes);
       }
     }).join();
@@ -156,8 +157,8 @@ TEST(SqliteMemory, OutlivesItsThreads) {
         Block& block = blocks[i + 4 * (static_cast<std::size_t>(step) % 25)];
         EXPECT_TRUE(block.intact());
         memory.xFree(block.bytes);
-        block.bytes = static_cast<unsigned char*>(memory.xMalloc(5000));
-        std::memset(block.bytes, block.fill = static_cast<unsigned char>(i), 5000);
+        block.bytes = static_cast<unsigned char*>(memory.xMalloc(kSize));
+        std::memset(block.bytes, block.fill = static_cast<unsigned char>(i), kSize);
       }
     });
   }
