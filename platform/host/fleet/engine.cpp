@@ -154,7 +154,7 @@ std::string first_line(std::string text) {
 
 class Engine::Transfer {
  public:
-  explicit Transfer(const FleetConf& conf) : conf_(conf) {
+  explicit Transfer(FleetConf conf) : conf_(std::move(conf)) {
     set(CURLOPT_PROTOCOLS_STR, "http,https");
     set(CURLOPT_PROXY, "");
     set(CURLOPT_FOLLOWLOCATION, 0L);

@@ -47,7 +47,7 @@ std::string engine_of_parts(Engine& engine, std::size_t node, const FleetTable& 
   const FleetConf& conf = engine.conf();
   std::string replicas = "0";
   if (!conf.cluster.empty()) {
-    const std::string problem =
+    std::string problem =
         value_of(engine, node,
                  "select toString(max(replica_num)) from system.clusters where cluster=" +
                      fleet_literal(conf.cluster),
@@ -98,7 +98,7 @@ std::string make_table(Engine& engine, std::size_t node, const FleetTable& table
 std::string check_layout(Engine& engine, std::size_t node) {
   const FleetConf& conf = engine.conf();
   std::string kind;
-  const std::string problem =
+  std::string problem =
       value_of(engine, node,
                "select engine from system.tables where database=" + fleet_literal(conf.database) +
                    " and name=" + fleet_literal(report_format::kFleetRun.name),
@@ -117,9 +117,8 @@ std::string drop_where(Engine& engine,
   const FleetConf& conf = engine.conf();
   for (std::size_t node = 0; node < engine.nodes(); ++node) {
     // The run's line goes first: what is left of a run without it is seen by nobody.
-    for (auto table = report_format::kFleetTables.rbegin();
-         table != report_format::kFleetTables.rend(); ++table) {
-      const std::string part = part_of(conf, **table);
+    for (std::size_t left = report_format::kFleetTables.size(); left > 0; --left) {
+      const std::string part = part_of(conf, *report_format::kFleetTables[left - 1]);
       std::vector<std::string> partitions;
       const bool listed = engine.select_on(
           node,
