@@ -85,6 +85,16 @@ void append_fleet_text(std::string& out, std::string_view text) {
   out.append(text, plain);
 }
 
+void append_binary_text(std::string& out, std::string_view text) {
+  // Its length by seven bits a byte, the last ones first, all but the end with the eighth bit set.
+  std::size_t length = text.size();
+  for (; length > 0x7f; length >>= 7U) {
+    out += static_cast<char>(0x80U | length);
+  }
+  out += static_cast<char>(length);
+  out += text;
+}
+
 std::string fleet_literal(std::string_view text) {
   std::string literal = "'";
   append_fleet_text(literal, text);

@@ -40,12 +40,14 @@ constexpr size_t kRowsOfBatch = 100'000;
 constexpr size_t kBatchesBeside = 2;
 constexpr int kAttempts = 2;
 
+using report_format::append_binary_number;
+using report_format::append_binary_text;
 using report_format::append_fleet_text;
 
 // A sent run that waits for its line.
 struct Sent {
   FleetHandle fleet;
-  std::string prefix;    // what each row begins with: server, profile and run
+  std::string prefix;    // what its line begins with
   int64_t interval = 0;  // seconds since the run before; 0 when that isn't known
 };
 std::optional<Sent> g_sent;
@@ -57,12 +59,20 @@ uint64_t new_run_number() {
                                    .count());
 }
 
-std::string prefix_of(const VORNFleet* fleet) {
+// What each of an attempt's rows begins with.
+std::string prefix_of(const VORNFleet* fleet, uint64_t run) {
   std::string prefix;
   append_fleet_text(prefix, VORNFleetServer(fleet));
   prefix += '\t';
   append_fleet_text(prefix, run_facts().profile);
-  return prefix + '\t' + std::to_string(new_run_number()) + '\t';
+  return prefix + '\t' + std::to_string(run) + '\t';
+}
+std::string binary_prefix_of(const VORNFleet* fleet, uint64_t run) {
+  std::string prefix;
+  append_binary_text(prefix, VORNFleetServer(fleet));
+  append_binary_text(prefix, run_facts().profile);
+  append_binary_number(prefix, run);
+  return prefix;
 }
 
 void append_number(std::string& out, int64_t value) {
@@ -73,7 +83,7 @@ void append_number(std::string& out, int64_t value) {
 // --- Rows, one after another ---------------------------------------------------------------------
 
 enum class Next : uint8_t { kRow, kEnd, kFailed };
-// Appends the next row to `out`, with its line end.
+// Appends the next row to `out`.
 using NextRow = std::function<Next(std::string& out)>;
 
 // Rows that several batches take from. Once there are no more, nothing is asked again.
@@ -116,7 +126,7 @@ class Batch {
 
 // All rows, batch by batch, and several beside each other when there are many. An engine that takes
 // a batch takes all of it.
-bool send(VORNFleet* fleet, const char* table, NextRow next) {
+bool send(VORNFleet* fleet, const char* table, VORNFleetFormat format, NextRow next) {
   Rows rows(std::move(next));
   const auto source = [](void* context, char* out, size_t size) {
     return static_cast<Batch*>(context)->read(out, size);
@@ -127,8 +137,9 @@ bool send(VORNFleet* fleet, const char* table, NextRow next) {
     for (std::string first; batches.size() < beside && rows.append_next(first); first.clear()) {
       contexts.push_back(&batches.emplace_back(rows, std::move(first)));
     }
-    const bool was_sent = contexts.empty() || VORNFleetInsert(fleet, table, source, contexts.data(),
-                                                              contexts.size()) == 0;
+    const bool was_sent =
+        contexts.empty() ||
+        VORNFleetInsert(fleet, table, format, source, contexts.data(), contexts.size()) == 0;
     if (!was_sent || rows.have_failed()) {
       return false;
     }
@@ -145,8 +156,8 @@ using Statement = std::unique_ptr<sqlite3_stmt, ReleaseWith<&sqlite3_finalize>>;
 // The rows of the statistics database in their order.
 class FileRows {
  public:
-  FileRows(const VLIBCSzHash* profile_hash, const VLIBCSzHash* users, const std::string& prefix)
-      : users_(users), prefix_(prefix) {
+  FileRows(const VLIBCSzHash* profile_hash, const VLIBCSzHash* users, std::string prefix)
+      : users_(users), prefix_(std::move(prefix)) {
     const char* list = set_value(profile_hash, "report_list");
     tells_owners_ =
         list != nullptr && report_format::is_selected(report_format::kFileOwner.name, list);
@@ -186,37 +197,31 @@ class FileRows {
     out += prefix_;
     number(out, kId);
     number(out, kOwner);
-    out += owner_name(sqlite3_column_int64(rows_.get(), kOwner));
-    out += '\t';
+    append_binary_text(out, owner_name(sqlite3_column_int64(rows_.get(), kOwner)));
     number(out, kTime);
     number(out, kSize);
-    text(out, kShare, '\t');
-    text(out, kPath, '\t');
+    text(out, kShare);
+    text(out, kPath);
     const int type = sqlite3_column_type(rows_.get(), kName);
     const double value = type == SQLITE_INTEGER || type == SQLITE_FLOAT
                              ? sqlite3_column_double(rows_.get(), kName)
                              : std::numeric_limits<double>::infinity();
-    text(out, kName, '\t');
-    std::array<char, 32> digits;
-    out.append(digits.data(),
-               std::to_chars(digits.data(), digits.data() + digits.size(), value).ptr);
-    out += '\t';
-    text(out, kType, '\n');
+    text(out, kName);
+    append_binary_number(out, value);
+    text(out, kType);
   }
 
   void number(std::string& out, Column column) {
-    append_number(out, sqlite3_column_int64(rows_.get(), column));
-    out += '\t';
+    append_binary_number(out, int64_t{sqlite3_column_int64(rows_.get(), column)});
   }
 
-  void text(std::string& out, Column column, char end) {
+  void text(std::string& out, Column column) {
     const auto* bytes = sqlite3_column_text(rows_.get(), column);
-    append_fleet_text(out, {reinterpret_cast<const char*>(bytes),
-                            static_cast<size_t>(sqlite3_column_bytes(rows_.get(), column))});
-    out += end;
+    append_binary_text(out, {reinterpret_cast<const char*>(bytes),
+                             static_cast<size_t>(sqlite3_column_bytes(rows_.get(), column))});
   }
 
-  // Escaped; empty for one that reports don't tell.
+  // Empty for one that reports don't tell.
   const std::string& owner_name(int64_t id) {
     const auto [place, is_new] = names_.try_emplace(id);
     VORNUser* user = nullptr;
@@ -224,14 +229,14 @@ class FileRows {
       const UserHandle owned(user);
       if (user != nullptr && !is_unset(user->name) &&
           VLIBCSzHashGetValue(users_, user->name) != nullptr) {
-        append_fleet_text(place->second, user->name);
+        place->second = user->name;
       }
     }
     return place->second;
   }
 
   const VLIBCSzHash* users_;
-  const std::string& prefix_;
+  const std::string prefix_;
   bool tells_owners_ = false, is_absent_ = false;
   SqliteHandle db_;
   Statement rows_;
@@ -268,18 +273,19 @@ void keep_shares(const ShipLookUps& look_ups) {
 
 // --- A run ---------------------------------------------------------------------------------------
 
-bool send_rows(VORNFleet* fleet, const std::string& prefix, const VLIBCSzHash* profile_hash,
+bool send_rows(VORNFleet* fleet, uint64_t run, const VLIBCSzHash* profile_hash,
                const VLIBCSzHash* users) {
   FILE* rows = kept_report_rows();
   FILE* members = kept_content_members();
   if (rows == nullptr || members == nullptr) {
     return false;
   }
-  FileRows files(profile_hash, users, prefix);
-  return send(fleet, report_format::kFleetFile.name,
+  const std::string prefix = prefix_of(fleet, run);
+  FileRows files(profile_hash, users, binary_prefix_of(fleet, run));
+  return send(fleet, report_format::kFleetFile.name, VORN_FLEET_BINARY,
               [&](std::string& out) { return files.next(out); }) &&
-         send(fleet, report_format::kFleetRow.name, lines_of(rows, prefix)) &&
-         send(fleet, report_format::kFleetContent.name, lines_of(members, prefix));
+         send(fleet, report_format::kFleetRow.name, VORN_FLEET_TEXT, lines_of(rows, prefix)) &&
+         send(fleet, report_format::kFleetContent.name, VORN_FLEET_TEXT, lines_of(members, prefix));
 }
 
 void tell(const VORNFleet* fleet) {
@@ -330,9 +336,10 @@ void ship_rows(const VLIBCSzHash* profile_hash, const ShipLookUps& look_ups) {
     return;
   }
   for (int attempt = 0; found == 0 && attempt < kAttempts; ++attempt) {
-    const std::string prefix = prefix_of(fleet.get());
-    if (send_rows(fleet.get(), prefix, profile_hash, look_ups.users)) {
-      g_sent = Sent{std::move(fleet), prefix, interval_of_runs()};
+    const uint64_t run = new_run_number();
+    if (send_rows(fleet.get(), run, profile_hash, look_ups.users)) {
+      std::string prefix = prefix_of(fleet.get(), run);
+      g_sent = Sent{std::move(fleet), std::move(prefix), interval_of_runs()};
       return;
     }
   }
@@ -363,7 +370,7 @@ void ship_run(const char* facts_path) {
   append_fleet_text(row, report_format::to_line(*facts));
   row += '\n';
   for (int attempt = 0; attempt < kAttempts; ++attempt) {
-    if (send(g_sent->fleet.get(), report_format::kFleetRun.name, line_of(row))) {
+    if (send(g_sent->fleet.get(), report_format::kFleetRun.name, VORN_FLEET_TEXT, line_of(row))) {
       return;
     }
   }

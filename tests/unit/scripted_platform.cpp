@@ -273,8 +273,8 @@ const char* VORNFleetServer(const VORNFleet* /*fleet*/) {
 const char* VORNFleetProblem(const VORNFleet* /*fleet*/) {
   return "";
 }
-int VORNFleetInsert(VORNFleet* /*fleet*/, const char* /*table*/, VORNFleetSource /*source*/,
-                    void* const* /*contexts*/, size_t /*count*/) {
+int VORNFleetInsert(VORNFleet* /*fleet*/, const char* /*table*/, VORNFleetFormat /*format*/,
+                    VORNFleetSource /*source*/, void* const* /*contexts*/, size_t /*count*/) {
   return -1;
 }
 int VORNFleetSelect(VORNFleet* /*fleet*/, const char* /*sql*/, VORNFleetRow /*row*/,

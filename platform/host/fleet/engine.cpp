@@ -232,8 +232,9 @@ class Engine::Transfer {
 
   const FleetConf conf_;
   std::string problem_;
-  std::size_t node_ = 0;     // the one that answered last
-  bool is_refused_ = false;  // the last failure was the engine's word, not the way to it
+  std::size_t node_ = 0;               // the one that answered last
+  std::size_t keeper_ = conf_.home();  // the one that takes rows
+  bool is_refused_ = false;            // the last failure was the engine's word, not the way to it
 
  private:
   template <typename Value>
@@ -420,7 +421,8 @@ bool Engine::select(const std::string& sql, const OnRow& on_row) {
   return false;
 }
 
-bool Engine::insert(const std::string& table, const std::vector<Source>& sources) {
+bool Engine::insert(const std::string& table, const char* format,
+                    const std::vector<Source>& sources) {
   Transfer& transfer = *transfer_;
   std::vector<std::unique_ptr<Upload>> uploads;
   bool ok = true;
@@ -428,21 +430,21 @@ bool Engine::insert(const std::string& table, const std::vector<Source>& sources
     uploads.push_back(std::make_unique<Upload>(source));
     ok = ok && uploads.back()->ok();
   }
-  const std::string query = "database=" + transfer.conf_.database +
-                            "&insert_distributed_sync=1&query=" +
-                            transfer.escaped("INSERT INTO " + table + " FORMAT TabSeparated");
+  const std::string query =
+      "database=" + transfer.conf_.database + "&query=" +
+      transfer.escaped("INSERT INTO " + transfer.conf_.part_of(table) + " FORMAT " + format);
   std::string before;
   for (std::size_t tried = 0; tried < nodes() && ok; ++tried) {
-    const std::size_t node = (transfer.node_ + tried) % nodes();
+    const std::size_t node = (transfer.keeper_ + tried) % nodes();
     if (inserts_->insert(transfer.conf_, node, query, uploads)) {
-      transfer.node_ = node;
+      transfer.keeper_ = node;
       return true;
     }
     const Transfer& failed = inserts_->failed();
     if (std::any_of(uploads.begin(), uploads.end(),
                     [](const auto& upload) { return upload->has_begun(); })) {
       // What comes next goes elsewhere, unless it is the engine that didn't want it.
-      transfer.node_ = failed.is_refused_ ? node : (node + 1) % nodes();
+      transfer.keeper_ = failed.is_refused_ ? node : (node + 1) % nodes();
       transfer.problem_ = failed.problem_;
       break;
     }

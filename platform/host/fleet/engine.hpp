@@ -27,12 +27,13 @@ class Engine {
   // `on_row` was false. Other nodes are tried while none was handed out.
   bool select(const std::string& sql, const OnRow& on_row);
 
-  // Fills `out` with the next bytes of rows in the TabSeparated format; 0 at their end.
+  // Fills `out` with the next bytes of rows; 0 at their end.
   using Source = std::function<std::size_t(char* out, std::size_t size)>;
-  // Sends the rows of each source to `table`, beside each other, compressed unless the node is this
-  // machine's own. All of them are in their place when it returns true; after false nobody knows
-  // how many are. Another node is tried as long as nothing was asked of a source.
-  bool insert(const std::string& table, const std::vector<Source>& sources);
+  // Sends the rows of each source to `table`, in the engine's `format`, beside each other,
+  // compressed unless the node is this machine's own. All of them are in their place when it
+  // returns true; after false nobody knows how many are. The node that keeps this server's rows is
+  // asked first, and others as long as nothing was asked of a source.
+  bool insert(const std::string& table, const char* format, const std::vector<Source>& sources);
 
   // Runs a statement on one node, outside of the configured database.
   bool execute(std::size_t node, const std::string& sql);

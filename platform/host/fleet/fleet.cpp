@@ -69,8 +69,8 @@ const char* VORNFleetProblem(const VORNFleet* fleet) {
   return fleet != nullptr ? fleet->problem.c_str() : "there is no memory for it";
 }
 
-int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetSource source,
-                    void* const* contexts, size_t count) {
+int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetFormat format,
+                    VORNFleetSource source, void* const* contexts, size_t count) {
   return with_engine(fleet, [&](host::Engine& engine) {
     std::vector<host::Engine::Source> sources;
     for (size_t i = 0; i < count; ++i) {
@@ -78,7 +78,8 @@ int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetSource source,
         return source(context, out, size);
       });
     }
-    return engine.insert(table, sources);
+    return engine.insert(table, format == VORN_FLEET_BINARY ? "RowBinary" : "TabSeparated",
+                         sources);
   });
 }
 

@@ -2,6 +2,7 @@
 
 #include <curl/curl.h>
 #include <sys/stat.h>
+#include <zlib.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -10,6 +11,7 @@
 #include "base/text_containers.hpp"
 #include "config/password_file.hpp"
 #include "config/shares.hpp"
+#include "report_format/fleet.hpp"
 #include "report_format/values.hpp"
 #include "vorn/base/file_io.hpp"
 #include "vorn/base/words.hpp"
@@ -138,6 +140,15 @@ FleetReading fleet_conf_of(const std::vector<std::pair<std::string, std::string>
     return {std::nullopt, in_file(problem)};
   }
   return {std::move(conf), ""};
+}
+
+std::string FleetConf::part_of(std::string_view table) const {
+  return std::string(table) + (cluster.empty() ? "" : std::string(report_format::kFleetPart));
+}
+
+std::size_t FleetConf::home() const {
+  const auto* bytes = reinterpret_cast<const Bytef*>(server.data());
+  return cluster.empty() ? 0 : crc32_z(0, bytes, server.size()) % urls.size();
 }
 
 FleetReading read_fleet_conf() {

@@ -19,6 +19,11 @@ struct FleetConf {
   std::string user, password;  // empty: none
   bool insecure = false;
   std::string server;  // this server's name in the fleet
+
+  // The table as a node keeps it.
+  std::string part_of(std::string_view table) const;
+  // The node, as its place in `urls`, that this server's rows go to while it can be reached.
+  std::size_t home() const;
 };
 
 // What a section says, or, where it can't be worked with, one sentence that says what to do.

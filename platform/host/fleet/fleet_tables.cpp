@@ -18,12 +18,6 @@ using report_format::FleetTable;
 constexpr std::int64_t kLongestReport = 900;
 constexpr std::int64_t kDay = 86400;
 
-// The table as a node keeps it.
-std::string part_of(const FleetConf& conf, const FleetTable& table) {
-  return std::string(table.name) +
-         (conf.cluster.empty() ? "" : std::string(report_format::kFleetPart));
-}
-
 std::string qualified(const FleetConf& conf, const std::string& table) {
   return "`" + conf.database + "`.`" + table + "`";
 }
@@ -61,7 +55,7 @@ std::string engine_of_parts(Engine& engine, std::size_t node, const FleetTable& 
     }
   }
   const std::string path =
-      "/clickhouse/tables/{shard}/" + conf.database + "/" + part_of(conf, table);
+      "/clickhouse/tables/{shard}/" + conf.database + "/" + conf.part_of(table.name);
   kind = std::strtoull(replicas.c_str(), nullptr, 10) > 1
              ? "ReplicatedMergeTree(" + fleet_literal(path) + ", '{replica}')"
              : "MergeTree";
@@ -70,7 +64,7 @@ std::string engine_of_parts(Engine& engine, std::size_t node, const FleetTable& 
 
 std::string make_table(Engine& engine, std::size_t node, const FleetTable& table) {
   const FleetConf& conf = engine.conf();
-  const std::string part = part_of(conf, table);
+  const std::string part = conf.part_of(table.name);
   std::string kind;
   if (std::string problem = engine_of_parts(engine, node, table, kind); !problem.empty()) {
     return problem;
@@ -118,7 +112,7 @@ std::string drop_where(Engine& engine,
   for (std::size_t node = 0; node < engine.nodes(); ++node) {
     // The run's line goes first: what is left of a run without it is seen by nobody.
     for (std::size_t left = report_format::kFleetTables.size(); left > 0; --left) {
-      const std::string part = part_of(conf, *report_format::kFleetTables[left - 1]);
+      const std::string part = conf.part_of(report_format::kFleetTables[left - 1]->name);
       std::vector<std::string> partitions;
       const bool listed = engine.select_on(
           node,

@@ -27,13 +27,15 @@ const char* VORNFleetServer(const VORNFleet* fleet);
 // What the last call that failed was up against, as a sentence without an end.
 const char* VORNFleetProblem(const VORNFleet* fleet);
 
-// Fills `out` with the next bytes of rows in the engine's TabSeparated format; 0 at their end.
+// How rows are written: the engine's TabSeparated and RowBinary.
+typedef enum { VORN_FLEET_TEXT, VORN_FLEET_BINARY } VORNFleetFormat;
+// Fills `out` with the next bytes of rows; 0 at their end.
 typedef size_t (*VORNFleetSource)(void* context, char* out, size_t size);
 // Adds the rows of `count` sources to `table` beside each other, compressed on their way to another
 // machine; `contexts` has one for each. 0 when all of them are in their place; -1 when nobody knows
 // how many are. Every wait is bounded.
-int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetSource source,
-                    void* const* contexts, size_t count);
+int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetFormat format,
+                    VORNFleetSource source, void* const* contexts, size_t count);
 
 // As sqlite3_exec's callback: 0 to go on. Columns can be null; `names` is never null and holds
 // nothing.

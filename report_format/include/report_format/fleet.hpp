@@ -2,9 +2,12 @@
 #pragma once
 
 #include <array>
+#include <bit>
 #include <cstdint>
+#include <cstring>
 #include <string>
 #include <string_view>
+#include <type_traits>
 #include <vector>
 
 namespace report_format {
@@ -50,6 +53,16 @@ inline constexpr std::string_view kFleetPart = "_part";
 // quotes, in which it is data whatever it holds.
 void append_fleet_text(std::string& out, std::string_view text);
 std::string fleet_literal(std::string_view text);  // with the quotes
+
+// Values of the engine's RowBinary format.
+void append_binary_text(std::string& out, std::string_view text);
+template <typename Number>
+void append_binary_number(std::string& out, Number value) {
+  static_assert(std::is_arithmetic_v<Number> && std::endian::native == std::endian::little);
+  char bytes[sizeof value];
+  std::memcpy(bytes, &value, sizeof value);
+  out.append(bytes, sizeof value);
+}
 
 // A row of the TabSeparated format, without its line end, taken apart in place: each of `fields`
 // ends with a NUL; that of an absent value is null.
