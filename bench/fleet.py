@@ -107,7 +107,7 @@ def fill(options, servers, shards):
             f"('server{server}', 'weekly', {10 ** 15 + server}, 'share', {i}, "
             f"['share{i}', '/srv/share{i}', '/srv'])" for i in range(8)))
         shards.ask(f"""insert into run values ('server{server}', 'weekly', {10 ** 15 + server}, {now},
-            {now}, {rows}, 0, 0, '{facts}')""")
+            {now}, {rows}, 0, 0, {rows + 8}, '{facts}')""")
 
 
 def report(options, servers, shards):

@@ -13,7 +13,7 @@ test_packages=(
   libgtest-dev python3 python3-aiosmtpd openssl chromium shellcheck quota samba-common-bin
   lintian systemd systemd-container cron strace glusterfs-server glusterfs-client iproute2
   prometheus zsh bash-completion
-  clickhouse-server clickhouse-client
+  clickhouse-server clickhouse-client libzookeeper-java default-jre-headless
 )
 
 # npm bundles the page. Where it came with another Node.js, Debian's stays away: they conflict.

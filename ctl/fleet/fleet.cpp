@@ -109,7 +109,7 @@ void status(bool json) {
   }
   if (table.empty()) {
     print_line(
-        "no server has sent a run; run vornctl profile set PROFILE fleet true, then the profile");
+        "the fleet has no complete run; run vornctl profile set PROFILE fleet true, then the profile");
     return;
   }
   table.print();

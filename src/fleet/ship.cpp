@@ -49,6 +49,7 @@ struct Sent {
   FleetHandle fleet;
   std::string prefix;    // what its line begins with
   int64_t interval = 0;  // seconds since the run before; 0 when that isn't known
+  uint64_t rows = 0;
 };
 std::optional<Sent> g_sent;
 
@@ -93,13 +94,16 @@ class Rows {
 
   bool append_next(std::string& out) {
     last_ = last_ == Next::kRow ? next_(out) : last_;
+    count_ += last_ == Next::kRow ? 1 : 0;
     return last_ == Next::kRow;
   }
   bool have_failed() const { return last_ == Next::kFailed; }
+  uint64_t count() const { return count_; }
 
  private:
   const NextRow next_;
   Next last_ = Next::kRow;
+  uint64_t count_ = 0;
 };
 
 // A batch of rows as the bytes that the platform asks for.
@@ -125,8 +129,9 @@ class Batch {
 };
 
 // All rows, batch by batch, and several beside each other when there are many. An engine that takes
-// a batch takes all of it.
-bool send(VORNFleet* fleet, const char* table, VORNFleetFormat format, NextRow next) {
+// a batch takes all of it. `sent` grows by their number.
+bool send(VORNFleet* fleet, const char* table, VORNFleetFormat format, NextRow next,
+          uint64_t& sent) {
   Rows rows(std::move(next));
   const auto source = [](void* context, char* out, size_t size) {
     return static_cast<Batch*>(context)->read(out, size);
@@ -144,6 +149,7 @@ bool send(VORNFleet* fleet, const char* table, VORNFleetFormat format, NextRow n
       return false;
     }
     if (contexts.empty()) {
+      sent += rows.count();
       return true;
     }
   }
@@ -274,7 +280,7 @@ void keep_shares(const ShipLookUps& look_ups) {
 // --- A run ---------------------------------------------------------------------------------------
 
 bool send_rows(VORNFleet* fleet, uint64_t run, const VLIBCSzHash* profile_hash,
-               const VLIBCSzHash* users) {
+               const VLIBCSzHash* users, uint64_t& sent) {
   FILE* rows = kept_report_rows();
   FILE* members = kept_content_members();
   if (rows == nullptr || members == nullptr) {
@@ -282,10 +288,12 @@ bool send_rows(VORNFleet* fleet, uint64_t run, const VLIBCSzHash* profile_hash,
   }
   const std::string prefix = prefix_of(fleet, run);
   FileRows files(profile_hash, users, binary_prefix_of(fleet, run));
-  return send(fleet, report_format::kFleetFile.name, VORN_FLEET_BINARY,
-              [&](std::string& out) { return files.next(out); }) &&
-         send(fleet, report_format::kFleetRow.name, VORN_FLEET_TEXT, lines_of(rows, prefix)) &&
-         send(fleet, report_format::kFleetContent.name, VORN_FLEET_TEXT, lines_of(members, prefix));
+  const NextRow next_file = [&](std::string& out) { return files.next(out); };
+  return send(fleet, report_format::kFleetFile.name, VORN_FLEET_BINARY, next_file, sent) &&
+         send(fleet, report_format::kFleetRow.name, VORN_FLEET_TEXT, lines_of(rows, prefix),
+              sent) &&
+         send(fleet, report_format::kFleetContent.name, VORN_FLEET_TEXT, lines_of(members, prefix),
+              sent);
 }
 
 void tell(const VORNFleet* fleet) {
@@ -337,9 +345,10 @@ void ship_rows(const VLIBCSzHash* profile_hash, const ShipLookUps& look_ups) {
   }
   for (int attempt = 0; found == 0 && attempt < kAttempts; ++attempt) {
     const uint64_t run = new_run_number();
-    if (send_rows(fleet.get(), run, profile_hash, look_ups.users)) {
+    uint64_t sent = 0;
+    if (send_rows(fleet.get(), run, profile_hash, look_ups.users, sent)) {
       std::string prefix = prefix_of(fleet.get(), run);
-      g_sent = Sent{std::move(fleet), std::move(prefix), interval_of_runs()};
+      g_sent = Sent{std::move(fleet), std::move(prefix), interval_of_runs(), sent};
       return;
     }
   }
@@ -362,15 +371,17 @@ void ship_run(const char* facts_path) {
     bytes += share.total().bytes;
   }
   std::string row = g_sent->prefix;
-  for (const int64_t value : {facts->started, facts->finished, static_cast<int64_t>(files),
-                              static_cast<int64_t>(bytes), g_sent->interval}) {
+  for (const int64_t value :
+       {facts->started, facts->finished, static_cast<int64_t>(files), static_cast<int64_t>(bytes),
+        g_sent->interval, static_cast<int64_t>(g_sent->rows)}) {
     append_number(row, value);
     row += '\t';
   }
   append_fleet_text(row, report_format::to_line(*facts));
   row += '\n';
   for (int attempt = 0; attempt < kAttempts; ++attempt) {
-    if (send(g_sent->fleet.get(), report_format::kFleetRun.name, VORN_FLEET_TEXT, line_of(row))) {
+    if (uint64_t sent = 0; send(g_sent->fleet.get(), report_format::kFleetRun.name, VORN_FLEET_TEXT,
+                                line_of(row), sent)) {
       return;
     }
   }

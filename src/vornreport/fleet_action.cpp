@@ -41,18 +41,21 @@ void complain(const std::string& text) {
 // --- Which runs ----------------------------------------------------------------------------------
 
 struct Run {
-  std::string server, profile, number;
+  std::string server, profile;
+  uint64_t number = 0;
   int64_t started = 0, interval = 0;
+  bool is_ahead = false;
 };
 
 int add_run(void* context, int columns, char** values, char** /*names*/) noexcept {
-  enum Column { kServer, kProfileName, kNumber, kStarted, kInterval, kCount };
+  enum Column { kServer, kProfileName, kNumber, kStarted, kInterval, kAhead, kCount };
   if (columns != kCount || values[kServer] == nullptr || values[kProfileName] == nullptr) {
     return -1;
   }
   static_cast<std::vector<Run>*>(context)->push_back(
-      {values[kServer], values[kProfileName], values[kNumber],
-       std::strtoll(values[kStarted], nullptr, 10), std::strtoll(values[kInterval], nullptr, 10)});
+      {values[kServer], values[kProfileName], std::strtoull(values[kNumber], nullptr, 10),
+       std::strtoll(values[kStarted], nullptr, 10), std::strtoll(values[kInterval], nullptr, 10),
+       *values[kAhead] == '1'});
   return 0;
 }
 
@@ -71,16 +74,28 @@ std::set<std::string, std::less<>> words_of(std::string_view list) {
 }
 
 // The newest complete ones of the servers asked for, by server, the newest first; none, after a
-// complaint, when one has none.
+// complaint, when one has none. What doesn't count for its clock is told.
 std::vector<Run> choose_runs(VORNFleet* fleet, const std::string& servers) {
-  constexpr char kNewest[] =
-      "select server, profile, toString(max(run)), argMax(started, run), argMax(since_last, run) "
-      "from run group by server, profile order by server, max(run) desc, profile";
-  std::vector<Run> runs;
-  if (VORNFleetSelect(fleet, kNewest, add_run, &runs) < 0) {
+  std::vector<Run> listed;
+  if (VORNFleetRuns(fleet, add_run, &listed) < 0) {
     complain(VORNFleetProblem(fleet));
     return {};
   }
+  std::vector<Run> runs;
+  for (const Run& run : listed) {
+    if (run.is_ahead) {
+      record_incident("server_overdue", run.server,
+                      "server " + run.server + " (" + run.profile +
+                          ") sent a run from the future, which doesn't count; set its clock",
+                      AlreadyLogged::kYes);
+    } else if (runs.empty() || runs.back().server != run.server ||
+               runs.back().profile != run.profile) {
+      runs.push_back(run);
+    }
+  }
+  std::stable_sort(runs.begin(), runs.end(), [](const Run& one, const Run& other) {
+    return one.server == other.server ? one.number > other.number : one.server < other.server;
+  });
   const auto wanted = words_of(servers);
   std::set<std::string, std::less<>> found;
   std::erase_if(runs, [&](const Run& run) {
@@ -95,14 +110,14 @@ std::vector<Run> choose_runs(VORNFleet* fleet, const std::string& servers) {
     }
   }
   if (runs.empty()) {
-    complain("no server has sent a run; set fleet = true in a profile and run it");
+    complain("the fleet has no complete run; set fleet = true in a profile and run it");
   }
   return runs;
 }
 
 std::string key_of(const Run& run) {
-  return "(" + fleet_literal(run.server) + ", " + fleet_literal(run.profile) + ", " + run.number +
-         ")";
+  return "(" + fleet_literal(run.server) + ", " + fleet_literal(run.profile) + ", " +
+         std::to_string(run.number) + ")";
 }
 
 std::string condition_of(const std::vector<Run>& runs) {
@@ -111,6 +126,25 @@ std::string condition_of(const std::vector<Run>& runs) {
     condition += (condition.ends_with(')') ? ", " : "") + key_of(run);
   }
   return condition + ")";
+}
+
+// Whether all that a report was made of is still there, or it says that it isn't.
+bool still_stand(VORNFleet* fleet, const std::vector<Run>& runs) {
+  std::vector<Run> listed;
+  if (VORNFleetRuns(fleet, add_run, &listed) < 0) {
+    complain(VORNFleetProblem(fleet));
+    return false;
+  }
+  std::set<std::string> complete;
+  for (const Run& run : listed) {
+    complete.insert(key_of(run));
+  }
+  const bool all = std::all_of(runs.begin(), runs.end(),
+                               [&](const Run& run) { return complete.contains(key_of(run)); });
+  if (!all) {
+    complain("a run was dropped while the report was made; make it again");
+  }
+  return all;
 }
 
 using FactsOfRuns = std::map<std::pair<std::string, std::string>, report_format::Facts>;
@@ -318,7 +352,7 @@ std::string fleet_report(const FleetOrder& order) {
   if (!prepare(order, run)) {
     return "";
   }
-  const bool is_made = make_page(order, run);
+  const bool is_made = make_page(order, run) && still_stand(fleet.get(), runs);
   if (VORNFleetReportEnd(is_made ? 1 : 0) < 0) {
     return "";
   }

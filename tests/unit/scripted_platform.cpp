@@ -281,6 +281,9 @@ int VORNFleetSelect(VORNFleet* /*fleet*/, const char* /*sql*/, VORNFleetRow /*ro
                     void* /*context*/) {
   return -1;
 }
+int VORNFleetRuns(VORNFleet* /*fleet*/, VORNFleetRow /*row*/, void* /*context*/) {
+  return -1;
+}
 int VORNFleetReportBegin(const char* /*folder*/, VLIBCSzHash** /*hash*/) {
   return -1;
 }

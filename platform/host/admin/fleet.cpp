@@ -87,9 +87,9 @@ bool init_fleet() {
     return false;
   }
   host::Engine engine(*conf);
-  std::vector<host::FleetRun> runs;
-  return tell(host::make_tables(engine)) && tell(host::list_runs(engine, runs)) &&
-         tell(host::drop_old_runs(engine, runs, std::time(nullptr)));
+  host::FleetListing listing;
+  return tell(host::make_tables(engine)) && tell(host::list_runs(engine, listing)) &&
+         tell(host::drop_old_runs(engine, listing));
 }
 
 std::optional<std::vector<FleetRun>> fleet_runs(std::int64_t now) {
@@ -98,13 +98,13 @@ std::optional<std::vector<FleetRun>> fleet_runs(std::int64_t now) {
     return std::nullopt;
   }
   host::Engine engine(*conf);
-  std::vector<host::FleetRun> runs;
-  if (!tell(host::list_runs(engine, runs))) {
+  host::FleetListing listing;
+  if (!tell(host::list_runs(engine, listing))) {
     return std::nullopt;
   }
-  tell(host::drop_old_runs(engine, runs, now));  // which takes nothing from the answer
+  tell(host::drop_old_runs(engine, listing));  // which takes nothing from the answer
   std::vector<FleetRun> told;
-  for (const host::FleetRun& run : runs) {
+  for (const host::FleetRun& run : host::newest_runs(listing)) {
     told.push_back({run.server, run.profile, run.started, run.finished, run.files, run.bytes,
                     report_format::is_overdue(run.started, run.interval, now)});
   }

@@ -4,6 +4,7 @@
 #define VORN_HOST_FLEET_ENGINE_HPP
 
 #include <cstddef>
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <string>
@@ -41,6 +42,8 @@ class Engine {
   std::size_t nodes() const;
   const FleetConf& conf() const;
 
+  // Whether the last failure was of the way to a node, not a node's word.
+  bool is_silent() const;
   // What the last failure was, as one sentence without an end.
   const std::string& problem() const;
 

@@ -1,6 +1,9 @@
 // The fleet as the program has it.
 #include "vorn/fleet.h"
 
+#include <algorithm>
+#include <array>
+#include <cstddef>
 #include <exception>
 #include <memory>
 #include <string>
@@ -8,13 +11,27 @@
 
 #include "fleet/engine.hpp"
 #include "fleet/fleet_conf.hpp"
+#include "fleet/fleet_tables.hpp"
 
 struct VORNFleet {
   std::unique_ptr<host::Engine> engine;  // null when it can't be worked with
   std::string problem;
+  std::vector<std::size_t> answering;  // nodes, when runs were asked for last
 };
 
 namespace {
+
+bool hand_out(const std::vector<host::FleetRun>& runs, bool are_ahead, VORNFleetRow row,
+              void* context) {
+  return std::all_of(runs.begin(), runs.end(), [&](host::FleetRun run) {
+    std::array<std::string, 4> texts{std::to_string(run.run), std::to_string(run.started),
+                                     std::to_string(run.interval), are_ahead ? "1" : "0"};
+    std::array<char*, 6> values{run.server.data(), run.profile.data(), texts[0].data(),
+                                texts[1].data(),   texts[2].data(),    texts[3].data()};
+    char* no_names[1] = {};
+    return row(context, values.size(), values.data(), static_cast<char**>(no_names)) == 0;
+  });
+}
 
 // Runs `call` with the engine. 0, or -1 with the problem kept.
 template <typename Call>
@@ -81,6 +98,28 @@ int VORNFleetInsert(VORNFleet* fleet, const char* table, VORNFleetFormat format,
     return engine.insert(table, format == VORN_FLEET_BINARY ? "RowBinary" : "TabSeparated",
                          sources);
   });
+}
+
+int VORNFleetRuns(VORNFleet* fleet, VORNFleetRow row, void* context) {
+  std::string problem;
+  const int done = with_engine(fleet, [&](host::Engine& engine) {
+    host::FleetListing listing;
+    problem = host::list_runs(engine, listing);
+    for (const std::size_t node : listing.answering) {
+      if (problem.empty() && !fleet->answering.empty() &&
+          std::find(fleet->answering.begin(), fleet->answering.end(), node) ==
+              fleet->answering.end()) {
+        problem = engine.conf().urls[node] + " came back meanwhile; try again";
+      }
+    }
+    fleet->answering = listing.answering;
+    return problem.empty() && hand_out(listing.complete, false, row, context) &&
+           hand_out(listing.ahead, true, row, context);
+  });
+  if (done < 0 && !problem.empty()) {
+    fleet->problem = problem;
+  }
+  return done;
 }
 
 int VORNFleetSelect(VORNFleet* fleet, const char* sql, VORNFleetRow row, void* context) {

@@ -44,6 +44,12 @@ typedef int (*VORNFleetRow)(void* context, int columns, char** values, char** na
 // breaks meanwhile. 0, or -1.
 int VORNFleetSelect(VORNFleet* fleet, const char* sql, VORNFleetRow row, void* context);
 
+// Hands out the complete runs by server and profile, the newest first: server, profile, number,
+// seconds since 1970 at which it started, seconds since the run before, 0; behind them, with 1,
+// those that don't count for the clock they come from is ahead. 0, or -1; also when a node answers
+// that didn't the last time: what was read in between may be of that one, which lacked some of it.
+int VORNFleetRuns(VORNFleet* fleet, VORNFleetRow row, void* context);
+
 // --- A report over the fleet --------------------------------------------------------------------
 
 // Adds the `real_path_*` keys of a new report in `folder` to `*hash`, whose key `report_list` is

@@ -3,6 +3,7 @@
 
 #include <array>
 #include <bit>
+#include <compare>
 #include <cstdint>
 #include <cstring>
 #include <string>
@@ -38,11 +39,12 @@ inline constexpr FleetTable kFleetContent{
     "content_group",
     "number UInt64, position UInt64, share String, path String, size Int64, mtime Int64",
     "position"};
-// The run itself, which counts once its line is there. `since_last`: seconds since the run before;
-// `report`: its facts.
+// The run itself, which counts once its line is there and, where replicas are behind, `row_count`
+// rows of the other tables. `since_last`: seconds since the run before; `report`: its facts.
 inline constexpr FleetTable kFleetRun{
     "run",
-    "started Int64, finished Int64, files UInt64, bytes UInt64, since_last Int64, report String",
+    "started Int64, finished Int64, files UInt64, bytes UInt64, since_last Int64, "
+    "row_count UInt64, report String",
     "run"};
 inline constexpr std::array kFleetTables{&kFleetFile, &kFleetRow, &kFleetContent, &kFleetRun};
 
@@ -72,6 +74,7 @@ void split_fleet_row(std::string& row, std::vector<char*>& fields);
 struct FleetPartition {
   std::string server, profile;
   std::uint64_t run = 0;
+  auto operator<=>(const FleetPartition&) const = default;
 };
 // False when `text` is none.
 bool read_partition(std::string_view text, FleetPartition& partition);
