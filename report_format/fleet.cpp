@@ -1,5 +1,6 @@
 #include "report_format/fleet.hpp"
 
+#include <algorithm>
 #include <charconv>
 
 namespace report_format {
@@ -71,6 +72,16 @@ bool take(std::string_view& text, char c) {
 }
 
 }  // namespace
+
+std::string fleet_column_names(const FleetTable& table) {
+  std::string names;
+  for (std::string_view rest = table.columns; !rest.empty();) {
+    const std::string_view column = rest.substr(0, rest.find(", "));
+    names += (names.empty() ? "" : ", ") + std::string(column.substr(0, column.find(' ')));
+    rest.remove_prefix(std::min(column.size() + 2, rest.size()));
+  }
+  return names;
+}
 
 void append_fleet_text(std::string& out, std::string_view text) {
   std::size_t plain = 0;

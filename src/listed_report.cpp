@@ -19,16 +19,22 @@ size_t within(uint64_t limit, size_t rows) {
 }
 
 // As report_row_writer() writes them.
-void write_block(FILE* data, const ListedReport& report, std::span<const ListedRow> rows) {
+// `are_foreign`: other servers have sent the rows, so that all of their texts are escaped.
+void write_block(FILE* data, const ListedReport& report, std::span<const ListedRow> rows,
+                 bool are_foreign) {
   if (!rows.empty()) {
     std::fprintf(data, "<script type='text/javascript'>\nvar %s = [\n", report.format.variable);
+  }
+  std::vector<ListedColumn> columns(report.columns.begin(), report.columns.end());
+  for (ListedColumn& column : columns) {
+    column.data_text = are_foreign ? ColumnText::kEscaped : column.data_text;
   }
   const char* row_before = "";
   for (const ListedRow& row : rows) {
     std::fputs(row_before, data);
     row_before = ",\n";
     write_data_fields(
-        data, report.columns, [&](size_t i) { return row[i].c_str(); }, report.module);
+        data, columns, [&](size_t i) { return row[i].c_str(); }, report.module);
   }
   std::fputs(rows.empty() ? "</script>\n" : "\n];\n</script>\n", data);
 }
@@ -75,7 +81,7 @@ int32_t run_listed_report(const ListedReport& report, const ReportArgs* args,
   if (!data || !csv) {
     return -1;
   }
-  write_block(data.get(), report, all.first(shown));
+  write_block(data.get(), report, all.first(shown), args->fleet != nullptr);
   write_csv(csv.get(), report, all.first(within(report.format.csv_limit, rows.size())));
   run_facts().rows[report.format.name] = {rows.size(), shown};
   const bool data_kept =

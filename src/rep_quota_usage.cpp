@@ -260,6 +260,7 @@ bool read_fleet(const FleetSource& fleet, QAZLLNode** list) {
   if (!run_over_fleet(fleet, kOverFleet, add_fleet_user, list, kModule)) {
     return false;
   }
+  run_facts().quotas.emplace();  // whose users are filled from what the servers have found out
   RowCounts& rows = run_facts().rows[report_format::kQuotaUsage.name];
   for (const QAZLLNode* node = *list; node != nullptr; node = node->next) {
     rows.rows += quota_volume_of(node)->filteredUsers;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <cstdlib>
+#include <cstring>
 #include <memory>
 #include <new>
 #include <string_view>
@@ -177,6 +178,13 @@ int add_fleet_sample(void* context, int columns, char** values, char** /*names*/
   enum Column { kVolume, kDays, kDate, kUsed, kFree, kPercent, kCount };
   if (columns != kCount ||
       std::any_of(values, values + kCount, [](const char* value) { return value == nullptr; })) {
+    return -1;
+  }
+  // They go into the page as they are.
+  if (std::any_of(values + kDays, values + kCount, [](const char* value) {
+        return value[std::strspn(value, "0123456789.-")] != '\0';
+      })) {
+    REPORT_LOG_ERR(kModule, __LINE__, "the samples of volume %s aren't numbers\n", values[kVolume]);
     return -1;
   }
   auto& list = *static_cast<QAZLLNode**>(context);

@@ -11,7 +11,9 @@
 #include "base/ctl.hpp"
 #include "base/stored_reports.hpp"
 #include "config/commands.hpp"
+#include "report_format/values.hpp"
 #include "schedule/removal.hpp"
+#include "vorn/admin/fleet.hpp"
 #include "vorn/admin/history.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/base/file_io.hpp"
@@ -161,7 +163,15 @@ void rename_profile(const Move& move) {
   if (!words.empty()) {
     schedule(move.name, words);
   }
-  if (!admin::forget_history(move.profile)) {
+  const bool is_forgotten = admin::forget_history(move.profile);
+  const std::string* fleet = profile.find("fleet");
+  if (fleet != nullptr && report_format::is_true(*fleet) &&
+      !admin::rename_fleet_runs(move.profile, move.name)) {
+    warn("the fleet keeps what " + move.profile +
+         " has sent under this name, and counts it twice " +
+         "after the next run; run vornctl fleet forget with the server's name and " + move.profile);
+  }
+  if (!is_forgotten) {
     throw host_failure("the history under the old name stays");
   }
   warn_of_jobs(move.profile);

@@ -4,6 +4,7 @@
 #include <CLI/CLI.hpp>
 #include <chrono>
 #include <ctime>
+#include <filesystem>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <optional>
@@ -15,7 +16,9 @@
 #include "base/child.hpp"
 #include "base/configuration.hpp"
 #include "base/ctl.hpp"
+#include "base/stored_reports.hpp"
 #include "base/texts.hpp"
+#include "config/checks.hpp"
 #include "fleet/commands.hpp"
 #include "report_format/facts_file.hpp"
 #include "report_format/reports.hpp"
@@ -149,7 +152,22 @@ std::vector<std::string> output_of(Child& child) {
   return lines;
 }
 
+// A report of a fleet belongs to no profile, so it isn't put among the reports of one.
+void check_folder(const std::string& folder) {
+  std::error_code no_such;
+  for (const Section& profile : read_profiles()) {
+    if (std::filesystem::equivalent(folder, folder_of_reports(profile), no_such)) {
+      throw Failure(folder + " holds the reports of profile " + profile.name +
+                    "; choose another folder");
+    }
+  }
+}
+
 void report(const ReportOptions& options) {
+  if (!options.reports.empty()) {
+    checked_value(profile_key("report_list"), options.reports);
+  }
+  check_folder(options.folder);
   if (!report_format::is_language_code(options.language)) {
     throw Failure("\"" + options.language + "\" is no language code", kWrongUsage);
   }
@@ -220,14 +238,16 @@ void add_fleet_commands(CLI::App& app) {
       ->type_name("SERVERS");
   report_command->callback([options] { report(*options); });
 
-  const auto server = std::make_shared<std::string>();
+  const auto forgotten = std::make_shared<std::pair<std::string, std::string>>();
   CLI::App* forget_command = group.add_subcommand("forget", "Remove a server's rows");
-  forget_command->add_option("SERVER", *server, "Name of the server in the fleet")
+  forget_command->add_option("SERVER", forgotten->first, "Name of the server in the fleet")
       ->type_name("")
       ->required();
-  forget_command->callback([server] {
-    if (!admin::forget_server(*server)) {
-      throw host_failure("the rows of " + *server + " can't be removed");
+  forget_command->add_option("PROFILE", forgotten->second, "Only what this profile has sent")
+      ->type_name("");
+  forget_command->callback([forgotten] {
+    if (!admin::forget_server(forgotten->first, forgotten->second)) {
+      throw host_failure("the rows of " + forgotten->first + " can't be removed");
     }
   });
 }

@@ -21,6 +21,10 @@ struct ReportEntry {
 // In the order in which reports run and stand on the page.
 std::span<const ReportEntry> report_registry();
 
+// Runs one report. That it failed is told, unless there is nothing to report: without quotas on any
+// volume the page says so by itself, and a volume that has them has had its own incident.
+void run_report(const ReportEntry& entry, ReportArgs& args);
+
 // A report is selected when its name occurs anywhere in the list.
 bool is_selected(const ReportEntry& entry, const char* report_list);
 

@@ -189,10 +189,10 @@ void tell_overdue(const std::vector<Run>& runs, int64_t now) {
   for (const Run& run : runs) {
     if (report_format::is_overdue(run.started, run.interval, now)) {
       const std::string name = run.server + " (" + run.profile + ")";
-      record_incident(
-          "server_overdue", name,
-          "server " + name + " is overdue: see to its runs, or vornctl fleet forget " + run.server,
-          AlreadyLogged::kYes);
+      record_incident("server_overdue", name,
+                      "server " + name + " is overdue: see to its runs, or vornctl fleet forget " +
+                          run.server + " " + run.profile,
+                      AlreadyLogged::kYes);
     }
   }
 }
@@ -210,7 +210,8 @@ void tell_repeated_shares(const std::vector<FleetMember>& members) {
         record_incident("share_overlap", name,
                         "share " + name +
                             " was sent by two profiles of its server, so sums count "
-                            "it twice; take fleet = true from one of them",
+                            "it twice; take fleet = true from one of them, and vornctl fleet "
+                            "forget what it has sent",
                         AlreadyLogged::kYes);
       }
     }
@@ -281,13 +282,7 @@ void run_reports(FleetRun& run, const std::string& report_list) {
     ReportArgs args{kProfile,         run.profile.get(), run.users.get(), run.volumes.get(),
                     run.shares.get(), nullptr,           nullptr,         0,
                     &run.source};
-    if (entry.report(&args) < 0) {
-      const bool lacks_quotas = entry.name == std::string_view(report_format::kQuotaUsage.name) &&
-                                run_facts().rows[entry.name].rows == 0;
-      if (!lacks_quotas) {
-        tell_failed_report(entry.name);
-      }
-    }
+    run_report(entry, args);
   }
 }
 

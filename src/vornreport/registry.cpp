@@ -13,6 +13,7 @@
 #include <array>
 #include <string_view>
 
+#include "facts/run_facts.hpp"
 #include "rep_coverage.hpp"
 #include "rep_duplicate_file/duplicate_file.hpp"
 #include "rep_file_age.hpp"
@@ -26,6 +27,7 @@
 #include "rep_share_list.hpp"
 #include "rep_volume_usage.hpp"
 #include "report_format/reports.hpp"
+#include "vornreport/report_data.hpp"
 
 namespace vornreport {
 namespace {
@@ -85,6 +87,16 @@ static_assert(names_stand_apart());
 
 std::span<const ReportEntry> report_registry() {
   return kRegistry;
+}
+
+void run_report(const ReportEntry& entry, ReportArgs& args) {
+  const auto found_no_quotas = [&] {
+    return entry.name == std::string_view(report_format::kQuotaUsage.name) && run_facts().quotas &&
+           run_facts().quotas->users().empty() && !report_data_lost();
+  };
+  if (entry.report(&args) < 0 && !found_no_quotas()) {
+    tell_failed_report(entry.name);
+  }
 }
 
 bool is_selected(const ReportEntry& entry, const char* report_list) {

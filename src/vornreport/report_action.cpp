@@ -95,13 +95,6 @@ bool load_volumes_and_shares(LookUps& look_ups) {
   return true;
 }
 
-// Without quotas on any volume there is nothing to report, which the page says by itself; a volume
-// that has them has had its own incident.
-bool found_no_quotas(std::string_view name) {
-  return name == report_format::kQuotaUsage.name && run_facts().quotas &&
-         run_facts().quotas->users().empty() && !report_data_lost();
-}
-
 // What the selected reports are going to ask the statistics database.
 struct Statements {
   std::vector<const char*> in_order;
@@ -144,10 +137,7 @@ int run_selected_reports(const char* profile, const VLIBCSzHash* profile_hash,
                     0};
     report_trace(kDriverModule, 280, "##### inject report=%s\n\n", entry.name);
     progress_report(entry.name);
-    // One failing report does not stop the others; it has logged why.
-    if (entry.report(&args) < 0 && !found_no_quotas(entry.name)) {
-      tell_failed_report(entry.name);
-    }
+    run_report(entry, args);
   }
   return result;
 }

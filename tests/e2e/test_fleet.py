@@ -456,6 +456,9 @@ class Fleet(FleetTest):
             where = f"'{text}', 'daily', {number + 1}"
             self.shards.ask(f"insert into file (server, profile, run, share, path, size, owner_name) "
                             f"values ({where}, '{text}', '/{text}', 7, '{text}')")
+            for report in ('folder_usage', 'file_age', 'coverage', 'growth'):
+                self.shards.ask('insert into report_row (server, profile, run, report, value) values '
+                                f"({where}, '{report}', [" + ', '.join([f"'{text}'"] * 7) + '])')
             self.shards.ask('insert into run (server, profile, run, started, report) values '
                             f"({where}, {int(time.time())}, '{{\"format\": 1}}')")
         page = (self.report(m) / 'report.html').read_text(errors='surrogateescape')
@@ -464,6 +467,38 @@ class Fleet(FleetTest):
             if '\udcff' not in name:
                 self.ctl(m, 'fleet', 'forget', name)
         self.assertEqual(self.shards.ask('select uniq(server) from run'), '1\n')
+
+    @needs_root
+    def test_what_is_others_stays_and_what_is_renamed_moves(self):
+        m = self.server('guest')
+        files = len(self.fill(m).files)
+        self.ctl(m, 'fleet', 'init')
+        self.send(m)
+        folder = m.base / 'fleet'
+        kept = [folder / name for name in ('template', '.notes.partial', 'csv')]
+        for path in kept:
+            path.mkdir(parents=True)
+            (path / 'mine').touch()
+        (folder / '.2020-01-02_03-04-05.partial').mkdir()
+        made = self.report(m)
+        self.assertTrue(all((path / 'mine').exists() for path in kept))
+        self.assertEqual(sorted(path.name for path in made.iterdir()),
+                         sorted(path.name for path in m.report_folders('daily')[-1].iterdir()))
+        self.assertEqual([path.name for path in folder.glob('.2*')], [])
+        for arguments, words in (((m.reports / 'daily',), 'the reports of profile daily'),
+                                 ((folder, '--reports', 'large_file,grwth'), 'did you mean "growth"')):
+            self.assertIn(words, self.ctl(m, 'fleet', 'report', *arguments, status=1).err)
+        before = [self.shards.ask(f'select profile, count() from {table} group by profile')
+                  for table in ('file', 'report_row', 'run')]
+        self.assertEqual(before[0], f'daily\t{files}\n')
+        self.ctl(m, 'profile', 'rename', 'daily', 'nightly')
+        self.assertEqual([self.shards.ask(f'select profile, count() from {table} group by profile')
+                          for table in ('file', 'report_row', 'run')],
+                         [rows.replace('daily', 'nightly') for rows in before])
+        self.assertEqual(facts(self.report(m))['incidents'], [])
+        self.ctl(m, 'fleet', 'forget', 'guest', 'daily', status=1)
+        self.ctl(m, 'fleet', 'forget', 'guest', 'nightly')
+        self.assertEqual(self.shards.ask('select count() from run'), '0\n')
 
     @needs_root
     def test_a_password_stays_on_this_machine(self):

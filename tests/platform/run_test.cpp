@@ -191,7 +191,7 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   ASSERT_EQ(VornQazProgressUpdate("killed", "far"), 0);
   write_file(own + "/2020-01-01_00-00-00/report.html", "old report");
   fs::create_directory_symlink(folder.path(), own + "/template");
-  fs::create_directory_symlink(folder.path(), own + "/.x.partial");
+  fs::create_directory_symlink(folder.path(), own + "/.2025-01-02_03-04-05.partial");
   write_file("/usr/vorn/var/stat/other/stat.db", "");
   const pid_t dead = support::fork_child([] { return 0; });
   support::wait_child(dead);
@@ -210,7 +210,7 @@ TEST_F(Run, ANewRunRemovesWhatAKilledOneLeft) {
   // While it lives, clearing up takes nothing from it.
   ASSERT_EQ(init("killed", 0), 0);
   EXPECT_EQ(VornQazReportCleanTmp("killed", hash.get()), 0);
-  EXPECT_TRUE(exists(database) && exists(own + "/.x.partial") && exists(data));
+  EXPECT_TRUE(exists(database) && exists(own + "/.2025-01-02_03-04-05.partial") && exists(data));
   EXPECT_EQ(read_file(VORN_PATH_PROGRESS "/killed"), "far");
   other.end();
 

@@ -111,16 +111,26 @@ std::optional<std::vector<FleetRun>> fleet_runs(std::int64_t now) {
   return told;
 }
 
-bool forget_server(const std::string& server) {
+bool rename_fleet_runs(const std::string& from, const std::string& to) {
+  const host::FleetReading reading = host::read_fleet_conf();
+  if (!reading.conf) {
+    return tell(reading.problem);
+  }
+  host::Engine engine(*reading.conf);
+  return tell(host::rename_runs(engine, from, to));
+}
+
+bool forget_server(const std::string& server, const std::string& profile) {
   const auto conf = configuration();
   if (!conf) {
     return false;
   }
   host::Engine engine(*conf);
   std::size_t dropped = 0;
-  return tell(host::drop_server(engine, server, dropped)) &&
-         (dropped > 0 || tell("the fleet has no rows of server " + server +
-                              "; vornctl fleet status lists its servers"));
+  return tell(host::drop_server(engine, server, profile, dropped)) &&
+         (dropped > 0 || tell("the fleet has no rows of " +
+                              (profile.empty() ? "" : "profile " + profile + " of ") + "server " +
+                              server + "; vornctl fleet status lists its servers"));
 }
 
 }  // namespace admin

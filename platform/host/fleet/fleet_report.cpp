@@ -24,6 +24,7 @@ namespace host {
 namespace {
 
 constexpr char kName[] = "fleet";  // in messages and on the page
+constexpr char kPageParts[] = "/template";
 
 // Locked while a report is being made there.
 Fd& folder_in_use() {
@@ -76,7 +77,8 @@ bool begin(std::string folder, VLIBCSzHash& hash) {
     remove_temporary_names(getpid());
     return false;
   }
-  hash.set("real_path_template", folder + "/template");
+  // FOLDER may be anybody's, so nothing beside the report is touched.
+  hash.set("real_path_template", run.unfinished + kPageParts);
   hash.set("real_path_date", run.unfinished);
   hash.set("real_path_date_final", run.finished);
   hash.set("real_path_report_final", run.page);
@@ -91,7 +93,9 @@ int end(bool is_made) {
     return -1;
   }
   remove_temporary_names(getpid());
-  const bool is_whole = end_report(*report_run(), is_made);
+  const bool is_clear = remove_tree(report_run()->unfinished + kPageParts) &&
+                        remove_tree(report_run()->finished + kPageParts);
+  const bool is_whole = end_report(*report_run(), is_made && is_clear);
   const std::string folder = report_run()->finished.substr(0, report_run()->finished.rfind('/'));
   report_run().reset();
   folder_in_use() = Fd();  // the list has a turn of its own

@@ -347,16 +347,49 @@ std::string drop_old_runs(Engine& engine, const FleetListing& listing) {
   });
 }
 
-std::string drop_server(Engine& engine, const std::string& server, std::size_t& dropped) {
+std::string drop_server(Engine& engine, const std::string& server, const std::string& profile,
+                        std::size_t& dropped) {
   std::set<std::pair<std::string, std::uint64_t>> runs;
   std::string problem = drop_where(engine, [&](const FleetPartition& partition, bool /*line*/) {
-    if (partition.server == server) {
+    const bool is_named =
+        partition.server == server && (profile.empty() || partition.profile == profile);
+    if (is_named) {
       runs.emplace(partition.profile, partition.run);
     }
-    return partition.server == server;
+    return is_named;
   });
   dropped = runs.size();
   return problem;
+}
+
+std::string rename_runs(Engine& engine, const std::string& from, const std::string& to) {
+  const FleetConf& conf = engine.conf();
+  FleetListing listing;
+  if (std::string problem = list_runs(engine, listing); !problem.empty()) {
+    return problem;
+  }
+  const std::vector<FleetRun> runs = newest_runs(listing);
+  const auto run = std::find_if(runs.begin(), runs.end(), [&](const FleetRun& one) {
+    return is_of_one(one, conf.server, from);
+  });
+  if (run == runs.end()) {
+    return "";
+  }
+  // Once, on one node, whatever replicas there are. The run's line is the last one.
+  for (const FleetTable* table : report_format::kFleetTables) {
+    const std::string columns = report_format::fleet_column_names(*table);
+    if (!engine.execute(conf.home(), "insert into " + qualified(conf, conf.part_of(table->name)) +
+                                         " (server, profile, run, " + columns +
+                                         ") select server, " + fleet_literal(to) + ", run, " +
+                                         columns + " from " + qualified(conf, table->name) +
+                                         " where server = " + fleet_literal(conf.server) +
+                                         " and profile = " + fleet_literal(from) +
+                                         " and run = " + std::to_string(run->run))) {
+      return engine.problem();
+    }
+  }
+  std::size_t dropped = 0;
+  return drop_server(engine, conf.server, from, dropped);
 }
 
 }  // namespace host

@@ -314,7 +314,8 @@ std::optional<std::vector<std::string>> unfinished_reports(const std::string& fo
     return std::nullopt;
   }
   for (const std::string& name : entries_of(opened)) {
-    if (name.size() > kUnfinished.size() && name.starts_with('.') && name.ends_with(kUnfinished)) {
+    if (name.size() > kUnfinished.size() && name.starts_with('.') && name.ends_with(kUnfinished) &&
+        is_report_name(std::string_view(name).substr(1, name.size() - 1 - kUnfinished.size()))) {
       found.push_back(folder);
       found.back().append("/").append(name);
     }

@@ -48,6 +48,9 @@ inline constexpr FleetTable kFleetRun{
     "run"};
 inline constexpr std::array kFleetTables{&kFleetFile, &kFleetRow, &kFleetContent, &kFleetRun};
 
+// "id, owner, …": the names of `table.columns`.
+std::string fleet_column_names(const FleetTable& table);
+
 // In a cluster each node keeps its part of a table under the name with this behind it.
 inline constexpr std::string_view kFleetPart = "_part";
 

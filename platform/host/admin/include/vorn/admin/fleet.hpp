@@ -26,7 +26,10 @@ struct FleetRun {
 // By server and profile, as of `now`; older runs are dropped.
 std::optional<std::vector<FleetRun>> fleet_runs(std::int64_t now);
 
-// Removes all rows of a server.
-bool forget_server(const std::string& server);
+// Removes all rows of a server, or those of one profile unless `profile` is empty.
+bool forget_server(const std::string& server, const std::string& profile);
+// Has what a profile of this server has sent stand under its new name. Nothing to do, and true,
+// where it has sent nothing or no fleet is configured.
+bool rename_fleet_runs(const std::string& from, const std::string& to);
 
 }  // namespace admin
