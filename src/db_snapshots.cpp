@@ -1,5 +1,6 @@
 #include "db_snapshots.hpp"
 
+#include <algorithm>
 #include <cstdlib>
 
 #include "facts/run_facts.hpp"
@@ -127,6 +128,20 @@ void cut(Snapshots& history, int64_t time, const SnapshotText& text) {
               ", details = " + history.quoted(to_text(*set).details) + history.own() + at(time));
 }
 
+// The time that ages are seen from: `now`, but no more than a week beyond the day that is the fifth
+// with finished reports, counted back from it. A clock that is years ahead has no such days, and
+// for it all sets would be old. Nothing while there are fewer days.
+std::optional<int64_t> trusted_time(Snapshots& history, int64_t now) {
+  constexpr int64_t kDays = 5, kAhead = 7 * kDay;
+  std::optional<int64_t> trusted;
+  history.each(
+      "SELECT max(time) AS newest FROM Snapshot WHERE valid = 1 AND time <= " +
+          std::to_string(now) + " GROUP BY time / " + std::to_string(kDay) +
+          " ORDER BY newest DESC LIMIT 1 OFFSET " + std::to_string(kDays - 1),
+      [&](const auto& column) { trusted = std::min(now, to_time(column("newest")) + kAhead); });
+  return trusted;
+}
+
 void thin_out(Snapshots& history, int64_t now) {
   const std::string old =
       history.own() + kValid + " AND time < " + std::to_string(now - kAllDays * kDay);
@@ -177,7 +192,9 @@ bool SnapshotMarkValid(const std::string& profile, int64_t time, int64_t now) {
       !history.run("UPDATE OR REPLACE Snapshot SET time = -time, valid = 1" + pending)) {
     return false;
   }
-  thin_out(history, now);
+  if (const auto trusted = trusted_time(history, now)) {
+    thin_out(history, *trusted);
+  }
   return true;
 }
 

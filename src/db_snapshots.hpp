@@ -26,7 +26,9 @@ bool SnapshotStorePending(const std::string& profile, Snapshot set);
 // Makes the profile's set of `time` count, in the place of one of the same second, and thins out:
 // all sets of the last 40 days stay, of older ones the first of each week, with their largest
 // folders; of all profiles those older than two years go. Times after `now`, of a clock that was
-// ahead, stay until they are past. False when the set doesn't count, as when it isn't there.
+// ahead, stay until they are past; and a clock is believed only a week ahead of five days on which
+// reports were finished, so that a wrong one thins out nothing. False when the set doesn't count,
+// as when it isn't there.
 bool SnapshotMarkValid(const std::string& profile, int64_t time, int64_t now);
 
 // Removes the set that the profile's run of `time` has stored, whether it counts or not.

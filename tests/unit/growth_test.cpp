@@ -286,6 +286,25 @@ TEST_F(GrowthTest, ThinsOut) {
   EXPECT_NEAR(static_cast<double>(weeks), (730 - 40) / 7.0, 1.5);
 }
 
+TEST_F(GrowthTest, AClockThatIsAheadThinsOutNothing) {
+  for (const auto& [days_ahead, kept] : {std::pair{0, 31U}, {1, 31U}, {4, 31U}, {5, 1U}}) {
+    unlink(VORN_PATH_HISTORY_DB);
+    const auto finish = [](int64_t time) {
+      return store(time) && SnapshotMarkValid("p", time, time);
+    };
+    for (int64_t day = 30; day > 0; --day) {
+      ASSERT_TRUE(finish(kNow - day * kDay));
+    }
+    for (int64_t day = 0; day < days_ahead; ++day) {
+      ASSERT_TRUE(finish(kNow + (1000 + day) * kDay) && finish(kNow + (1000 + day) * kDay + 1));
+    }
+    ASSERT_TRUE(finish(kNow));
+    auto times = SnapshotTimes("p").value();
+    std::erase_if(times, [](int64_t time) { return time > kNow; });
+    EXPECT_EQ(times.size(), kept) << days_ahead;
+  }
+}
+
 TEST_F(GrowthTest, ABrokenDatabaseIsToldOnce) {
   support::write_file(VORN_PATH_HISTORY_DB, "no database, and long enough to be taken for one");
   printed([] {
