@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <deque>
+#include <list>
 #include <map>
 #include <optional>
 #include <string>
@@ -144,7 +144,7 @@ class WaitingBuckets {
     return 0;
   }
 
-  std::deque<Bucket> buckets_;
+  std::list<Bucket> buckets_;  // a global one: a deque would allocate before main
   size_t files_ = 0;
   uint64_t work_ = 0;  // bytes, at most, to be read of them
 };

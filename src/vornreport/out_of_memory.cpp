@@ -39,15 +39,23 @@ std::unique_ptr<char[]> g_reserve;
   _exit(0);  // as every run that fails
 }
 
+// What has no room for the reserve has none for a line in the log either, nor for an exception.
+[[noreturn]] void end_unbegun() {
+  constexpr char kLine[] = "out of memory before the run began; raise its limit of memory\n";
+  static_cast<void>(!write(STDERR_FILENO, kLine, sizeof kLine - 1));
+  _exit(1);
+}
+
 }  // namespace
 
 void end_without_memory(const char* profile, const VLIBCSzHash* profile_hash) {
   g_profile = profile;
   g_profile_hash = profile_hash;
-  std::set_new_handler(end_run);  // first: the reserve may be what there is no room for
   if (!g_reserve) {
+    std::set_new_handler(end_unbegun);
     g_reserve = std::make_unique<char[]>(kReserve);
   }
+  std::set_new_handler(end_run);
 }
 
 void release_memory_reserve() {
