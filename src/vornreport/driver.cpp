@@ -1,14 +1,19 @@
 #include "driver.hpp"
 
 #include <getopt.h>
+#include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
+#include <cstdio>
+#include <cstring>
 
 #include "actions.hpp"
 #include "facts/run_facts.hpp"
 #include "out_of_memory.hpp"
 #include "sigterm.hpp"
 #include "temp_files.hpp"
+#include "vorn/paths.h"
 #include "vorn/report.h"
 
 int32_t gACT = 0;
@@ -24,6 +29,16 @@ const option kOptions[] = {
     {"clean", no_argument, &gACT, kClean},
     {nullptr, 0, nullptr, 0},
 };
+
+// People clean by hand, where nobody reads the log; and to who may not even read the configuration
+// there would be no profiles.
+void tell_missing_rights() {
+  if (access(VORN_PATH_STAT, W_OK) != 0 && errno != ENOENT) {
+    std::fprintf(stderr, "vornreport: %s can't be written (%s), so nothing is cleaned; %s\n",
+                 VORN_PATH_STAT, std::strerror(errno),
+                 errno == EROFS ? "mount it for writing" : "run this as root");
+  }
+}
 
 }  // namespace
 
@@ -48,6 +63,7 @@ int run(int argc, char** argv) {
       }
       break;
     case kClean:
+      tell_missing_rights();
       clean_action(argv);
       break;
     default:

@@ -86,6 +86,8 @@ class Clean(ProductTest):
                 self.assertEqual({path.name for path in (self.m.vorn / 'var/stat').iterdir()},
                                  databases - stat | {'kept'})
                 self.assertEqual(self.m.config.read_bytes(), b''.join((parts | changed).values()))
+        as_nobody = f'exec setpriv --reuid 65534 --regid 65534 --clear-groups {PROGRAM} --clean'
+        self.assertRegex(self.m.shell(as_nobody).err, '^vornreport: .*; run this as root\n')
 
 
 class Mail(ProductTest):
