@@ -116,16 +116,21 @@ std::optional<Snapshot> checked(std::optional<Snapshot> set, int64_t time) {
   return set;
 }
 
-// The set keeps what it has, but for its smaller folders.
-void cut(Snapshots& history, int64_t time, const SnapshotText& text) {
+// The set keeps what it has, but for its smaller folders and users that nobody asks for any more.
+void cut(Snapshots& history, int64_t time, const SnapshotText& text, int64_t now) {
   std::optional<Snapshot> set = checked(snapshot_of(time, text), time);
   if (!set) {
     history.run("DELETE FROM Snapshot" + history.own() + at(time));
     return;
   }
   set->cut_folders(kMostOldFolders);
+  if (time < now - kSampleDays * kDay) {
+    set->quotas.clear();
+  }
+  const SnapshotText kept = to_text(*set);
   history.run("UPDATE Snapshot SET folders = " + std::to_string(set->folder_count()) +
-              ", details = " + history.quoted(to_text(*set).details) + history.own() + at(time));
+              ", summary = " + history.quoted(kept.summary) +
+              ", details = " + history.quoted(kept.details) + history.own() + at(time));
 }
 
 // The time that ages are seen from: `now`, but no more than a week beyond the day that is the fifth
@@ -149,16 +154,18 @@ void thin_out(Snapshots& history, int64_t now) {
   history.run("DELETE FROM Snapshot" + old + " AND time NOT IN (SELECT min(time) FROM Snapshot" +
               old + " GROUP BY time / " + std::to_string(7 * kDay) + ")");
   std::vector<int64_t> large;
-  history.each(
-      "SELECT time FROM Snapshot" + old + " AND folders > " + std::to_string(kMostOldFolders),
-      [&](const auto& column) { large.push_back(to_time(column("time"))); });
+  history.each("SELECT time FROM Snapshot" + old + " AND (folders > " +
+                   std::to_string(kMostOldFolders) + " OR (time < " +
+                   std::to_string(now - kSampleDays * kDay) +
+                   " AND instr(summary, char(10) || 'q' || char(9)) > 0))",
+               [&](const auto& column) { large.push_back(to_time(column("time"))); });
   for (const int64_t time : large) {
     SnapshotText text;
     history.each("SELECT summary, details FROM Snapshot" + history.own() + at(time),
                  [&](const auto& column) {
                    text = {column("summary"), column("details")};
                  });
-    cut(history, time, text);
+    cut(history, time, text, now);
   }
 }
 
@@ -236,21 +243,32 @@ std::optional<Snapshot> SnapshotRead(const std::string& profile, int64_t time) {
   return set;
 }
 
-std::optional<SnapshotSamples> SnapshotSamplesOf(const std::string& profile, int64_t since,
-                                                 int64_t until) {
+std::optional<SnapshotSamples> SnapshotSamplesOf(
+    const std::string& profile, int64_t until,
+    const std::vector<report_format::QuotaFacts>& users) {
   Snapshots history(profile);
   SnapshotSamples samples;
-  const auto add = [&](const auto& column) {
-    const int64_t time = to_time(column("time"));
-    if (const auto set = checked(snapshot_of(time, {column("summary"), ""}), time)) {
-      samples.add(*set);
-    }
-  };
-  if (!history.is_ready() ||
-      !history.each("SELECT time, summary FROM Snapshot" + history.own() + kValid +
-                        " AND time >= " + std::to_string(since) +
-                        " AND time <= " + std::to_string(until) + " ORDER BY time",
-                    add)) {
+  for (const report_format::QuotaFacts& user : users) {
+    samples.users[{user.volume, user.user}];
+  }
+  std::vector<int64_t> times;
+  bool is_read =
+      history.is_ready() &&
+      history.each("SELECT time FROM Snapshot" + history.own() + kValid +
+                       " AND time >= " + std::to_string(until - kSampleDays * kDay) +
+                       " AND time <= " + std::to_string(until) + " ORDER BY time",
+                   [&](const auto& column) { times.push_back(to_time(column("time"))); });
+  // One by one: a set holds every user.
+  for (size_t i = 0; is_read && i < times.size(); ++i) {
+    is_read = history.each(
+        "SELECT summary FROM Snapshot" + history.own() + kValid + at(times[i]),
+        [&](const auto& column) {
+          if (const auto set = checked(snapshot_of(times[i], {column("summary"), ""}), times[i])) {
+            samples.add(*set);
+          }
+        });
+  }
+  if (!is_read) {
     tell_lost(kNoneRead);
     return std::nullopt;
   }

@@ -279,7 +279,7 @@ void tell_failure(const char* volume) {
       AlreadyLogged::kYes);
 }
 
-void note_volume(const QuotaVolume& volume) {
+void note_volume(QuotaVolume& volume) {
   RunFacts& facts = run_facts();
   RowCounts& rows = facts.rows[report_format::kQuotaUsage.name];
   rows.rows += volume.filteredUsers;
@@ -287,7 +287,7 @@ void note_volume(const QuotaVolume& volume) {
   if (!facts.quotas) {
     facts.quotas.emplace();
   }
-  facts.quotas->add(volume.tally);
+  facts.quotas->add(std::move(volume.tally));
 }
 
 void read_volume(const VORNMountVolInfo& record, QAZLLNode** list, const VLIBCSzHash* user_hash) {

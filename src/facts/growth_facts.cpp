@@ -174,9 +174,7 @@ Snapshot take_snapshot(const RunFacts& run, const Tallies& tallies,
          folder.amount});
   }
   if (run.quotas) {
-    for (const report_format::QuotaFacts& user : run.quotas->kept()) {
-      set.quotas.push_back({user.volume, user.user, user.used, user.quota});
-    }
+    set.quotas = run.quotas->all();
   }
   return set;
 }

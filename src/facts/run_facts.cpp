@@ -21,6 +21,7 @@ void QuotaTally::add(std::string volume, std::string user, uint64_t used, uint64
   if (quota == 0) {
     return;
   }
+  all_.push_back({volume, user, used, quota});
   report_format::QuotaFacts facts;
   facts.volume = std::move(volume);
   facts.user = std::move(user);
@@ -32,7 +33,8 @@ void QuotaTally::add(std::string volume, std::string user, uint64_t used, uint64
   keep(std::move(facts));
 }
 
-void QuotaTally::add(const QuotaTally& other) {
+void QuotaTally::add(QuotaTally&& other) {
+  std::move(other.all_.begin(), other.all_.end(), std::back_inserter(all_));
   pressing_ += other.pressing_;
   for (const report_format::QuotaFacts& facts : other.users_) {
     keep(facts);
@@ -40,14 +42,13 @@ void QuotaTally::add(const QuotaTally& other) {
 }
 
 std::vector<report_format::QuotaFacts> QuotaTally::users() const {
-  const size_t count = std::min(users_.size(), kMostUsers);
-  return {users_.begin(), std::next(users_.begin(), static_cast<std::ptrdiff_t>(count))};
+  return {users_.begin(), users_.end()};
 }
 
 // Behind those that are as pressing.
 void QuotaTally::keep(report_format::QuotaFacts facts) {
   users_.insert(std::move(facts));
-  if (users_.size() > kMost) {
+  if (users_.size() > kMostUsers) {
     users_.erase(std::prev(users_.end()));
   }
 }

@@ -30,20 +30,20 @@ struct RowCounts {
   uint64_t shown = 0;  // of these, in the page
 };
 
-// The users nearest to their soft limits or over them, on all volumes.
+// The users with soft limits on all volumes, and which of them are nearest to theirs or over.
 class QuotaTally {
  public:
   static constexpr size_t kMostUsers = 20;
-  static constexpr size_t kMost = 2000;  // for those who come to be among them later
 
   // Sizes in bytes; a user without a limit isn't counted.
   void add(std::string volume, std::string user, uint64_t used, uint64_t quota);
   // Adds what another tally has counted.
-  void add(const QuotaTally& other);
+  void add(QuotaTally&& other);
   // The most pressing first, at most kMostUsers; of equal ones those that were added first.
   std::vector<report_format::QuotaFacts> users() const;
-  // In the same order, at most kMost.
-  const auto& kept() const { return users_; }
+  // All as they were added, for those who come to be among the most pressing later. What they take
+  // is in proportion to the server's accounts, which a run knows by name anyway.
+  const std::vector<SnapshotQuota>& all() const { return all_; }
   // All that are near or over, those that aren't kept included.
   uint64_t pressing() const { return pressing_; }
 
@@ -58,6 +58,7 @@ class QuotaTally {
   void keep(report_format::QuotaFacts facts);
 
   Users users_;
+  std::vector<SnapshotQuota> all_;
   uint64_t pressing_ = 0;
 };
 

@@ -324,7 +324,9 @@ void SnapshotSamples::add(const Snapshot& snapshot) {
     }
   }
   for (const SnapshotQuota& quota : snapshot.quotas) {
-    users[{quota.volume, quota.user}].push_back({snapshot.time, quota.used});
+    if (const auto user = users.find({quota.volume, quota.user}); user != users.end()) {
+      user->second.push_back({snapshot.time, quota.used});
+    }
   }
 }
 

@@ -70,8 +70,9 @@ std::optional<Snapshot> snapshot_of(int64_t time, const SnapshotText& text);
 // What earlier runs saw of a thing: samples in order of time.
 struct SnapshotSamples {
   using Samples = std::vector<report_format::Sample>;
-  std::map<std::string, Samples> shares;                         // those read as a whole
-  std::map<std::pair<std::string, std::string>, Samples> users;  // by volume and user
+  std::map<std::string, Samples> shares;  // those read as a whole
+  // By volume and user: of those that are there already, or every set's users would take memory.
+  std::map<std::pair<std::string, std::string>, Samples> users;
   void add(const Snapshot& snapshot);
 };
 

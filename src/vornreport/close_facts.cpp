@@ -24,7 +24,6 @@ namespace vornreport {
 namespace {
 
 constexpr int64_t kDay = 86400;
-constexpr int64_t kHistoryDays = 91;  // 90 calendar days begin somewhere in the day before
 
 using Text = std::array<char, 256>;
 
@@ -57,10 +56,12 @@ FactsSource source_of(const char* report_list) {
   source.now = std::time(nullptr);
   source.report_list = report_list;
   source.has_walked = gathers(report_list);
-  if (auto samples = VolumeUsageSamples(source.now - kHistoryDays * kDay)) {
+  const std::optional<QuotaTally>& quotas = run_facts().quotas;
+  if (auto samples = VolumeUsageSamples(source.now - kSampleDays * kDay)) {
     source.samples = std::move(*samples);
-    if (auto seen =
-            SnapshotSamplesOf(run_facts().profile, source.now - kHistoryDays * kDay, source.now)) {
+    if (auto seen = SnapshotSamplesOf(
+            run_facts().profile, source.now,
+            quotas ? quotas->users() : std::vector<report_format::QuotaFacts>())) {
       source.snapshots = std::move(*seen);
     }
   } else {

@@ -145,8 +145,12 @@ TEST_F(FactsTest, QuotasNearestToTheirLimit) {
   for (uint64_t i = 1; i <= 30; ++i) {
     (i % 2 == 0 ? tally : other).add("/", "u" + std::to_string(i), 80 + i, 100);
   }
+  for (int i = 0; i < 3000; ++i) {
+    tally.add("/", "calm", 1, 100);
+  }
   tally.add("/", "unlimited", 1'000'000, 0);
-  tally.add(other);
+  tally.add(std::move(other));
+  EXPECT_EQ(tally.all().size(), 3030U);
   ASSERT_EQ(tally.users().size(), 20U);
   EXPECT_EQ(tally.users().front().user, "u30");
   EXPECT_EQ(tally.users().back().user, "u11");

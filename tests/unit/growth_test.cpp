@@ -50,6 +50,7 @@ class GrowthTest : public UnitTest {
     for (size_t i = 0; i < folder_count; ++i) {
       set.shares[0].folders.push_back({"f" + std::to_string(i), "/v", {1, i}});
     }
+    set.quotas = {{"/v", "anna", 1, 2}, {"/v", "bert", 1, 2}};
     return SnapshotStorePending(profile, std::move(set));
   }
 };
@@ -251,8 +252,14 @@ TEST_F(GrowthTest, OnlyFinishedRunsCount) {
   SnapshotDrop("p", kNow);
   EXPECT_EQ(SnapshotTimes("p"), std::vector<int64_t>{kNow - 20});
   EXPECT_TRUE(SnapshotMarkValid("other", kNow - 15, kNow));  // another profile's run goes on
-  EXPECT_EQ(SnapshotSamplesOf("other", kNow - 15, kNow)->shares.at("a").size(), 1U);
-  EXPECT_TRUE(SnapshotSamplesOf("other", kNow - 14, kNow)->shares.empty());
+  report_format::QuotaFacts user;
+  user.volume = "/v";
+  user.user = "anna";
+  const auto samples = SnapshotSamplesOf("other", kNow - 15, {user});
+  EXPECT_EQ(samples->shares.at("a").size(), 1U);
+  EXPECT_EQ(samples->users.size(), 1U);
+  EXPECT_EQ(samples->users.at({"/v", "anna"}).size(), 1U);
+  EXPECT_TRUE(SnapshotSamplesOf("other", kNow - 16, {user})->shares.empty());
 }
 
 TEST_F(GrowthTest, ThinsOut) {
@@ -275,6 +282,7 @@ TEST_F(GrowthTest, ThinsOut) {
                                    : age > 36 && age <= 40 ? 2000U
                                                            : 0U)
         << age;
+    EXPECT_EQ(set->quotas.size(), age > 91 ? 0U : 2U) << age;
     weeks += age > 40 ? 1 : 0;
     EXPECT_FALSE(age > 47 && (times[i] - times[i - (i > 0 ? 1 : 0)]) % (7 * kDay) != 0) << age;
     if (set->folder_count() != 0) {  // the largest ones
