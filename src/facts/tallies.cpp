@@ -36,10 +36,8 @@ ShareTally::ShareTally(std::string name, std::string path, std::string volume)
 
 void ShareTally::enter(dev_t device, const char* path, CountedElsewhere elsewhere) {
   const bool is_same = !inside_.empty() && inside_.back().device == device;
-  const bool is_counted = elsewhere == CountedElsewhere::kYes ||
-                          (!inside_.empty() && inside_.back().elsewhere == CountedElsewhere::kYes);
   inside_.push_back({device, is_same ? inside_.back().volume : volume_of(device, path),
-                     is_counted ? CountedElsewhere::kYes : CountedElsewhere::kNo});
+                     std::max(elsewhere, this->elsewhere())});
 }
 
 void ShareTally::leave() {
@@ -48,7 +46,7 @@ void ShareTally::leave() {
 
 bool ShareTally::is_counted_elsewhere(const char* path) const {
   if (!inside_.empty()) {
-    return inside_.back().elsewhere == CountedElsewhere::kYes;
+    return elsewhere() == CountedElsewhere::kYes;
   }
   const std::string_view below =
       std::string_view(path).substr(std::min(path_.size() + 1, std::strlen(path)));

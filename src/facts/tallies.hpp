@@ -53,6 +53,10 @@ class ShareTally {
   void leave();
   // Where it is: the index of the volume.
   size_t here() const { return inside_.empty() ? 0 : inside_.back().volume; }
+  // Whether the files there are counted elsewhere.
+  CountedElsewhere elsewhere() const {
+    return inside_.empty() ? CountedElsewhere::kNo : inside_.back().elsewhere;
+  }
 
   // Counts a file that went into the statistics database. An index tells no device and no blocks.
   void file(const FileInfo& info, RowSource source, int64_t now);

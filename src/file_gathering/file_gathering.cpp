@@ -156,6 +156,7 @@ void note_selected_shares(const Gathering& gathering, const VLIBCSzHash* profile
       add_share_folder(share, path.c_str());
     }
   }
+  add_mounted_folders();
   errno = before;
 }
 

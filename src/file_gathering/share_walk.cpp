@@ -179,8 +179,9 @@ class Walk {
   };
 
   int read_folder(Folder& folder, size_t length) {
+    const bool counts = tally_ != nullptr && tally_->elsewhere() == CountedElsewhere::kNo;
     const Inside inside(folder, path_.c_str(),
-                        note_share_folder(folder.device, folder.inode, share_)
+                        note_share_folder(folder.device, folder.inode, share_, counts)
                             ? CountedElsewhere::kYes
                             : CountedElsewhere::kNo);
     if (length > top_length_ && tally_ != nullptr) {

@@ -70,6 +70,11 @@ TEST(Volumes, AreTheDevicesOfTheMountTable) {
   EXPECT_EQ((std::vector<std::string>{"/", "/run (no data)", "/srv/whole disk", "/home", "/over",
                                       "/gluster"}),
             paths_of(host::choose_volumes(mounts)));
+  std::string shared;
+  for (const host::Mount* mount : host::shared_mounts(mounts)) {
+    shared += mount->target + " ";
+  }
+  EXPECT_EQ("/ /srv/bind /srv/whole disk /mnt/h /data/long /home ", shared);
 }
 
 TEST(Volumes, OfAContainerAreWhereTheSharesAre) {

@@ -1,6 +1,7 @@
 // Walking, importing and gathering, over real folders and real SQLite files.
 #include <fcntl.h>
 #include <sqlite3.h>
+#include <sys/mount.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -245,6 +246,37 @@ TEST_F(GatheringTest, TellsOfSharesThatOverlap) {
     EXPECT_EQ(std::pair(share.allocated(), share.volumes().front().explained),
               expected.at(share.name()))
         << share.name();
+  }
+}
+
+// Folders that are mounted again, in their own share and in another's.
+TEST_F(GatheringTest, ExplainsWhatIsMountedTwiceOnce) {
+  write_file(folder_.path("one/from/deep/file"), "text");
+  write_file(folder_.path("one/own"), "text");
+  const std::pair<const char*, const char*> mounts[] = {
+      {"one/from", "one/again"}, {"one/from/deep", "two/deep"}, {"one", "two/all"}};
+  platform.shared_mounts = {"/", folder_.path("one/gone")};
+  for (const auto& [from, to] : mounts) {
+    std::filesystem::create_directories(folder_.path(to));
+    ASSERT_EQ(
+        mount(folder_.path(from).c_str(), folder_.path(to).c_str(), nullptr, MS_BIND, nullptr), 0);
+    platform.shared_mounts.push_back(folder_.path(to));
+  }
+  struct stat file {};
+  ASSERT_EQ(stat(folder_.path("one/own").c_str(), &file), 0);
+  const auto block = static_cast<uint64_t>(file.st_blocks) * 512;
+  platform.shares = {{"one", folder_.path("one")}, {"two", folder_.path("two")}};
+  for (const uint64_t explained : {2 * block, block}) {  // of the first share, then of the second
+    EXPECT_EQ(incidents(), "share_overlap one, two\n");
+    for (const ShareTally& share : tallies().shares()) {
+      EXPECT_EQ(share.allocated(), 3 * block) << share.name();
+      EXPECT_EQ(share.volumes().front().explained,
+                share.name() == "one" ? explained : 2 * block - explained);
+    }
+    std::swap(platform.shares[0], platform.shares[1]);
+  }
+  for (const auto& [from, to] : mounts) {
+    EXPECT_EQ(umount(folder_.path(to).c_str()), 0);
   }
 }
 

@@ -249,6 +249,13 @@ int VORNVolumeOfPath(const char* path, char* mount_path, size_t size) {
   return copied("/", mount_path, size);
 }
 
+int VORNMountSharedEnum(VLIBCSzList** list) {
+  for (const std::string& path : platform.shared_mounts) {
+    VLIBCSzListPush(list, path.c_str());
+  }
+  return static_cast<int>(platform.shared_mounts.size());
+}
+
 int VORNVolumeHasQuotas(const char* mount_path) {
   return platform.quotas.count(mount_path) != 0 ? 1 : 0;
 }

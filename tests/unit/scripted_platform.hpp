@@ -31,7 +31,8 @@ struct ScriptedPlatform {
     unsigned long long total_size;
   };
   std::vector<Volume> mounted;
-  TextMap volumes_of;            // folder to mount path, for what lies in it; else "/"
+  TextMap volumes_of;  // folder to mount path, for what lies in it; else "/"
+  std::vector<std::string> shared_mounts;
   std::set<std::string> quotas;  // mount paths of volumes that keep them
   std::vector<std::string> progress;
   std::map<std::string, std::string>

@@ -15,6 +15,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string_view>
@@ -177,6 +178,19 @@ std::vector<Mount> read_own_mounts() {
         mount.has_user_quotas || (mount.visible && mount.is_folder && counts_users(mount.target));
   }
   return mounts;
+}
+
+std::vector<const Mount*> shared_mounts(const std::vector<Mount>& mounts) {
+  std::map<dev_t, std::size_t> counts;
+  std::vector<const Mount*> found;
+  for (const Mount& mount : mounts) {
+    if (mount.visible && mount.is_folder && is_walked(mount.kind)) {
+      ++counts[mount.device];
+      found.push_back(&mount);
+    }
+  }
+  std::erase_if(found, [&](const Mount* mount) { return counts[mount->device] < 2; });
+  return found;
 }
 
 const Mount* mount_holding(const std::vector<Mount>& mounts, const char* path) {

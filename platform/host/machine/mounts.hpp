@@ -39,6 +39,9 @@ bool hangs(VornFsKind kind, const std::string& target);
 // network server could take for ever).
 std::vector<Mount> read_own_mounts();
 
+// Those of `mounts` that are visible folders of walked kinds on a device with several such mounts.
+std::vector<const Mount*> shared_mounts(const std::vector<Mount>& mounts);
+
 // The mount that holds `path` (links followed), or null.
 const Mount* mount_holding(const std::vector<Mount>& mounts, const char* path);
 

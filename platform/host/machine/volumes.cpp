@@ -234,6 +234,26 @@ int VORNVolumeOfPath(const char* path, char* mount_path, size_t size) try {
   return -1;
 }
 
+int VORNMountSharedEnum(VLIBCSzList** list) try {
+  if (list == nullptr || *list == nullptr) {
+    errno = EINVAL;
+    return -1;
+  }
+  const host::ErrnoKeeper keeper;
+  const std::vector<host::Mount> mounts = host::read_own_mounts();
+  int count = 0;
+  for (const host::Mount* mount : host::shared_mounts(mounts)) {
+    if (!host::hangs(mount->kind, mount->target)) {
+      (*list)->texts.push_back(mount->target);
+      ++count;
+    }
+  }
+  return count;
+} catch (...) {
+  errno = ENOMEM;
+  return -1;
+}
+
 int VORNVolumeHasQuotas(const char* mount_path) try {
   const host::ErrnoKeeper keeper;
   if (mount_path == nullptr) {

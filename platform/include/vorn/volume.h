@@ -42,6 +42,11 @@ int VornQazGetVolumePathHash(VLIBCSzHash** hash);
 // or -1 when it can't be told or doesn't fit.
 int VORNVolumeOfPath(const char* path, char* mount_path, size_t size);
 
+// Appends to `*list` the mount paths below which the files of another mount may be found again: of
+// each device with several mounts, each of a folder on a walked file system that answers. Their
+// number, or -1 for a null list or without memory.
+int VORNMountSharedEnum(VLIBCSzList** list);
+
 // Non-zero when the volume mounted at `mount_path` keeps users' quotas, by its mount options
 // or the kernel's word.
 int VORNVolumeHasQuotas(const char* mount_path);
