@@ -1,9 +1,10 @@
 // Measures the snapshots of two years of daily reports: how large the history gets, and what they
-// cost a run. To be run in the sandbox, whose history it fills:
+// cost a run, without users' quotas or with those of so many. To be run in the sandbox, whose
+// history it fills:
 //
 //   cmake --build build --target snapshots_bench vornreport
 //   DESTDIR=$PWD/build/bench-stage cmake --install build
-//   tools/sandbox.sh --stage build/bench-stage -- build/snapshots_bench
+//   tools/sandbox.sh --stage build/bench-stage -- build/snapshots_bench [USERS]
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
@@ -12,6 +13,7 @@
 
 #include "db_snapshots.hpp"
 #include "facts/growth.hpp"
+#include "facts/run_facts.hpp"
 #include "facts/snapshot.hpp"
 #include "vorn/paths.h"
 
@@ -23,6 +25,8 @@ constexpr int64_t kDay = 86400;
 constexpr int64_t kDays = 760;
 constexpr int64_t kNow = 1'800'000'000;
 constexpr size_t kShares = 40, kOwners = 500, kPairs = 4000, kTypes = 21, kFolders = 10'000;
+
+size_t g_users = 0;
 
 // A file server's names are this long, and its numbers.
 Snapshot set_of(int64_t time) {
@@ -52,7 +56,20 @@ Snapshot set_of(int64_t time) {
     share.parts.push_back(std::move(part));
     set.shares.push_back(std::move(share));
   }
+  for (size_t i = 0; i < g_users; ++i) {
+    set.quotas.push_back({"/srv/volume" + std::to_string(i % 4),
+                          "firstname.lastname" + std::to_string(i), kSize * i + grown,
+                          kSize << 20U});
+  }
   return set;
+}
+
+std::vector<report_format::QuotaFacts> told_users(const Snapshot& set) {
+  QuotaTally tally;
+  for (const SnapshotQuota& user : set.quotas) {
+    tally.add(user.volume, user.user, user.used, user.quota);
+  }
+  return tally.users();
 }
 
 // What a run does with snapshots. False when something failed.
@@ -71,14 +88,15 @@ bool run_at(int64_t now) {
       }
     }
   }
-  return SnapshotStorePending("p", set) && SnapshotSamplesOf("p", now, {}) &&
+  return SnapshotStorePending("p", set) && SnapshotSamplesOf("p", now, told_users(set)) &&
          SnapshotMarkValid("p", now, now);
 }
 
 }  // namespace
 
-int main() {
+int main(int argc, char** argv) {
   using Clock = std::chrono::steady_clock;
+  g_users = argc > 1 ? std::stoul(argv[1]) : 0;
   std::filesystem::remove(VORN_PATH_HISTORY_DB);
   double longest = 0;
   double sum = 0;
