@@ -6,7 +6,6 @@
 
 #include "support.hpp"
 #include "vorn/admin/configuration.hpp"
-#include "vorn/admin/messages.hpp"
 #include "vorn/admin/reports.hpp"
 #include "vorn/admin/runs.hpp"
 #include "vorn/paths.h"
@@ -44,22 +43,6 @@ TEST(AdminConfiguration, RunsDoWithoutWhatIsWrong) {
   fs::remove(VORN_PATH_CONFIG);
   EXPECT_FALSE(admin::read_profiles() || admin::examine_file(VORN_PATH_CONFIG));
   EXPECT_EQ(support::syslog_lines().size(), 2U);
-}
-
-TEST(AdminConfiguration, MessagesAreKeptOnceTheyAreAskedFor) {
-  EXPECT_NE(admin::keep_reports_problem("0"), "");
-  EXPECT_EQ(admin::keep_reports_problem("3"), "");
-  EXPECT_EQ(support::syslog_text(), "");
-  EXPECT_TRUE(support::passes_in_child([] {
-    EXPECT_TRUE(admin::take_messages().empty());
-    admin::is_profile_name("a b");
-    EXPECT_NE(admin::keep_reports_problem("0"), "");
-    const auto messages = admin::take_messages();
-    ASSERT_EQ(messages.size(), 1U);
-    EXPECT_NE(messages.front().find("no profile name"), std::string::npos);
-    EXPECT_TRUE(admin::take_messages().empty());
-  }));
-  EXPECT_EQ(support::syslog_text(), "");
 }
 
 TEST(AdminRuns, StateIsToldByHolderAndStatus) {

@@ -201,12 +201,6 @@ TEST_F(ActionsTest, TellWhatFailed) {
   }
 }
 
-TEST_F(ActionsTest, ReportFailsWhenThePlatformFindsNoReport) {
-  platform.success_result = 1;
-  EXPECT_EQ(run(report_action), -1);
-  EXPECT_EQ(platform.calls.back(), "StatusUpdate p1 success") << "what is stored is stored";
-}
-
 TEST_F(ActionsTest, TemplateLinkIsLeftAlone) {
   rmdir(folder_.path("template").c_str());
   ASSERT_EQ(symlink("/usr/vorn/vornreport", folder_.path("template").c_str()), 0);
@@ -223,14 +217,6 @@ TEST_F(ActionsTest, AReportThatCannotGetItsNameIsNone) {
     EXPECT_NE(output_.find("correct dir failed"), std::string::npos);
     EXPECT_EQ(platform.calls.back(), "StatusUpdate p1 fail");
   }));
-}
-
-TEST_F(ActionsTest, CollectCountsTheSelectedReports) {
-  for (const auto& [list, count] : {std::pair("large_file,share_list", 2), {"unknown", 0}}) {
-    platform.config["p1"]["report_list"] = list;
-    EXPECT_EQ(run(collect_action), count);
-    EXPECT_EQ(platform.calls.back(), "StatusUpdate p1 success");
-  }
 }
 
 TEST_F(ActionsTest, CleanWritesBackOnlyWhatChanged) {

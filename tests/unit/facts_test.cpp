@@ -363,22 +363,5 @@ TEST(FactsFile, IsAPlainFileOfNoGreatSize) {
   }
 }
 
-TEST(RunState, ReadsWhatItWrites) {
-  using namespace report_format;
-  const RunStatus status = status_of(status_text({kSuccess, "2026-11-21_04-00-02", 3}));
-  EXPECT_EQ(std::tuple(status.word, status.report, status.incidents),
-            std::tuple("success", "2026-11-21_04-00-02", 3));
-  EXPECT_EQ(status_text({kFail, "", 0}), "fail\n");
-  EXPECT_EQ(status_of("success\nnew = 1\nincidents = x\n").incidents, 0);
-  Progress progress{Phase::kReporting, "s\"\n\xff", 7, "large_file", 3, 9};
-  const auto read = progress_of(progress_text(progress));
-  ASSERT_TRUE(read);
-  EXPECT_EQ(std::tuple(read->phase, read->files, read->report, read->number, read->reports),
-            std::tuple(Phase::kReporting, 7U, "large_file", 3, 9));
-  for (const char* text : {"", "7", "{}", "{\"phase\":\"odd\"}", "{\"phase\":7}"}) {
-    EXPECT_FALSE(progress_of(text)) << text;
-  }
-}
-
 }  // namespace
 }  // namespace vornreport

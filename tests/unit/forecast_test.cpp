@@ -238,11 +238,6 @@ TEST(Forecast, RestsOnPairsThatLieApart) {
       // figures: a tenth of the way, 3 and 11 of 1 to 13.
       {"percentiles", series(7, [](int ago) { return 923.0 + (7 - ago) * (7 - ago) - 49; }),
        "growing 11 (7-26), 7 a day, 7"},
-      // Of five samples the smallest and the largest of the ten.
-      {"percentiles of few",
-       series(
-           28, [](int ago) { return 920.0 + 7 * (4 - ago / 7) * (4 - ago / 7) - 112; }, 7),
-       "growing 20 (11-80), 4 a day, 28"},
       // By 3 % once a week.
       {"steps of a week", series(35, [](int ago) { return 879.0 - 30 * ((ago + 3) / 7); }),
        "growing 28 (24-35), 4 a day, 30"},

@@ -102,7 +102,7 @@ int VornQazProfileRunning(const char* profile) {
 
 int VornQazStatusUpdate(const char* profile, const char* status) {
   record("StatusUpdate", profile, status);
-  return answer("StatusUpdate", std::strcmp(status, "success") == 0 ? platform.success_result : 0);
+  return answer("StatusUpdate");
 }
 
 int VornQazInitLocation(VLIBCSzHash** hash, int /*flags*/) {

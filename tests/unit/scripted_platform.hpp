@@ -45,7 +45,6 @@ struct ScriptedPlatform {
   std::string language = "en";
   std::string link = "http://files.example/report.html";
   int schedule_clean = 0;
-  int success_result = 0;  // of VornQazStatusUpdate
 
   // What was called, as "Name argument argument", those that only look up left out.
   std::vector<std::string> calls;

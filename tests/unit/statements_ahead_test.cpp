@@ -2,12 +2,10 @@
 #include "vornreport/statements_ahead.hpp"
 
 #include <csignal>
-#include <ctime>
 #include <filesystem>
 #include <vector>
 
 #include "report_fixture.hpp"
-#include "vornreport/registry.hpp"
 
 namespace vornreport {
 namespace {
@@ -105,53 +103,6 @@ TEST_F(StatementsAheadTest, ThosePassedOverHoldNobodyUp) {
 TEST_F(StatementsAheadTest, RunWhenAskedForIfTheyCannotBegin) {
   const StatementsAhead ahead("/nowhere/stat.db", std::vector{"select 1"});
   EXPECT_EQ(seen(run_statement, db_.get(), "select 1"), seen(sqlite3_exec, db_.get(), "select 1"));
-}
-
-// The page and the CSV files of all reports, and what they print.
-TEST_F(StatementsAheadTest, ChangeNoReport) {
-  sqlite3_exec(db_.get(), "BEGIN", nullptr, nullptr, nullptr);
-  platform.users = {{"ann", 0}, {"bob", 1}};
-  platform.volume_ids = {{"/v", "volume"}};
-  for (int i = 0; i < 20'000; ++i) {
-    add(db_.get(), i % 2 != 0 ? "s" : "t", "f" + std::to_string(i / 3), i / 3 * 7919 % 10'007,
-        static_cast<uid_t>(i % 3), std::time(nullptr) - i * 600 - 300,
-        i % 5 != 0 ? "doc" : "image");
-  }
-  sqlite3_exec(db_.get(), "COMMIT", nullptr, nullptr, nullptr);
-  for (const auto& [hash, key] : {std::pair(&users_, "ann"), {&volumes_, "s"}, {&shares_, "s"}}) {
-    set(*hash, key, "/v");
-  }
-  set_profile("limit_user", "bob");
-  const auto all_reports = [&](bool are_ahead) {
-    return in_child([&] {
-      data_ = report_data_path().c_str();
-      std::vector<const char*> statements;
-      for (const ReportEntry& entry : report_registry()) {
-        if (entry.statement != nullptr) {
-          statements.push_back(entry.statement(profile_.get()));
-        }
-      }
-      const StatementsAhead ahead(are_ahead ? path().c_str() : nullptr, statements,
-                                  statements.back());
-      std::string text;
-      for (const ReportEntry& entry : report_registry()) {
-        if (entry.statement != nullptr) {
-          EXPECT_EQ(run(entry.report), 0) << entry.name;
-          text += output_ + csv(entry.name);
-          unlink(folder_.path(std::string(entry.name) + ".csv").c_str());
-        }
-      }
-      text += data();
-      unlink(data_.c_str());
-      return text;
-    });
-  };
-  const std::string expected = all_reports(false);
-  EXPECT_GT(expected.size(), 500'000U);
-  EXPECT_TRUE(all_reports(true) == expected);
-  set_profile("duplicate_compare", "true");
-  sqlite3_exec(db_.get(), "delete from file_stat where id > 9", nullptr, nullptr, nullptr);
-  EXPECT_EQ(all_reports(true), all_reports(false));
 }
 
 }  // namespace
