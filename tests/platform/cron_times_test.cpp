@@ -31,9 +31,9 @@ TEST(CronTimes, MeanTheSameToSystemd) {
   setenv("TZ", "UTC", 1);
   tzset();
   constexpr std::time_t kBase = 1'763'463'600;
-  for (const char* times :
-       {"0 4 * * 1", "*/20 0-6/2 1,15 1-3 *", "5 4 * * 7", "0 4 13 * fri", "0 4 */2 * fri",
-        "0 4 29 feb *", "59 23 31 12 *", "@hourly", "@weekly", "* * * * *", "0 4 * * mon-fri"}) {
+  for (const char* times : {"0 4 * * 1", "*/20 0-6/2 1,15 1-3 *", "5 4 * * 7", "0 4 13 * fri",
+                            "0 4 */2 * fri", "0 4 29 feb *", "59 23 31 12 *", "15-45/30 4,16 1 1 *",
+                            "@hourly", "@weekly", "@yearly", "* * * * *", "0 4 * * mon-fri"}) {
     const host::CronTimes cron(times);
     std::time_t at = kBase;
     for (int i = 0; i < 3; ++i) {

@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <csignal>
 #include <cstring>
 #include <filesystem>
@@ -217,17 +218,15 @@ TEST(SendTestMail, SaysWhoGetsNone) {
     return host::send_test_mail("weekly", *make_hash(entries), host::MailLimits{});
   };
   EXPECT_EQ(std::vector<std::string>{"a@example.com"}, test(profile));
-  EXPECT_EQ(2U, syslog_lines().size());
+  const std::string log = syslog_text();
+  EXPECT_NE(std::string::npos, log.find("b@example.com: 550 5.1.1 no mailbox")) << log;
+  EXPECT_EQ(1, std::count(log.begin(), log.end(), '\n')) << log;
   EXPECT_NE(std::string::npos, picky.mail(1).find("Dies ist ein Test"));
   EXPECT_TRUE(test({}).empty());
   EXPECT_NE(std::string::npos, syslog_text().find("no recipients"));
 }
 
-TEST(SendReport, NamesEachRefusedRecipient) {
-  const MailServer picky("--refuse b@example.com");
-  EXPECT_EQ(0, send({}, picky.url(), "a@example.com,b@example.com,c@example.com"));
-  EXPECT_EQ(2U, picky.count());
-  EXPECT_NE(std::string::npos, syslog_text().find("b@example.com: 550 5.1.1 no mailbox"));
+TEST(SendReport, FailsWhenEveryRecipientIsRefused) {
   const MailServer server("--refuse '*'");
   EXPECT_EQ(-1, send({}, server.url(), "a@example.com,b@example.com"));
   EXPECT_EQ(0U, server.count());
