@@ -70,8 +70,8 @@ void print_all_help(const CLI::App& group, const std::string& name) {
   }
 }
 
-// Settings, runs and reports are root's, and what another user could see of them would mislead. What
-// somebody has staged for a try is theirs.
+// Settings, runs and reports are root's, and what another user could see of them would mislead.
+// What somebody has staged for a try is theirs.
 void check_user() {
   struct stat etc {};
   const bool is_own = stat("/usr/vorn/etc", &etc) == 0 && etc.st_uid == geteuid();

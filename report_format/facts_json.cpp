@@ -428,16 +428,16 @@ std::optional<Facts> facts_of(std::string_view text) {
   std::vector<OwnerFacts> owners;
   bool is_owners = false;
   bool is_inside = false;
-  const auto take_owners = [&](int depth, Json::parse_event_t event, Json& parsed) {
-    using enum Json::parse_event_t;
-    if (depth == 1 && event == key) {
+  using Event = Json::parse_event_t;
+  const auto take_owners = [&](int depth, Event event, Json& parsed) {
+    if (depth == 1 && event == Event::key) {
       is_owners = parsed == "owners";
-    } else if (depth == 1 && event == array_start && is_owners) {
+    } else if (depth == 1 && event == Event::array_start && is_owners) {
       is_inside = true;
       owners.clear();
-    } else if (depth == 1 && event == array_end) {
+    } else if (depth == 1 && event == Event::array_end) {
       is_inside = false;
-    } else if (depth == 2 && event == object_end && is_inside) {
+    } else if (depth == 2 && event == Event::object_end && is_inside) {
       Codec::take(parsed, owners.emplace_back());
       return false;
     }
