@@ -180,9 +180,9 @@ int add_fleet_sample(void* context, int columns, char** values, char** /*names*/
       std::any_of(values, values + kCount, [](const char* value) { return value == nullptr; })) {
     return -1;
   }
-  // They go into the page as they are.
+  // They go into the page as they are. The percentage of a volume of size 0 is -nan.
   if (std::any_of(values + kDays, values + kCount, [](const char* value) {
-        return value[std::strspn(value, "0123456789.-")] != '\0';
+        return value[std::strspn(value, "0123456789.-+einfa")] != '\0';
       })) {
     REPORT_LOG_ERR(kModule, __LINE__, "the samples of volume %s aren't numbers\n", values[kVolume]);
     return -1;
@@ -196,7 +196,9 @@ int add_fleet_sample(void* context, int columns, char** values, char** /*names*/
   sample->sizeUse.format("%s", values[kUsed]);
   sample->sizeFree.format("%s", values[kFree]);
   sample->percent.format("%s", values[kPercent]);
-  if (list != nullptr && volume_of(list->last)->fleet_name == values[kVolume]) {
+  // The samples of those that are no longer mounted have no name to tell them apart by.
+  const std::string_view name = values[kVolume];
+  if (list != nullptr && !name.ends_with(':') && volume_of(list->last)->fleet_name == name) {
     VolumeUsageSample* end = volume_of(list->last)->samples;
     while (end->next != nullptr) {
       end = end->next;
@@ -208,7 +210,7 @@ int add_fleet_sample(void* context, int columns, char** values, char** /*names*/
   if (!node || QAZLLadd(&list, node.get(), keep_order) < 0) {
     return -1;
   }
-  node->fleet_name = values[kVolume];
+  node->fleet_name = name;
   node->days = static_cast<int32_t>(std::strtol(values[kDays], nullptr, 10));
   node->samples = sample.release();
   static_cast<void>(node.release());

@@ -326,8 +326,8 @@ std::string fleet_name(const std::string& server, const std::string& name) {
 void take_over_incidents(const std::vector<FleetMember>& members) {
   for (const FleetMember& member : members) {
     for (const report_format::Incident& incident : member.facts.incidents) {
-      record_incident(incident.kind.c_str(), fleet_name(member.server, " " + incident.what),
-                      fleet_name(member.server, " " + incident.text), AlreadyLogged::kYes);
+      add_incident({incident.level, incident.kind, fleet_name(member.server, " " + incident.what),
+                    fleet_name(member.server, " " + incident.text)});
     }
   }
 }

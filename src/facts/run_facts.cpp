@@ -87,19 +87,24 @@ void note_volumes(const VORNMountVolInfo* volumes) {
 
 void record_incident(const char* kind, const std::string& what, const std::string& text,
                      AlreadyLogged logged) {
-  std::vector<report_format::Incident>& incidents = run_facts().incidents;
   const report_format::IncidentKind* known = report_format::find_incident_kind(kind);
-  const std::string told = report_format::facts_text(what);
-  if (known == nullptr ||
-      std::any_of(incidents.begin(), incidents.end(), [&](const report_format::Incident& before) {
-        return before.kind == kind && before.what == told;
-      })) {
-    return;
-  }
-  incidents.push_back({known->level, kind, told, report_format::facts_text(text)});
-  if (logged == AlreadyLogged::kNo) {
+  if (known != nullptr && add_incident({known->level, kind, what, text}) &&
+      logged == AlreadyLogged::kNo) {
     REPORT_LOG_ERR(kModule, __LINE__, "%s\n", text.c_str());
   }
+}
+
+bool add_incident(report_format::Incident incident) {
+  std::vector<report_format::Incident>& incidents = run_facts().incidents;
+  incident.what = report_format::facts_text(incident.what);
+  incident.text = report_format::facts_text(incident.text);
+  const bool is_new = std::none_of(incidents.begin(), incidents.end(), [&](const auto& before) {
+    return before.kind == incident.kind && before.what == incident.what;
+  });
+  if (is_new) {
+    incidents.push_back(std::move(incident));
+  }
+  return is_new;
 }
 
 void tell_failed_report(const char* name) {
@@ -118,7 +123,8 @@ void listen_for_incidents() {
 bool sums_are_doubtful() {
   const std::vector<report_format::Incident>& incidents = run_facts().incidents;
   return std::any_of(incidents.begin(), incidents.end(), [](const auto& incident) {
-    return report_format::find_incident_kind(incident.kind)->spoils_sums;
+    const report_format::IncidentKind* known = report_format::find_incident_kind(incident.kind);
+    return known == nullptr || known->spoils_sums;
   });
 }
 

@@ -96,6 +96,9 @@ enum class AlreadyLogged : bool { kNo, kYes };
 void record_incident(const char* kind, const std::string& what, const std::string& text,
                      AlreadyLogged logged = AlreadyLogged::kNo);
 
+// The same of any kind; false when it was known. Servers of newer releases know more kinds.
+bool add_incident(report_format::Incident incident);
+
 // Records that a report failed; it has logged why.
 void tell_failed_report(const char* name);
 

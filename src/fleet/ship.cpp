@@ -39,6 +39,8 @@ constexpr size_t kRowsOfBatch = 100'000;
 // What an engine on this machine's two cores reads at once beside what is sent.
 constexpr size_t kBatchesBeside = 2;
 constexpr int kAttempts = 2;
+// The report waits for it.
+constexpr std::chrono::minutes kLongestSending(30);
 
 using report_format::append_binary_number;
 using report_format::append_binary_text;
@@ -52,6 +54,11 @@ struct Sent {
   uint64_t rows = 0;
 };
 std::optional<Sent> g_sent;
+std::chrono::steady_clock::time_point g_sending_ends;
+
+bool has_time() {
+  return std::chrono::steady_clock::now() < g_sending_ends;
+}
 
 // The number under which one attempt's rows stand; see report_format/fleet.hpp.
 uint64_t new_run_number() {
@@ -136,7 +143,7 @@ bool send(VORNFleet* fleet, const char* table, VORNFleetFormat format, NextRow n
   const auto source = [](void* context, char* out, size_t size) {
     return static_cast<Batch*>(context)->read(out, size);
   };
-  for (size_t beside = 1;; beside = kBatchesBeside) {
+  for (size_t beside = 1; has_time(); beside = kBatchesBeside) {
     std::deque<Batch> batches;
     std::vector<void*> contexts;
     for (std::string first; batches.size() < beside && rows.append_next(first); first.clear()) {
@@ -153,6 +160,7 @@ bool send(VORNFleet* fleet, const char* table, VORNFleetFormat format, NextRow n
       return true;
     }
   }
+  return false;
 }
 
 // --- Files ---------------------------------------------------------------------------------------
@@ -297,10 +305,14 @@ bool send_rows(VORNFleet* fleet, uint64_t run, const VLIBCSzHash* profile_hash,
 }
 
 void tell(const VORNFleet* fleet) {
-  const std::string problem = VORNFleetProblem(fleet);
-  record_incident("fleet_unreachable", "fleet",
-                  "this run is missing from the fleet: " +
-                      (problem.empty() ? "its rows can't be read; the log says why" : problem));
+  std::string problem = VORNFleetProblem(fleet);
+  if (!has_time()) {
+    problem = "its rows weren't taken within " + std::to_string(kLongestSending.count()) +
+              " minutes; see to the engine and the way to it";
+  } else if (problem.empty()) {
+    problem = "its rows can't be read; the log says why";
+  }
+  record_incident("fleet_unreachable", "fleet", "this run is missing from the fleet: " + problem);
 }
 
 // The longest time that has lately passed between two of the profile's runs; 0 for its first.
@@ -333,6 +345,7 @@ void ship_rows(const VLIBCSzHash* profile_hash, const ShipLookUps& look_ups) {
   if (!keeps_fleet_rows()) {
     return;
   }
+  g_sending_ends = std::chrono::steady_clock::now() + kLongestSending;
   keep_shares(look_ups);
   VORNFleet* opened = nullptr;
   const int found = VORNFleetOpen(&opened);
@@ -379,6 +392,7 @@ void ship_run(const char* facts_path) {
   }
   append_fleet_text(row, report_format::to_line(*facts));
   row += '\n';
+  g_sending_ends = std::chrono::steady_clock::now() + kLongestSending;
   for (int attempt = 0; attempt < kAttempts; ++attempt) {
     if (uint64_t sent = 0; send(g_sent->fleet.get(), report_format::kFleetRun.name, VORN_FLEET_TEXT,
                                 line_of(row), sent)) {

@@ -42,7 +42,7 @@ class FleetTest(ProductTest):
         done = machine.shell('exec /usr/vorn/bin/vornctl "$@"' if not arguments else
                              'exec /usr/vorn/bin/vornctl ' + ' '.join(
                                  "'" + str(a).replace("'", "'\\''") + "'" for a in arguments))
-        self.assertEqual(done.status, status, done.out + done.err)
+        self.assertEqual(done.status, status, done.out + done.err + str(done.log_lines))
         return done
 
     def server(self, name, machine=None, **keys):
@@ -177,12 +177,14 @@ class Fleet(FleetTest):
         self.assertEqual(facts(only)['owners'], None)
         self.assertIn('no complete run of server nobody', self.ctl(
             first, 'fleet', 'report', first.base / 'fleet', '--servers', 'nobody', status=1).err)
-        # A server whose runs stay out; and what people see of all that.
+        # A server whose runs stay out, of a release that knows more; and what people see of all that.
+        told = json.dumps({'format': 1, 'incidents': [
+            {'level': 'warning', 'kind': 'of_tomorrow', 'what': 'it', 'text': 'look'}]})
         self.shards.ask("insert into run (server, profile, run, started, report) values "
-                        "('left', 'daily', 1, 1, '{\"format\": 1}')")
+                        f"('left', 'daily', 1, 1, '{told}')")
         page = self.report(first, status=3)
         self.assertEqual([(entry['kind'], entry['what']) for entry in facts(page)['incidents']],
-                         [('server_overdue', 'left (daily)')])
+                         [('server_overdue', 'left (daily)'), ('of_tomorrow', 'left: it')])
         done = subprocess.run(
             ['node', ROOT / 'tests/page/fleet.mjs'], stdout=subprocess.PIPE, stderr=subprocess.STDOUT,
             text=True, env=os.environ | {
