@@ -20,9 +20,10 @@ constexpr StatisticsReport kShareListReport{
     .fleet_sql =
         "select concat(server, ':', share), concat(server, ':', volume), s from "
         "(select server, profile, share, {sum} as s from file where {runs} "
-        "group by server, profile, share) any inner join "
+        "group by server, profile, share) as sums any inner join "
         "(select server, profile, value[1] as share, value[3] as volume from report_row "
-        "where {runs} and report = 'share' and value[3] != '') using server, profile, share "
+        "where {runs} and report = 'share' and value[3] != '') as shares "
+        "using server, profile, share "
         "order by s desc, server, share, profile",
     .fleet_columns = kFleetColumns,
 };

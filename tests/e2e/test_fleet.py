@@ -27,16 +27,21 @@ def names_aside(text, server, volumes):
 class FleetTest(ProductTest):
     """Machines with a cluster that they send to, of `replicas` engines a shard."""
     replicas = 1
+    cluster = 'shards'
 
     @classmethod
     def setUpClass(cls):
         super().setUpClass()
-        cls.shards = Shards(cls, replicas=cls.replicas)
+        cls.shards = cls.make_engines()
+
+    @classmethod
+    def make_engines(cls):
+        return Shards(cls, replicas=cls.replicas)
 
     def setUp(self):
         super().setUp()
         for engine in self.shards.engines:
-            engine.ask('drop database if exists vornreport')
+            engine.ask('drop database if exists vornreport', 'default')
 
     def ctl(self, machine, *arguments, status=0):
         done = machine.shell('exec /usr/vorn/bin/vornctl "$@"' if not arguments else
@@ -52,7 +57,7 @@ class FleetTest(ProductTest):
         machine.profile('daily', report_list=ALL, fleet='true', **keys)
         # By an address that isn't taken for this machine's, rows are compressed as for others.
         urls = self.shards.urls.replace('127.0.0.1', '127.1') if name == 'alpha' else self.shards.urls
-        self.ctl(machine, 'fleet', 'set', '--url', urls, '--cluster', 'shards', '--server', name)
+        self.ctl(machine, 'fleet', 'set', '--url', urls, '--cluster', self.cluster, '--server', name)
         return machine
 
     def send(self, machine):
@@ -84,7 +89,9 @@ class FleetTest(ProductTest):
         return tree
 
 
-class Fleet(FleetTest):
+class AnyFleet:
+    """What holds with any engine."""
+
     @needs_root
     def test_fleet_of_one_is_the_server(self):
         for keys in ({}, {'duplicate_compare': 'true'}):
@@ -106,7 +113,6 @@ class Fleet(FleetTest):
                     self.assertEqual(
                         names_aside((made / 'csv' / path.name).read_bytes(), name, known),
                         path.read_bytes(), path.name)
-
 
     @needs_root
     def test_fleet_of_three_is_their_union(self):
@@ -240,6 +246,7 @@ class Fleet(FleetTest):
         self.assertEqual({user: int(used) >> 10 for user, used in rows}, users)
         self.assertEqual(len(rows), len(users))
         self.assertIn(f"\n[ 'two:{volume}', ", page)
+
     @needs_root
     def test_only_complete_runs_are_seen_and_the_newest_counts(self):
         m = self.server('seen')
@@ -247,7 +254,7 @@ class Fleet(FleetTest):
         self.ctl(m, 'fleet', 'init')
         # Tables as they were once.
         for engine in self.shards.engines:
-            for table in ('run_part', 'run'):
+            for table in ('run_part', 'run') if self.cluster else ('run',):
                 engine.ask(f'alter table vornreport.{table} drop column row_count')
         self.ctl(m, 'fleet', 'init')
         self.send(m)
@@ -266,27 +273,97 @@ class Fleet(FleetTest):
         self.assertEqual(len((made / 'csv/large_file.csv').read_bytes().splitlines()), files + 1)
         # The newest counts, once; others go when nobody can be reading them any more.
         self.send(m)
-        made = self.report(m, '--reports', 'large_file')
+        newest = int(self.shards.ask("select max(run) from run where server = 'seen'"))
+        # A clock that is ahead; and a run that never got all of its rows.
+        self.shards.ask(f"insert into run (server, profile, run, started, row_count) values "
+                        f"('ahead', 'daily', {newest * 2}, 1, 0), ('seen', 'daily', {newest + 2}, 1, 1)")
+        made = self.report(m, '--reports', 'large_file', status=3)
         self.assertEqual(len((made / 'csv/large_file.csv').read_bytes().splitlines()), files + 1)
+        self.assertIn("server ahead (daily) sent a run from the future, which doesn't count; set its "
+                      'clock', [entry['text'] for entry in facts(made)['incidents']])
         for table in ('run', 'file'):
             self.shards.ask(f'insert into {table} (server, profile, run) values '
                             f"('seen', 'daily', 1), ('gone', 'daily', 1), ('seen', 'other', 1)")
-        newest = int(self.shards.ask("select max(run) from run where server = 'seen'"))
         self.shards.ask("insert into run (server, profile, run, finished, started) values "
                         f"('seen', 'daily', {newest + 1}, 1, 1)")
-        # Of a clock that is ahead; and what never got all of its rows.
-        self.shards.ask(f"insert into run (server, profile, run, started, row_count) values "
-                        f"('ahead', 'daily', {newest * 2}, 1, 0), ('seen', 'daily', {newest + 2}, 1, 1)")
         done = self.ctl(m, 'fleet', 'status', '--json')
         listed = {(run['server'], run['profile']): run['overdue'] for run in json.loads(done.out)}
         self.assertEqual(listed[('seen', 'daily')], True)
         self.assertEqual(self.shards.ask("select uniq(run) from file where server = 'seen' and "
                                          "profile = 'daily'"), '0\n')
         self.assertNotIn('ahead', [run['server'] for run in json.loads(done.out)])
-        told = facts(self.report(m, status=3))['incidents']
-        self.assertIn("server ahead (daily) sent a run from the future, which doesn't count; set its "
-                      'clock', [entry['text'] for entry in told])
 
+    @needs_root
+    def test_names_are_data_everywhere(self):
+        hostile = [f"{a}{b}{c}" for a in ("'", '"', '\\', '`', "');") for b in (
+            ' or 1=1 --', '\\n', '\n', '<script>x', '{runs}', '?a=b&c', ' drop table run; ')
+            for c in ('', '\udcff')][:60]
+        self.assertEqual(len(set(hostile)), 60)
+        m = self.server("srv {runs} %27 & ü")
+        tree = Tree(m)
+        for name in hostile:
+            tree.add('odd', name, 5)
+        self.ctl(m, 'fleet', 'init')
+        own = self.send(m)
+        made = self.report(m)
+        for path in (own / 'csv').iterdir():
+            if path.stem not in ('volume_usage', 'coverage', 'share_list'):
+                self.assertEqual((made / 'csv' / path.name).read_bytes().replace(
+                    'srv {runs} %27 & ü:'.encode(), b''), path.read_bytes())
+        # What other servers have written is theirs: it stays text, and can be forgotten.
+        for number, name in enumerate(hostile):
+            if '\udcff' in name:
+                continue
+            text = name.replace('\\', '\\\\').replace("'", "\\'").replace('\n', '\\n')
+            where = f"'{text}', 'daily', {number + 1}"
+            self.shards.ask(f"insert into file (server, profile, run, share, path, size, owner_name) "
+                            f"values ({where}, '{text}', '/{text}', 7, '{text}')")
+            for report in ('folder_usage', 'file_age', 'coverage', 'growth'):
+                self.shards.ask('insert into report_row (server, profile, run, report, value) values '
+                                f"({where}, '{report}', [" + ', '.join([f"'{text}'"] * 7) + '])')
+            self.shards.ask('insert into run (server, profile, run, started, report) values '
+                            f"({where}, {int(time.time())}, '{{\"format\": 1}}')")
+        page = (self.report(m) / 'report.html').read_text(errors='surrogateescape')
+        self.assertNotIn('<script>x', page)
+        for name in hostile:
+            if '\udcff' not in name:
+                self.ctl(m, 'fleet', 'forget', name)
+        self.assertEqual(self.shards.ask('select uniq(server) from run'), '1\n')
+
+    @needs_root
+    def test_what_is_others_stays_and_what_is_renamed_moves(self):
+        m = self.server('guest')
+        files = len(self.fill(m).files)
+        self.ctl(m, 'fleet', 'init')
+        self.send(m)
+        folder = m.base / 'fleet'
+        kept = [folder / name for name in ('template', '.notes.partial', 'csv')]
+        for path in kept:
+            path.mkdir(parents=True)
+            (path / 'mine').touch()
+        (folder / '.2020-01-02_03-04-05.partial').mkdir()
+        made = self.report(m)
+        self.assertTrue(all((path / 'mine').exists() for path in kept))
+        self.assertEqual(sorted(path.name for path in made.iterdir()),
+                         sorted(path.name for path in m.report_folders('daily')[-1].iterdir()))
+        self.assertEqual([path.name for path in folder.glob('.2*')], [])
+        for arguments, words in (((m.reports / 'daily',), 'the reports of profile daily'),
+                                 ((folder, '--reports', 'large_file,grwth'), 'did you mean "growth"')):
+            self.assertIn(words, self.ctl(m, 'fleet', 'report', *arguments, status=1).err)
+        before = [self.shards.ask(f'select profile, count() from {table} group by profile')
+                  for table in ('file', 'report_row', 'run')]
+        self.assertEqual(before[0], f'daily\t{files}\n')
+        self.ctl(m, 'profile', 'rename', 'daily', 'nightly')
+        self.assertEqual([self.shards.ask(f'select profile, count() from {table} group by profile')
+                          for table in ('file', 'report_row', 'run')],
+                         [rows.replace('daily', 'nightly') for rows in before])
+        self.assertEqual(facts(self.report(m))['incidents'], [])
+        self.ctl(m, 'fleet', 'forget', 'guest', 'daily', status=1)
+        self.ctl(m, 'fleet', 'forget', 'guest', 'nightly')
+        self.assertEqual(self.shards.ask('select count() from run'), '0\n')
+
+
+class Fleet(AnyFleet, FleetTest):
     @needs_root
     def test_an_engine_in_trouble_costs_the_report_nothing(self):
         silent = socket.create_server(('127.0.0.1', 0))
@@ -432,75 +509,6 @@ class Fleet(FleetTest):
         made = self.report(m)
         self.assertEqual(sum(share['files'] for share in facts(made)['shares']),
                          files * len(servers))
-
-    @needs_root
-    def test_names_are_data_everywhere(self):
-        hostile = [f"{a}{b}{c}" for a in ("'", '"', '\\', '`', "');") for b in (
-            ' or 1=1 --', '\\n', '\n', '<script>x', '{runs}', '?a=b&c', ' drop table run; ')
-            for c in ('', '\udcff')][:60]
-        self.assertEqual(len(set(hostile)), 60)
-        m = self.server("srv {runs} %27 & ü")
-        tree = Tree(m)
-        for name in hostile:
-            tree.add('odd', name, 5)
-        self.ctl(m, 'fleet', 'init')
-        own = self.send(m)
-        made = self.report(m)
-        for path in (own / 'csv').iterdir():
-            if path.stem not in ('volume_usage', 'coverage', 'share_list'):
-                self.assertEqual((made / 'csv' / path.name).read_bytes().replace(
-                    'srv {runs} %27 & ü:'.encode(), b''), path.read_bytes())
-        # What other servers have written is theirs: it stays text, and can be forgotten.
-        for number, name in enumerate(hostile):
-            if '\udcff' in name:
-                continue
-            text = name.replace('\\', '\\\\').replace("'", "\\'").replace('\n', '\\n')
-            where = f"'{text}', 'daily', {number + 1}"
-            self.shards.ask(f"insert into file (server, profile, run, share, path, size, owner_name) "
-                            f"values ({where}, '{text}', '/{text}', 7, '{text}')")
-            for report in ('folder_usage', 'file_age', 'coverage', 'growth'):
-                self.shards.ask('insert into report_row (server, profile, run, report, value) values '
-                                f"({where}, '{report}', [" + ', '.join([f"'{text}'"] * 7) + '])')
-            self.shards.ask('insert into run (server, profile, run, started, report) values '
-                            f"({where}, {int(time.time())}, '{{\"format\": 1}}')")
-        page = (self.report(m) / 'report.html').read_text(errors='surrogateescape')
-        self.assertNotIn('<script>x', page)
-        for name in hostile:
-            if '\udcff' not in name:
-                self.ctl(m, 'fleet', 'forget', name)
-        self.assertEqual(self.shards.ask('select uniq(server) from run'), '1\n')
-
-    @needs_root
-    def test_what_is_others_stays_and_what_is_renamed_moves(self):
-        m = self.server('guest')
-        files = len(self.fill(m).files)
-        self.ctl(m, 'fleet', 'init')
-        self.send(m)
-        folder = m.base / 'fleet'
-        kept = [folder / name for name in ('template', '.notes.partial', 'csv')]
-        for path in kept:
-            path.mkdir(parents=True)
-            (path / 'mine').touch()
-        (folder / '.2020-01-02_03-04-05.partial').mkdir()
-        made = self.report(m)
-        self.assertTrue(all((path / 'mine').exists() for path in kept))
-        self.assertEqual(sorted(path.name for path in made.iterdir()),
-                         sorted(path.name for path in m.report_folders('daily')[-1].iterdir()))
-        self.assertEqual([path.name for path in folder.glob('.2*')], [])
-        for arguments, words in (((m.reports / 'daily',), 'the reports of profile daily'),
-                                 ((folder, '--reports', 'large_file,grwth'), 'did you mean "growth"')):
-            self.assertIn(words, self.ctl(m, 'fleet', 'report', *arguments, status=1).err)
-        before = [self.shards.ask(f'select profile, count() from {table} group by profile')
-                  for table in ('file', 'report_row', 'run')]
-        self.assertEqual(before[0], f'daily\t{files}\n')
-        self.ctl(m, 'profile', 'rename', 'daily', 'nightly')
-        self.assertEqual([self.shards.ask(f'select profile, count() from {table} group by profile')
-                          for table in ('file', 'report_row', 'run')],
-                         [rows.replace('daily', 'nightly') for rows in before])
-        self.assertEqual(facts(self.report(m))['incidents'], [])
-        self.ctl(m, 'fleet', 'forget', 'guest', 'daily', status=1)
-        self.ctl(m, 'fleet', 'forget', 'guest', 'nightly')
-        self.assertEqual(self.shards.ask('select count() from run'), '0\n')
 
     @needs_root
     def test_a_password_stays_on_this_machine(self):
