@@ -33,7 +33,7 @@ def install():
 
 
 class Node:
-    """The one engine of a fleet without a cluster."""
+    """An engine that is a cluster of one."""
     ask_on_node = Engine.ask
 
     def __init__(self, test):
@@ -48,12 +48,10 @@ class Node:
         self.engines = [self]
 
     def ask(self, sql, database='vornreport'):
-        return self.ask_on_node(sql, database)
+        return self.ask_on_node(sql, database, insert_distributed_sync=1)
 
 
 class Newer(test_fleet.AnyFleet, test_fleet.FleetTest):
-    cluster = ''
-
     @classmethod
     def make_engines(cls):
         install()

@@ -9,7 +9,16 @@ import zlib from 'node:zlib';
 
 const [packages, folder] = process.argv.slice(2);
 const { Session } = createRequire(path.join(packages, 'package.json'))('chdb');
-const session = new Session(path.join(folder, 'data'));
+// It is its cluster's one node: nobody listens at the port, by which it knows itself.
+const config = path.join(folder, 'config.xml');
+fs.writeFileSync(
+  config,
+  `<clickhouse><tcp_port>9000</tcp_port><remote_servers><shards><shard><replica>
+   <host>127.0.0.1</host><port>9000</port></replica></shard></shards></remote_servers></clickhouse>`,
+);
+const session = new Session(path.join(folder, 'data'), {
+  connectionArgs: [`--config-file=${config}`],
+});
 const rows = path.join(folder, 'rows');
 
 // What the interface takes for itself; all else in a query are settings, which must be known.
