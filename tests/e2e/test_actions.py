@@ -62,6 +62,7 @@ class Clean(ProductTest):
             'head': b'# kept: \xff\xfe\n[global]\nreport_list = volume_usage\n',
             'weekly': b'[ weekly ]\n; kept, too\n  report_list=share_list\nschedule_collect_id = job1\n',
             'monthly': b'[monthly]\nreport_list =  large_file\n\tschedule_collect_id = job2\n',
+            'unscheduled': b'[daily]\n  report_list=share_list\n',
             'end': b'# without a line feed'}
         weekly = {'weekly': b'[ weekly ]\n; kept, too\n\treport_list = share_list\n'}
         both = weekly | {'monthly': b'[monthly]\n\treport_list = large_file\n'}

@@ -9,7 +9,7 @@ import sqlite3
 import time
 from unittest.mock import ANY
 
-from harness import ALL, CTL, LIMIT, ROOT, CtlTest, Run, needs_root
+from harness import ALL, CTL, LIMIT, ROOT, CtlTest, Run, make_files, needs_root
 
 SHARES = '# top\n\n# of one\n[one]\n path=/etc ; not a comment\n\n[two]\npath = /usr\n# end'
 
@@ -308,9 +308,12 @@ class Profiles(ControlTest):
         self.assertTrue((report / 'report.html').exists())
         job.write_text('0 4 * * * root /usr/vorn/bin/vornreport --report p\n')
         (report.parent / 'mine').touch()
+        make_files(self.m.vorn / 'var/stat/p', {'stat.db': 1})
+        make_files(report.parent / '.2026-01-02_03-04-05.partial', {'csv/x': 1})
         self.check(('profile', 'remove', 'p', '--reports-too'), 0, 'more than reports')
         self.assertEqual([path.name for path in report.parent.iterdir()], ['mine'])
         self.assertFalse(job.exists() or (self.m.vorn / 'var/status/p').exists())
+        self.assertEqual(self.m.leftovers(), [])
         self.check(('profile', 'list'), 0, 'no profiles')
         self.m.profile('q', report_list='share_list')
         (self.m.cron / 'vornreport-none').write_text('0 4 * * * root backup\n')

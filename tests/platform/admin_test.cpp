@@ -12,7 +12,6 @@
 
 namespace fs = std::filesystem;
 using admin::RunState;
-using support::exists;
 using support::write_file;
 
 TEST(AdminConfiguration, RunsDoWithoutWhatIsWrong) {
@@ -73,27 +72,4 @@ TEST(AdminRuns, StateIsToldByHolderAndStatus) {
   ASSERT_TRUE(progress);
   EXPECT_EQ(progress->files, 7U);
   fs::remove(VORN_PATH_PROGRESS "/p");
-}
-
-TEST(AdminRuns, KilledAndForgottenOnesLeaveNothingUnfinished) {
-  const admin::Section profile{"k", {{"report_dir", VORN_PATH_REPORTS}}};
-  const std::string folder = VORN_PATH_REPORTS "/k";
-  const std::string status = VORN_PATH_STATUS "/k";
-  for (const bool is_forgotten : {false, true}) {
-    fs::create_directories(folder + "/.2026-01-02_03-04-05.partial/csv");
-    fs::create_directories(folder + "/2026-01-01_00-00-00");
-    write_file(VORN_PATH_STAT "/k/stat.db", "x");
-    write_file(status, "collect_data\n");
-    const auto left = admin::leftovers_of(profile);
-    EXPECT_EQ(left, std::optional(std::vector<std::string>{folder + "/.2026-01-02_03-04-05.partial",
-                                                           VORN_PATH_STAT "/k/stat.db"}));
-    ASSERT_EQ(admin::hold_profile("k"), admin::Hold::taken);
-    EXPECT_TRUE(is_forgotten ? admin::forget_runs(profile) : admin::end_killed_run(profile));
-    EXPECT_EQ(admin::leftovers_of(profile), std::optional(std::vector<std::string>{}));
-    EXPECT_TRUE(exists(folder + "/2026-01-01_00-00-00"));
-    const std::string text = support::read_file(status);
-    EXPECT_EQ(text.substr(0, text.find('\n')), is_forgotten ? "<absent>" : "fail");
-  }
-  EXPECT_EQ(support::syslog_text(), "");
-  fs::remove_all(folder);
 }

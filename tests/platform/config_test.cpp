@@ -113,30 +113,6 @@ TEST_F(Config, RewritingRefusesWhatWouldNotReadBack) {
   }
 }
 
-TEST_F(Config, TwoWritersLoseNothing) {
-  write_file(file, "[left]\nn = 0\n# between\n[right]\nn = 0\n");
-  const auto write_rounds = [this](const char* section) {
-    int lost = 0;
-    for (int i = 0; i < 1000; ++i) {
-      const support::Hash owner = support::make_hash();
-      VLIBCSzHash* hash = owner.get();
-      lost += VLIBCFileGetSection(file.c_str(), section, &hash) != 1 ||
-              VLIBCSzHashGetValue(hash, "n") != std::to_string(i);
-      VLIBCSzHashSetValue(&hash, "n", std::to_string(i + 1).c_str());
-      lost += VLIBCFileSetSection(file.c_str(), section, nullptr, hash, kFormat) != 0;
-    }
-    return std::min(lost, 1);
-  };
-  const pid_t child = support::fork_child([&] { return write_rounds("left"); });
-  for (int i = 0; i < 1000 && read_file(file).starts_with("[left]\nn = 0"); ++i) {
-    usleep(1000);  // until it has begun
-  }
-  EXPECT_EQ(write_rounds("right"), 0);
-  EXPECT_EQ(support::wait_child(child), 0);
-  EXPECT_EQ(read_file(file), "[left]\n\tn = 1000\n# between\n[right]\n\tn = 1000\n");
-  EXPECT_EQ(support::names_in(folder.path()).size(), 2U);  // file and lock, nothing temporary
-}
-
 // Who writes back what it has read means its own changes: those of others in between stay.
 TEST_F(Config, WritingBackKeepsWhatOthersHaveChanged) {
   const std::string before = "[p]\na = 1\nb = 1\nc = 1\nd = 1\n";

@@ -219,12 +219,5 @@ TEST_F(ActionsTest, AReportThatCannotGetItsNameIsNone) {
   }));
 }
 
-TEST_F(ActionsTest, CleanWritesBackOnlyWhatChanged) {
-  EXPECT_EQ(run(clean_action), 0);
-  EXPECT_EQ(platform.calls, (Calls{std::string("GetSection ") + kConfig + " p1",
-                                   "ScheduleClean p1 schedule_collect_id", "InitRealPath p1 0",
-                                   "ReportCleanTmp p1 loaded"}));
-}
-
 }  // namespace
 }  // namespace vornreport
