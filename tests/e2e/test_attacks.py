@@ -1,36 +1,11 @@
 """What others put in the way of a run, and what a machine refuses it: the run is what it would have
 been, or it is told."""
-import json
 import os
-import re
 import signal
 from pathlib import Path
 
 from expected import data_blocks, facts
-from harness import ALL, CTL, PROGRAM, ROOT, ProductTest, Run, make_files, needs_root, wait_for
-
-
-class Folders(ProductTest):
-    def test_a_report_folder_that_others_could_move(self):
-        """vornctl refuses it beforehand, the doctor finds it, and a run leaves it alone, for one
-        reason."""
-        make_files(self.m.share('photos'), {'a.jpg': 10})
-        self.m.profile('weekly', report_list='share_list')
-        text = self.m.config.read_text()
-        folder = self.m.base / 'open'
-        folder.mkdir()
-        folder.chmod(0o770)
-        reason = f'{folder} is writable by others, .*; run chmod go-w'
-        put = Run(self.m, [CTL, 'profile', 'set', 'weekly', 'report_dir', folder / 'r'], None).finish()
-        self.assertRegex(put.err, reason)
-        self.assertEqual((put.status, self.m.config.read_text()), (1, text))
-        self.m.config.write_text(text.replace(f'{self.m.reports}', f'{folder}/r'))
-        doctor = Run(self.m, [CTL, 'doctor', '--json'], None).finish()
-        self.assertTrue([found for found in json.loads(doctor.out)
-                         if re.search(reason, f"{found['text']}; {found['remedy']}")], doctor.out)
-        run = self.m.run('--report', 'weekly')
-        self.assertRegex('\n'.join(run.log_lines), reason)
-        self.assertEqual((self.m.status('weekly'), [*folder.iterdir()]), ('fail', []))
+from harness import ALL, PROGRAM, ROOT, ProductTest, Run, make_files, needs_root, wait_for
 
 
 @needs_root

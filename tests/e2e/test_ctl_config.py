@@ -222,6 +222,8 @@ class Profiles(ControlTest):
         secret = self.m.tmp / 'secret'
         secret.write_text('x\n')
         secret.chmod(0o600)
+        (self.m.tmp / 'open').mkdir()
+        (self.m.tmp / 'open').chmod(0o770)
         before = self.GLOBAL + '[p]\n# why\n\treport_list = share_list\nown = 1\nlanguage=de\n'
         made = before + '\n[n]\nreport_list = '
         add, put = ('profile', 'add', 'n'), ('profile', 'set', 'p')
@@ -270,6 +272,7 @@ class Profiles(ControlTest):
                 ('smtp_user', 'u', 'needs smtp_password_file'),
                 ('smtp_password_file', '/etc/passwd', 'changed by others'),
                 ('report_dir', 'r', 'not absolute'), ('report_dir', '/etc/passwd/r', 'no folder'),
+                ('report_dir', '/tmp/open/r', 'is writable by others, .*; run chmod go-w'),
                 ('link_base', 'x', 'http'), ('limit_user', 'nobody,rot', '"rot" is no user'),
                 ('language', "de-'", 'not installed'),
                 ('duplicate_compare', '1', 'true nor false'), ('keep_reports', '0', 'from 1 on'),

@@ -597,6 +597,9 @@ class Doctor(WeeklyTest):
                 ('error', 'profile a/b: ', append(config, '[a/b]\nreport_list = share_list\n')),
                 ('error', 'profile more: .*large_file', configure(report_list='larg_file')),
                 ('error', 'profile more: it selects no report', configure(report_list='')),
+                ('error', 'open is writable by others, .*; run chmod go-w', lambda: [
+                    place('open').mkdir(), place('open').chmod(0o770),
+                    configure(report_dir='/usr/vorn/open/r')()]),
                 ('error', 'profile more: share_list: ', configure(share_list='photos,fotos')),
                 ('warning', 'profile more: the key languge .*"language"', configure(languge='de')),
                 ('error', 'share 007: ', append(shares, '[007]\npath = /\n')),
