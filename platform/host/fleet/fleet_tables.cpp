@@ -265,6 +265,16 @@ std::int64_t begun(std::uint64_t run) {
   return static_cast<std::int64_t>(run / report_format::kRunsInSecond);
 }
 
+// Adds the run's rows under another profile.
+std::string copy_statement(const FleetConf& conf, const FleetTable& table, const FleetRun& run,
+                           const std::string& profile) {
+  const std::string columns = report_format::fleet_column_names(table);
+  return "insert into " + qualified(conf, conf.part_of(table.name)) + " (server, profile, run, " +
+         columns + ") select server, " + fleet_literal(profile) + ", run, " + columns + " from " +
+         qualified(conf, table.name) + " where server = " + fleet_literal(run.server) +
+         " and profile = " + fleet_literal(run.profile) + " and run = " + std::to_string(run.run);
+}
+
 bool is_of_one(const FleetRun& run, const std::string& server, const std::string& profile) {
   return run.server == server && run.profile == profile;
 }
@@ -377,14 +387,7 @@ std::string rename_runs(Engine& engine, const std::string& from, const std::stri
   }
   // Once, on one node, whatever replicas there are. The run's line is the last one.
   for (const FleetTable* table : report_format::kFleetTables) {
-    const std::string columns = report_format::fleet_column_names(*table);
-    if (!engine.execute(conf.home(), "insert into " + qualified(conf, conf.part_of(table->name)) +
-                                         " (server, profile, run, " + columns +
-                                         ") select server, " + fleet_literal(to) + ", run, " +
-                                         columns + " from " + qualified(conf, table->name) +
-                                         " where server = " + fleet_literal(conf.server) +
-                                         " and profile = " + fleet_literal(from) +
-                                         " and run = " + std::to_string(run->run))) {
+    if (!engine.execute(conf.home(), copy_statement(conf, *table, *run, to))) {
       return engine.problem();
     }
   }

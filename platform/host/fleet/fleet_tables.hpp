@@ -42,8 +42,8 @@ std::string list_runs(Engine& engine, FleetListing& listing);
 // of an hour ago, longer than a statement takes, those ahead of such a one, and what was begun a
 // day before or more and never got its line.
 std::string drop_old_runs(Engine& engine, const FleetListing& listing);
-// Removes all runs of the server, or those of one profile unless `profile` is empty; `dropped` tells
-// how many.
+// Removes all runs of the server, or those of one profile unless `profile` is empty; `dropped`
+// tells how many.
 std::string drop_server(Engine& engine, const std::string& server, const std::string& profile,
                         std::size_t& dropped);
 // Gives the newest run of this server's profile `from` to `to`, and removes the others.

@@ -3,11 +3,11 @@
 
 #include <array>
 #include <bit>
-#include <compare>
 #include <cstdint>
 #include <cstring>
 #include <string>
 #include <string_view>
+#include <tuple>
 #include <type_traits>
 #include <vector>
 
@@ -77,7 +77,9 @@ void split_fleet_row(std::string& row, std::vector<char*>& fields);
 struct FleetPartition {
   std::string server, profile;
   std::uint64_t run = 0;
-  auto operator<=>(const FleetPartition&) const = default;
+  bool operator<(const FleetPartition& other) const {
+    return std::tie(server, profile, run) < std::tie(other.server, other.profile, other.run);
+  }
 };
 // False when `text` is none.
 bool read_partition(std::string_view text, FleetPartition& partition);
