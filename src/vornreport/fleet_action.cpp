@@ -298,7 +298,7 @@ FactsSource facts_source(const FleetOrder& order) {
 }
 
 // False, logged, when there is no whole page.
-bool make_page(const FleetOrder& order, FleetRun& run) {
+bool make_page(const FleetOrder& order, const std::vector<Run>& runs, FleetRun& run) {
   const PathText data_path = report_data_path();
   run_command(kDriverModule, __LINE__, VORN_PATH_TEMPLATE_SCRIPT " header %s", data_path.c_str());
   std::array<char, 8> language{};
@@ -310,7 +310,7 @@ bool make_page(const FleetOrder& order, FleetRun& run) {
               language.data());
   run_reports(run, order.reports);
   const char* date_dir = set_value(run.profile.get(), "real_path_date");
-  return date_dir != nullptr && !report_data_lost() &&
+  return date_dir != nullptr && still_stand(run.source.fleet, runs) && !report_data_lost() &&
          write_facts(fleet_facts(std::move(run.members), run_facts(), facts_source(order)),
                      date_dir, data_path.c_str()) &&
          build_report_html(kProfile, run.profile.get(), data_path.c_str()) > 0 &&
@@ -347,7 +347,7 @@ std::string fleet_report(const FleetOrder& order) {
   if (!prepare(order, run)) {
     return "";
   }
-  const bool is_made = make_page(order, run) && still_stand(fleet.get(), runs);
+  const bool is_made = make_page(order, runs, run);
   if (VORNFleetReportEnd(is_made ? 1 : 0) < 0) {
     return "";
   }

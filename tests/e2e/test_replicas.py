@@ -3,6 +3,7 @@ import json
 import time
 import unittest
 import zlib
+from concurrent.futures import ThreadPoolExecutor
 
 import test_fleet
 from engine import START
@@ -76,6 +77,25 @@ class Replicas(test_fleet.FleetTest):
                                 f"('{self.name}', 'daily', 1)")
         self.until(lambda: self.newest() == len(self.tree.files))
         self.assertEqual(self.files(), len(self.tree.files))
+
+    @needs_root
+    def test_what_changes_while_a_report_is_made(self):
+        m = self.machine
+        self.ctl(m, 'fleet', 'init')
+        self.send(m)
+        self.until(lambda: self.newest() == 1)
+        self.a.stop(softly=True)
+        for change, words in ((self.a.start, 'came back meanwhile; try again'),
+                              (lambda: self.ctl(m, 'fleet', 'forget', self.name),
+                               'a run was dropped while the report was made')):
+            with self.subTest(words), ThreadPoolExecutor() as beside:
+                m.stop_at('lang')
+                made = beside.submit(self.ctl, m, 'fleet', 'report', m.base / 'fleet', status=1)
+                m.stopped_pid()
+                change()
+                m.go_on()
+                self.assertIn(words, made.result().err)
+                self.assertEqual(list((m.base / 'fleet').glob('2*')), [])
 
     @needs_root
     def test_what_is_gone_for_a_while(self):
