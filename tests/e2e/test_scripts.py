@@ -68,7 +68,7 @@ ROOMS = {
 
     'ctl-main': (r'ctl/main\.cpp', 'doctor ctl-fleet run config schedule ctl-base ' + CONTRACTS),
     'doctor': (r'ctl/doctor/.*', 'run config schedule ctl-base ' + CONTRACTS),
-    'ctl-fleet': (r'ctl/fleet/.*', 'run ctl-base ' + CONTRACTS),
+    'ctl-fleet': (r'ctl/fleet/.*', 'run config ctl-base ' + CONTRACTS),
     'run': (r'ctl/run/.*', 'schedule ctl-base ' + CONTRACTS),
     'config': (r'ctl/config/.*', 'schedule ctl-base ' + CONTRACTS),
     'schedule': (r'ctl/schedule/.*', 'ctl-base ' + CONTRACTS),
