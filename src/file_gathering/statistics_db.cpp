@@ -8,6 +8,7 @@
 #include <charconv>
 #include <cstdint>
 #include <cstring>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -145,12 +146,12 @@ bool stand_as_they_are(const FileInfo& info) {
   return info.pst->st_size >= 0;
 }
 
-// Inserts a file without a text of its own. False when that wasn't possible: what its text brings
-// counts then.
-bool insert_values(sqlite3* db, const FileInfo& info) {
+// Inserts a file without a text of its own: SQLite's result. Nothing where it needs its text; what
+// that brings counts too when the result is a failure of this one row.
+std::optional<int> insert_values(sqlite3* db, const FileInfo& info) {
   sqlite3_stmt* insert = stand_as_they_are(info) ? insert_of(db) : nullptr;
   if (insert == nullptr) {
-    return false;
+    return std::nullopt;
   }
   sqlite3_bind_int64(insert, 1, static_cast<uint32_t>(info.pst->st_uid));
   sqlite3_bind_int64(insert, 2, static_cast<uint32_t>(info.pst->st_mtime));
@@ -160,7 +161,7 @@ bool insert_values(sqlite3* db, const FileInfo& info) {
     sqlite3_bind_text(insert, column++, text, -1, SQLITE_STATIC);
   }
   sqlite3_step(insert);
-  return sqlite3_reset(insert) == SQLITE_OK;
+  return sqlite3_reset(insert);
 }
 
 // The first argument that must not be null and is, as the text of its check; null when all are set.
@@ -327,7 +328,8 @@ int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo) {
     return -1;
   }
   VornQazSetEnv();
-  if (insert_values(db, *pFileInfo)) {
+  const std::optional<int> inserted = insert_values(db, *pFileInfo);
+  if (inserted == SQLITE_OK) {
     return 0;
   }
   static QuotedText path_buffer;
@@ -340,12 +342,15 @@ int ReportDBAddFile(sqlite3* db, const FileInfo* pFileInfo) {
   // One longer than its buffer is cut inside a literal, and SQLite refuses it.
   const char* sql = statement.make(*pFileInfo, path, name, type);
   char* message = nullptr;
-  const int result = sqlite3_exec(db, sql, nullptr, nullptr, &message);
+  // Without memory or room SQLite rolls the whole transaction back. What came now would go in
+  // alone, and all before it would be missing from a report that looks complete.
+  const bool is_over = inserted && is_storage_failure(*inserted);
+  const int result = is_over ? *inserted : sqlite3_exec(db, sql, nullptr, nullptr, &message);
   if (result == SQLITE_OK) {
     return 0;
   }
   const SqliteText owned(message);
-  log_exec_failure(sql, message);
+  log_exec_failure(sql, message != nullptr ? message : sqlite3_errstr(result));
   if (is_storage_failure(result)) {
     mark_report_data_lost();
   }
