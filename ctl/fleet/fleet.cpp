@@ -112,7 +112,8 @@ void status(bool json) {
   }
   if (table.empty()) {
     print_line(
-        "the fleet has no complete run; run vornctl profile set PROFILE fleet true, then the profile");
+        "the fleet has no complete run; run vornctl profile set PROFILE fleet true, then the "
+        "profile");
     return;
   }
   table.print();
