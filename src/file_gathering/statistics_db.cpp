@@ -138,7 +138,7 @@ bool stand_as_they_are(const FileInfo& info) {
   size_t room = kStatementSize / 2;
   for (const char* text : {info.szShare, info.szPath, name_of(info), type_of(info)}) {
     const size_t length = std::strlen(text);
-    if (length >= room || std::memchr(text, '\'', length) != nullptr) {
+    if (length >= room || std::string_view(text, length).find('\'') != std::string_view::npos) {
       return false;
     }
     room -= length;

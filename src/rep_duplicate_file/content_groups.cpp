@@ -194,12 +194,15 @@ void end_content_groups() {
   run_facts().duplicates = g_tally.facts();
   run_facts().rows[report_format::kDuplicateFile.name] = g_rows;
   for (const auto& [share, count] : g_unread) {
-    const std::string files = std::to_string(count);
-    record_incident("share_part", share + ": " + files + " (contents)",
-                    files + " files of share " + share +
-                        " can't be read, so copies of them are missing from the report; the run's "
-                        "output names them",
-                    AlreadyLogged::kYes);
+    std::string what = share;
+    what.append(": ").append(std::to_string(count)).append(" (contents)");
+    std::string text = std::to_string(count);
+    text.append(" files of share ")
+        .append(share)
+        .append(
+            " can't be read, so copies of them are missing from the report; the run's output "
+            "names them");
+    record_incident("share_part", what, text, AlreadyLogged::kYes);
   }
 }
 

@@ -115,7 +115,7 @@ class MailServer {
     char port[8] = "";
     EXPECT_GT(read(ends[0], port, sizeof port - 1), 0) << "the mail server doesn't start";
     close(ends[0]);
-    port_ = std::to_string(std::atoi(port));
+    port_ = std::to_string(std::strtol(port, nullptr, 10));
   }
   MailServer(MailServer&&) = delete;
   ~MailServer() {
