@@ -161,7 +161,6 @@ class Engine::Transfer {
     set(CURLOPT_NOSIGNAL, 1L);
     set(CURLOPT_QUICK_EXIT, 1L);  // a name server that doesn't answer holds nothing up
     set(CURLOPT_CONNECTTIMEOUT, kConnectSeconds);
-    set(CURLOPT_ACCEPT_ENCODING, "gzip");
     set(CURLOPT_OPENSOCKETFUNCTION, &Transfer::on_open);
     set(CURLOPT_OPENSOCKETDATA, this);
     set(CURLOPT_WRITEFUNCTION, &Transfer::on_answer);
@@ -176,6 +175,7 @@ class Engine::Transfer {
 
   bool select(std::size_t node, const std::string& query, const std::string& sql, Rows& rows) {
     set(CURLOPT_UPLOAD_BUFFERSIZE, static_cast<long>(kChunk));
+    set(CURLOPT_ACCEPT_ENCODING, is_here(conf_.urls[node]) ? nullptr : "gzip");
     set(CURLOPT_POSTFIELDS, sql.c_str());
     set(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(sql.size()));
     set(CURLOPT_TIMEOUT, kSelectSeconds);
@@ -399,7 +399,8 @@ namespace {
 // the same replicas, as long as these answer.
 constexpr char kSelectQuery[] =
     "default_format=TabSeparated&wait_end_of_query=1&buffer_size=1048576"
-    "&enable_http_compression=1&max_execution_time=590&distributed_product_mode=global"
+    "&enable_http_compression=1&http_zlib_compression_level=1&max_execution_time=590&distributed_"
+    "product_mode=global"
     "&max_query_size=16777216&max_ast_elements=1000000"
     "&load_balancing=in_order&skip_unavailable_shards=0"
     "&read_overflow_mode=throw&group_by_overflow_mode=throw&sort_overflow_mode=throw"

@@ -54,7 +54,8 @@ async function serve(request, response) {
   const { searchParams } = new URL(request.url, 'http://engine');
   try {
     const text = await answer(searchParams, body);
-    if (searchParams.get('enable_http_compression') === '1') {
+    const accepted = request.headers['accept-encoding'] ?? '';
+    if (searchParams.get('enable_http_compression') === '1' && accepted.includes('gzip')) {
       response.writeHead(200, { 'Content-Encoding': 'gzip' }).end(zlib.gzipSync(text));
     } else {
       response.end(text);
