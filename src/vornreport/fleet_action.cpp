@@ -44,18 +44,18 @@ struct Run {
   std::string server, profile;
   uint64_t number = 0;
   int64_t started = 0, interval = 0;
-  bool is_ahead = false;
+  bool is_ahead = false, has_shared_number = false;
 };
 
 int add_run(void* context, int columns, char** values, char** /*names*/) noexcept {
-  enum Column { kServer, kProfileName, kNumber, kStarted, kInterval, kAhead, kCount };
+  enum Column { kServer, kProfileName, kNumber, kStarted, kInterval, kAhead, kShared, kCount };
   if (columns != kCount || values[kServer] == nullptr || values[kProfileName] == nullptr) {
     return -1;
   }
   static_cast<std::vector<Run>*>(context)->push_back(
       {values[kServer], values[kProfileName], std::strtoull(values[kNumber], nullptr, 10),
        std::strtoll(values[kStarted], nullptr, 10), std::strtoll(values[kInterval], nullptr, 10),
-       *values[kAhead] == '1'});
+       *values[kAhead] == '1', *values[kShared] == '1'});
   return 0;
 }
 
@@ -120,29 +120,35 @@ std::string key_of(const Run& run) {
          std::to_string(run.number) + ")";
 }
 
+// Their numbers pick the rows in a tenth of the time, as long as nobody else's have them.
 std::string condition_of(const std::vector<Run>& runs) {
-  std::string condition = "(server, profile, run) in (";
+  const bool by_number =
+      std::none_of(runs.begin(), runs.end(), [](const Run& run) { return run.has_shared_number; });
+  std::string keys;
   for (const Run& run : runs) {
-    condition += (condition.ends_with(')') ? ", " : "") + key_of(run);
+    keys += (keys.empty() ? "" : ", ") + (by_number ? std::to_string(run.number) : key_of(run));
   }
-  return condition + ")";
+  return (by_number ? "run in (" : "(server, profile, run) in (") + keys + ")";
 }
 
-// Whether all that a report was made of is still there, or it says that it isn't.
+// Whether all that a report was made of is still there, and nothing else by its numbers, or it says
+// that it isn't.
 bool still_stand(VORNFleet* fleet, const std::vector<Run>& runs) {
   std::vector<Run> listed;
   if (VORNFleetRuns(fleet, add_run, &listed) < 0) {
     complain(VORNFleetProblem(fleet));
     return false;
   }
-  std::set<std::string> complete;
+  std::map<std::string, Run> complete;
   for (const Run& run : listed) {
-    complete.insert(key_of(run));
+    complete.emplace(key_of(run), run);
   }
-  const bool all = std::all_of(runs.begin(), runs.end(),
-                               [&](const Run& run) { return complete.contains(key_of(run)); });
+  const bool all = std::all_of(runs.begin(), runs.end(), [&](const Run& run) {
+    const auto found = complete.find(key_of(run));
+    return found != complete.end() && found->second.has_shared_number == run.has_shared_number;
+  });
   if (!all) {
-    complain("a run was dropped while the report was made; make it again");
+    complain("a run was dropped or sent while the report was made; make it again");
   }
   return all;
 }

@@ -273,7 +273,8 @@ class AnyFleet:
         # The newest counts, once; others go when nobody can be reading them any more.
         self.send(m)
         newest = int(self.shards.ask("select max(run) from run where server = 'seen'"))
-        # A clock that is ahead; and a run that never got all of its rows.
+        # A clock that is ahead; a run that never got all of its rows; and a number of somebody else's.
+        self.shards.ask(f"insert into file (server, profile, run) values ('other', 'daily', {newest})")
         self.shards.ask(f"insert into run (server, profile, run, started, row_count) values "
                         f"('ahead', 'daily', {newest * 2}, 1, 0), ('seen', 'daily', {newest + 2}, 1, 1)")
         made = self.report(m, '--reports', 'large_file', status=3)

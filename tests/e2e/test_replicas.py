@@ -87,7 +87,7 @@ class Replicas(test_fleet.FleetTest):
         self.a.stop(softly=True)
         for change, words in ((self.a.start, 'came back meanwhile; try again'),
                               (lambda: self.ctl(m, 'fleet', 'forget', self.name),
-                               'a run was dropped while the report was made')):
+                               'a run was dropped or sent while the report was made')):
             with self.subTest(words), ThreadPoolExecutor() as beside:
                 m.stop_at('lang')
                 made = beside.submit(self.ctl, m, 'fleet', 'report', m.base / 'fleet', status=1)

@@ -24,10 +24,12 @@ namespace {
 bool hand_out(const std::vector<host::FleetRun>& runs, bool are_ahead, VORNFleetRow row,
               void* context) {
   return std::all_of(runs.begin(), runs.end(), [&](host::FleetRun run) {
-    std::array<std::string, 4> texts{std::to_string(run.run), std::to_string(run.started),
-                                     std::to_string(run.interval), are_ahead ? "1" : "0"};
-    std::array<char*, 6> values{run.server.data(), run.profile.data(), texts[0].data(),
-                                texts[1].data(),   texts[2].data(),    texts[3].data()};
+    std::array<std::string, 5> texts{std::to_string(run.run), std::to_string(run.started),
+                                     std::to_string(run.interval), are_ahead ? "1" : "0",
+                                     run.has_shared_number ? "1" : "0"};
+    std::array<char*, 7> values{run.server.data(), run.profile.data(), texts[0].data(),
+                                texts[1].data(),   texts[2].data(),    texts[3].data(),
+                                texts[4].data()};
     char* no_names[1] = {};
     return row(context, values.size(), values.data(), static_cast<char**>(no_names)) == 0;
   });

@@ -261,6 +261,20 @@ bool is_everywhere(const Line& line, const std::vector<FleetNode>& nodes) {
   return has_line && rows >= line.rows;
 }
 
+// Numbers that not only one server's profile has.
+std::set<std::uint64_t> shared_numbers(const std::vector<FleetNode>& nodes) {
+  std::map<std::uint64_t, FleetPartition> owners;
+  std::set<std::uint64_t> shared;
+  for (const FleetNode& node : nodes) {
+    for (const auto& [partition, kept] : node.kept) {
+      if (owners.try_emplace(partition.run, partition).first->second != partition) {
+        shared.insert(partition.run);
+      }
+    }
+  }
+  return shared;
+}
+
 std::int64_t begun(std::uint64_t run) {
   return static_cast<std::int64_t>(run / report_format::kRunsInSecond);
 }
@@ -323,7 +337,9 @@ std::string list_runs(Engine& engine, FleetListing& listing) {
   for (const FleetNode& node : nodes) {
     listing.answering.push_back(node.number);
   }
+  const std::set<std::uint64_t> shared = shared_numbers(nodes);
   for (Line& line : lines) {
+    line.run.has_shared_number = shared.contains(line.run.run);
     if (begun(line.run.run) > listing.now + kDay) {
       listing.ahead.push_back(std::move(line.run));
     } else if (is_everywhere(line, nodes)) {

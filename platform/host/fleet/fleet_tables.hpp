@@ -18,6 +18,8 @@ struct FleetRun {
   std::uint64_t run = 0;  // its number in the tables
   std::int64_t started = 0, finished = 0, interval = 0;
   std::uint64_t files = 0, bytes = 0;
+  // Rows of another server or profile have its number.
+  bool has_shared_number = false;
 };
 
 struct FleetListing {

@@ -45,9 +45,11 @@ typedef int (*VORNFleetRow)(void* context, int columns, char** values, char** na
 int VORNFleetSelect(VORNFleet* fleet, const char* sql, VORNFleetRow row, void* context);
 
 // Hands out the complete runs by server and profile, the newest first: server, profile, number,
-// seconds since 1970 at which it started, seconds since the run before, 0; behind them, with 1,
-// those that don't count for the clock they come from is ahead. 0, or -1; also when a node answers
-// that didn't the last time: what was read in between may be of that one, which lacked some of it.
+// seconds since 1970 at which it started, seconds since the run before, 0, and 1 where rows of
+// another server or profile have its number, else 0; behind them, with 1 in the place of the first
+// 0, those that don't count for the clock they come from is ahead. 0, or -1; also when a node
+// answers that didn't the last time: what was read in between may be of that one, which lacked some
+// of it.
 int VORNFleetRuns(VORNFleet* fleet, VORNFleetRow row, void* context);
 
 // --- A report over the fleet --------------------------------------------------------------------

@@ -80,6 +80,7 @@ struct FleetPartition {
   bool operator<(const FleetPartition& other) const {
     return std::tie(server, profile, run) < std::tie(other.server, other.profile, other.run);
   }
+  bool operator==(const FleetPartition& other) const = default;
 };
 // False when `text` is none.
 bool read_partition(std::string_view text, FleetPartition& partition);
