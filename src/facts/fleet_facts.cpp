@@ -68,11 +68,8 @@ void add_amount(Record& sum, const Record& more) {
   sum.bytes = amount.bytes;
 }
 
-// Many users on many servers would make facts that no page can hold.
-constexpr size_t kMostParts = 20;
-
-// Sums up those of one name, and keeps their largest parts; `name` and `parts` are members of the
-// record.
+// Sums up those of one name; `name` and `parts` are members of the record. All parts stay: the page
+// adds them up by share and volume.
 template <typename Record, typename Part>
 void merge(std::optional<std::vector<Record>>& list, std::string Record::*name,
            std::vector<Part> Record::*parts) {
@@ -95,7 +92,6 @@ void merge(std::optional<std::vector<Record>>& list, std::string Record::*name,
   for (Record& record : merged) {
     std::stable_sort((record.*parts).begin(), (record.*parts).end(),
                      [](const auto& one, const auto& two) { return one.bytes > two.bytes; });
-    (record.*parts).resize(std::min((record.*parts).size(), kMostParts));
   }
   list = std::move(merged);
 }

@@ -311,6 +311,9 @@ class AnyFleet:
                 self.assertEqual((made / 'csv' / path.name).read_bytes().replace(
                     'srv {runs} %27 & ü:'.encode(), b''), path.read_bytes())
         # What other servers have written is theirs: it stays text, and can be forgotten.
+        part = {'share': 'odd', 'volume': '/', 'files': 1, 'bytes': 7}
+        known = json.dumps({'format': 1, 'owners': [{'name': 'ann', 'files': 1, 'bytes': 7, 'places': [part]}],
+                            'types': [{'type': 'other', 'files': 1, 'bytes': 7, 'shares': [part]}]})
         for number, name in enumerate(hostile):
             if '\udcff' in name:
                 continue
@@ -322,9 +325,13 @@ class AnyFleet:
                 self.shards.ask('insert into report_row (server, profile, run, report, value) values '
                                 f"({where}, '{report}', [" + ', '.join([f"'{text}'"] * 7) + '])')
             self.shards.ask('insert into run (server, profile, run, started, report) values '
-                            f"({where}, {int(time.time())}, '{{\"format\": 1}}')")
-        page = (self.report(m) / 'report.html').read_text(errors='surrogateescape')
-        self.assertNotIn('<script>x', page)
+                            f"({where}, {int(time.time())}, '{known}')")
+        made = self.report(m)
+        self.assertNotIn('<script>x', (made / 'report.html').read_text(errors='surrogateescape'))
+        # What the page adds up by share is all there, of however many servers.
+        for key, parts in (('owners', 'places'), ('types', 'shares')):
+            for entry in facts(made)[key]:
+                self.assertEqual(sum(part['bytes'] for part in entry[parts]), entry['bytes'], key)
         for name in hostile:
             if '\udcff' not in name:
                 self.ctl(m, 'fleet', 'forget', name)
